@@ -1,0 +1,33 @@
+# Options that every target of the project shares, and the two functions that define targets.
+
+find_package(PkgConfig REQUIRED)
+find_package(Threads REQUIRED)
+
+add_library(qv_options INTERFACE)
+target_include_directories(qv_options INTERFACE ${PROJECT_SOURCE_DIR})
+target_compile_options(qv_options INTERFACE
+  -Wall -Wextra -Wpedantic -Wshadow -Wconversion -Werror
+  # Log lines and diagnostics name files from the project's root, wherever it was built.
+  -ffile-prefix-map=${PROJECT_SOURCE_DIR}/=)
+if(CMAKE_CXX_COMPILER_ID STREQUAL "Clang")
+  target_compile_options(qv_options INTERFACE $<$<COMPILE_LANGUAGE:CXX>:-Wthread-safety>)
+endif()
+if(QV_SANITIZE)
+  target_compile_options(qv_options INTERFACE
+    -fsanitize=${QV_SANITIZE} -fno-sanitize-recover=all -fno-omit-frame-pointer)
+  target_link_options(qv_options INTERFACE -fsanitize=${QV_SANITIZE})
+endif()
+
+# Defines a static library of all sources directly in the calling folder.
+function(qv_library name)
+  file(GLOB sources CONFIGURE_DEPENDS *.cpp *.h)
+  add_library(${name} STATIC ${sources})
+  target_link_libraries(${name} PUBLIC qv_options ${ARGN})
+endfunction()
+
+# Defines a test program of all *Test.cpp (and helper) sources directly in the calling folder.
+function(qv_test_program name)
+  file(GLOB sources CONFIGURE_DEPENDS *.cpp *.h)
+  add_executable(${name} ${sources})
+  target_link_libraries(${name} PRIVATE qv_options GTest::gmock ${ARGN})
+endfunction()

@@ -1,0 +1,71 @@
+#pragma once
+
+#include "platform/QVBeacon.h"
+#include "platform/QVClock.h"
+#include "platform/QVCondition.h"
+#include "platform/QVCountwise.h"
+#include "platform/QVDeviceInformation.h"
+#include "platform/QVIPC.h"
+#include "platform/QVJoulewell.h"
+#include "platform/QVLog.h"
+#include "platform/QVPreferences.h"
+#include "platform/QVProcess.h"
+#include "platform/QVRandom.h"
+#include "platform/QVTracePoints.h"
+#include "platform/QVWorkQueue.h"
+
+#include <cstdint>
+#include <memory>
+#include <mutex>
+
+// The platform services that the core stands on, and their owner. The composition root (or a test)
+// fills one and installs it before anything else runs; from then on it is only read, by any
+// thread. Nothing of the core outlives it.
+//
+// Members are destroyed in reverse order: those that log, or run work, go before the log and the
+// queues that they use.
+class QVPlatform {
+ public:
+  std::unique_ptr<QVLog> log;
+  std::unique_ptr<QVClock> clock;
+  std::unique_ptr<QVRandom> random;
+  std::unique_ptr<QVProcess> process;
+  std::unique_ptr<QVTracePoints> tracePoints;
+  std::unique_ptr<QVPreferences> preferences;
+  std::unique_ptr<QVDeviceInformation> deviceInformation;
+  std::unique_ptr<QVConditions> conditions;
+  std::unique_ptr<QVWorkQueues> queues;
+  std::unique_ptr<QVBeacon> beacon;
+  std::unique_ptr<QVCountwise> countwise;
+  std::unique_ptr<QVJoulewell> joulewell;
+  std::unique_ptr<QVIPCListener> listener;
+
+  // Makes `platform` the one that shared() answers, in place of an earlier one; null takes it
+  // away. The caller keeps it alive. Only while no other thread uses the core.
+  static void install(QVPlatform* platform);
+  static QVPlatform& shared();
+
+  // Counts installations, so that state kept once per process starts anew for a new platform.
+  static uint64_t generation();
+};
+
+// A value made once per installed platform, which in the service is once per process. Safe when
+// several threads ask at the same time: one makes it, all see it.
+template <class Value>
+class QVOncePerPlatform {
+ public:
+  template <class Maker>
+  Value get(Maker&& make) {
+    const std::lock_guard lock(mutex_);
+    if (generation_ != QVPlatform::generation()) {
+      value_ = make();
+      generation_ = QVPlatform::generation();
+    }
+    return value_;
+  }
+
+ private:
+  std::mutex mutex_;
+  uint64_t generation_ = 0;
+  Value value_{};
+};
