@@ -1,0 +1,60 @@
+#pragma once
+
+#include "platform/QVPlatform.h"
+#include "platform/fake/QVFakeBeacon.h"
+#include "platform/fake/QVFakeClock.h"
+#include "platform/fake/QVFakeConditions.h"
+#include "platform/fake/QVFakeCountwise.h"
+#include "platform/fake/QVFakeDeviceInformation.h"
+#include "platform/fake/QVFakeIPCListener.h"
+#include "platform/fake/QVFakeJoulewell.h"
+#include "platform/fake/QVFakeLog.h"
+#include "platform/fake/QVFakePreferences.h"
+#include "platform/fake/QVFakeProcess.h"
+#include "platform/fake/QVFakeRandom.h"
+#include "platform/fake/QVFakeTracePoints.h"
+#include "platform/fake/QVFakeWorkQueues.h"
+
+// A platform of fakes, installed while it exists. Queues, conditions and clock share one virtual
+// time. A test makes it first and drops it last: work that is still enqueued, and what the open
+// connections hold, is destroyed with it, while the platform can still be asked.
+//
+// Threads: made and destroyed while no other thread uses the core.
+class QVFakePlatform {
+ public:
+  QVFakePlatform();
+  ~QVFakePlatform();
+  QVFakePlatform(const QVFakePlatform&) = delete;
+  QVFakePlatform& operator=(const QVFakePlatform&) = delete;
+
+  QVFakeLog& log() { return *log_; }
+  QVFakeClock& clock() { return *clock_; }
+  QVFakeRandom& random() { return *random_; }
+  QVFakeProcess& process() { return *process_; }
+  QVFakeTracePoints& tracePoints() { return *tracePoints_; }
+  QVFakePreferences& preferences() { return *preferences_; }
+  QVFakeDeviceInformation& deviceInformation() { return *deviceInformation_; }
+  QVFakeConditions& conditions() { return *conditions_; }
+  QVFakeWorkQueues& queues() { return *queues_; }
+  QVFakeBeacon& beacon() { return *beacon_; }
+  QVFakeCountwise& countwise() { return *countwise_; }
+  QVFakeJoulewell& joulewell() { return *joulewell_; }
+  QVFakeIPCListener& listener() { return *listener_; }
+
+ private:
+  QVPlatform platform_;
+  // Into platform_.
+  QVFakeLog* log_;
+  QVFakeClock* clock_;
+  QVFakeRandom* random_;
+  QVFakeProcess* process_;
+  QVFakeTracePoints* tracePoints_;
+  QVFakePreferences* preferences_;
+  QVFakeDeviceInformation* deviceInformation_;
+  QVFakeWorkQueues* queues_;
+  QVFakeConditions* conditions_;
+  QVFakeBeacon* beacon_;
+  QVFakeCountwise* countwise_;
+  QVFakeJoulewell* joulewell_;
+  QVFakeIPCListener* listener_;
+};
