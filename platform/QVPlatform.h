@@ -14,6 +14,7 @@
 #include "platform/QVTracePoints.h"
 #include "platform/QVWorkQueue.h"
 
+#include <atomic>
 #include <cstdint>
 #include <memory>
 #include <mutex>
@@ -56,16 +57,24 @@ class QVOncePerPlatform {
  public:
   template <class Maker>
   Value get(Maker&& make) {
+    if (isMade()) return value_;
     const std::lock_guard lock(mutex_);
-    if (generation_ != QVPlatform::generation()) {
+    if (!isMade()) {
       value_ = make();
-      generation_ = QVPlatform::generation();
+      generation_.store(QVPlatform::generation(), std::memory_order_release);
     }
     return value_;
   }
 
+  // The value if it has been made, else an empty one.
+  Value peek() const { return isMade() ? value_ : Value{}; }
+
  private:
+  bool isMade() const {
+    return generation_.load(std::memory_order_acquire) == QVPlatform::generation();
+  }
+
   std::mutex mutex_;
-  uint64_t generation_ = 0;
-  Value value_{};
+  std::atomic<uint64_t> generation_{0};
+  Value value_{};  // written before generation_, once per platform
 };

@@ -2,9 +2,9 @@
 
 #include "platform/QVValue.h"
 
-#include <chrono>
 #include <concepts>
 #include <cstdint>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <type_traits>
@@ -44,6 +44,15 @@ requires(!std::same_as<Integer, bool> && !std::same_as<Integer, char> &&
     QVAppendText(out, static_cast<int64_t>(value));
   } else {
     QVAppendText(out, static_cast<uint64_t>(value));
+  }
+}
+
+template <class Contents>
+void QVAppendText(std::string& out, const std::optional<Contents>& value) {
+  if (value) {
+    QVAppendText(out, *value);
+  } else {
+    out.append("(null)");
   }
 }
 

@@ -1,0 +1,32 @@
+#include "QVServices/Statistics/QVReportingUtility.h"
+
+#include "platform/QVPlatform.h"
+
+#include <chrono>
+#include <mutex>
+
+bool QVReportingUtilityWait(QVCondition& condition, const bool& flag,
+                            std::string_view waitingMessage, std::string_view failureMessage,
+                            const QVLogScope* scope, double timeout) {
+  constexpr const char* kFunction = "QVReportingUtilityWait";
+  QVLog& log = *QVPlatform::shared().log;
+  const auto period =
+      std::chrono::duration_cast<QVDuration>(std::chrono::duration<double>(timeout));
+  const std::lock_guard lock(condition);
+  while (!flag) {
+    log.standard(scope, kFunction, waitingMessage);
+    if (!condition.waitForTimeout(period)) {
+      log.error(scope, kFunction, failureMessage);
+      return false;
+    }
+    log.standard(scope, kFunction, "continuing");
+  }
+  return true;
+}
+
+bool QVReportingIsInternalBuild() {
+  static QVOncePerPlatform<bool> isInternalBuild;
+  return isInternalBuild.get([] {
+    return QVPlatform::shared().deviceInformation->booleanAnswer("InternalBuild").value_or(false);
+  });
+}

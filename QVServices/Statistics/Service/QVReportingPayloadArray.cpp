@@ -1,0 +1,30 @@
+#include "QVServices/Statistics/Service/QVReportingPayloadArray.h"
+
+#include "platform/QVText.h"
+
+QVReportingPayloadArray::Position QVReportingPayloadArray::append(const QVDictionary& payload) {
+  const std::lock_guard lock(mutex_);
+  const Position position = store_->append(payload);
+  entries_.push_back({position, 0, 0});
+  return position;
+}
+
+void QVReportingPayloadArray::append(std::string_view identifierBase, uint32_t count,
+                                     Position position) {
+  const std::lock_guard lock(mutex_);
+  entries_.push_back({position, store_->intern(identifierBase), count});
+}
+
+std::size_t QVReportingPayloadArray::size() const {
+  const std::lock_guard lock(mutex_);
+  return entries_.size();
+}
+
+void QVReportingPayloadArray::forEach(Visitor visitor) const {
+  const std::lock_guard lock(mutex_);
+  for (const Entry& entry : entries_) {
+    visitor(entry.count == 0 ? std::string()
+                             : QVText(store_->interned(entry.identifierBase), '_', entry.count),
+            store_->payload(entry.position));
+  }
+}

@@ -1,0 +1,53 @@
+#pragma once
+
+#include "QVServices/Statistics/Service/QVReportingPayloadStore.h"
+#include "platform/QVFunction.h"
+#include "platform/QVValue.h"
+
+#include <cstdint>
+#include <deque>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <string_view>
+
+// One of a session's two arrays of recorded payloads: the aggregated one, whose entries have no
+// name, or the nested one, whose entries are payloads under their message identifiers. Payloads lie
+// in a store that both arrays share; an entry is its place there, and they are decoded while
+// iterating.
+//
+// Threads: any. The array is its own recursive lock: every operation takes it, and a caller holds
+// it (lock(), unlock()) over what must not be torn apart.
+class QVReportingPayloadArray {
+ public:
+  using Position = QVReportingPayloadStore::Position;
+  // Receives entries in order: the identifier (empty in the aggregated array) and the payload.
+  using Visitor = QVFunction<void(const std::string& identifier, const QVDictionary& payload)>;
+
+  explicit QVReportingPayloadArray(std::shared_ptr<QVReportingPayloadStore> store)
+      : store_(std::move(store)) {}
+
+  void lock() { mutex_.lock(); }
+  void unlock() { mutex_.unlock(); }
+
+  // Appends a payload; answers where it lies, for an entry of the other array.
+  Position append(const QVDictionary& payload);
+  // Appends the payload at `position` of the shared store under the identifier BASE_COUNT.
+  void append(std::string_view identifierBase, uint32_t count, Position position);
+
+  std::size_t size() const;
+  bool empty() const { return size() == 0; }
+  void forEach(Visitor visitor) const;
+
+ private:
+  // Kept apart from its base, of which there are few, the count makes an identifier of 8 bytes.
+  struct Entry {
+    Position position;
+    uint32_t identifierBase;
+    uint32_t count;  // from 1; 0: no identifier
+  };
+
+  mutable std::recursive_mutex mutex_;
+  const std::shared_ptr<QVReportingPayloadStore> store_;
+  std::deque<Entry> entries_;  // guarded by mutex_
+};

@@ -1,0 +1,36 @@
+#pragma once
+
+#include "platform/QVValue.h"
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+#include <vector>
+
+// The compact form of values in a session's payload store. Private to this process and never
+// stored outside of it, so it has no version and no byte order of its own.
+//
+// A value is a tag and what the tag asks for: small integers are their own tag, others are
+// variable-length numbers with the sign in the lowest bit; a double that is exact in single
+// precision takes four bytes. Pure functions; any thread.
+
+void QVReportingEncodeNumber(std::string& out, uint64_t number);
+void QVReportingEncodeText(std::string& out, std::string_view text);
+void QVReportingEncodeValue(std::string& out, const QVValue& value);
+
+// Reads what the functions above wrote, in the same order. The bytes must stay until the values
+// that it answered are gone: strings borrow them.
+class QVReportingPayloadDecoder {
+ public:
+  explicit QVReportingPayloadDecoder(const uint8_t* bytes) : next_(bytes) {}
+
+  uint64_t number();
+  std::string_view text();
+  QVValue value();
+
+ private:
+  template <class Fixed>
+  Fixed fixed();
+
+  const uint8_t* next_;
+};

@@ -1,0 +1,116 @@
+#include "QVServices/Statistics/Service/QVReportingPayloadStore.h"
+
+#include "QVServices/Statistics/Service/QVReportingPayloadCoding.h"
+
+#include <algorithm>
+#include <functional>
+
+namespace {
+
+// A position is a chunk's index and an offset within the chunk.
+constexpr unsigned kOffsetBits = 32;
+
+std::size_t hashOfKeys(const QVDictionary& payload) {
+  std::size_t hash = payload.size();
+  for (const auto& entry : payload) {
+    hash = hash * 31 + std::hash<std::string_view>{}(entry.key);
+  }
+  return hash;
+}
+
+}  // namespace
+
+bool QVReportingPayloadStore::hasKeys(const QVDictionary& payload, const Keys& keys) {
+  return std::equal(
+      payload.begin(), payload.end(), keys.begin(), keys.end(),
+      [](const QVDictionaryEntry& entry, const std::string& key) { return entry.key == key; });
+}
+
+uint64_t QVReportingPayloadStore::keySetOf(const QVDictionary& payload) {
+  if (latestKeySet_ < keySets_.size() && hasKeys(payload, keySets_[latestKeySet_])) {
+    return latestKeySet_ + 1;
+  }
+  const std::size_t hash = hashOfKeys(payload);
+  const auto [first, last] = keySetsByHash_.equal_range(hash);
+  const auto known = std::find_if(first, last, [this, &payload](const auto& candidate) {
+    return hasKeys(payload, keySets_[candidate.second]);
+  });
+  if (known != last) {
+    latestKeySet_ = known->second;
+    return latestKeySet_ + 1;
+  }
+  if (keySets_.size() == kMaximumKeySets) return 0;
+  Keys keys;
+  keys.reserve(payload.size());
+  for (const auto& entry : payload) keys.emplace_back(entry.key);
+  latestKeySet_ = keySets_.size();
+  keySets_.push_back(std::move(keys));
+  keySetsByHash_.emplace(hash, latestKeySet_);
+  return latestKeySet_ + 1;
+}
+
+QVReportingPayloadStore::Position QVReportingPayloadStore::place(std::string_view encoded) {
+  if (chunks_.empty() || chunks_.back().capacity - chunks_.back().used < encoded.size()) {
+    const std::size_t next = chunks_.empty()
+                                 ? kFirstChunkBytes
+                                 : std::min(chunks_.back().capacity * 2, kLargestChunkBytes);
+    const std::size_t capacity = std::max(next, encoded.size());
+    chunks_.push_back({std::make_unique_for_overwrite<uint8_t[]>(capacity), 0, capacity});
+  }
+  Chunk& chunk = chunks_.back();
+  std::copy(encoded.begin(), encoded.end(), chunk.bytes.get() + chunk.used);
+  const Position position = (Position{chunks_.size() - 1} << kOffsetBits) | chunk.used;
+  chunk.used += encoded.size();
+  return position;
+}
+
+QVReportingPayloadStore::Position QVReportingPayloadStore::append(const QVDictionary& payload) {
+  const std::lock_guard lock(mutex_);
+  scratch_.clear();
+  const uint64_t keySet = keySetOf(payload);
+  QVReportingEncodeNumber(scratch_, keySet);
+  if (keySet == 0) QVReportingEncodeNumber(scratch_, payload.size());
+  for (const auto& entry : payload) {
+    if (keySet == 0) QVReportingEncodeText(scratch_, entry.key);
+    QVReportingEncodeValue(scratch_, entry.value);
+  }
+  return place(scratch_);
+}
+
+QVDictionary QVReportingPayloadStore::payload(Position position) const {
+  const std::lock_guard lock(mutex_);
+  const Chunk& chunk = chunks_[position >> kOffsetBits];
+  QVReportingPayloadDecoder decoder(chunk.bytes.get() +
+                                    (position & ((Position{1} << kOffsetBits) - 1)));
+  const uint64_t keySet = decoder.number();
+  const Keys* keys = keySet == 0 ? nullptr : &keySets_[keySet - 1];
+  std::vector<QVDictionaryEntry> entries(keys == nullptr ? decoder.number() : keys->size());
+  for (std::size_t i = 0; i < entries.size(); ++i) {
+    entries[i].key = keys == nullptr ? decoder.text() : std::string_view((*keys)[i]);
+    entries[i].value = decoder.value();
+  }
+  return QVDictionary::assemble(entries);
+}
+
+uint32_t QVReportingPayloadStore::intern(std::string_view text) {
+  const std::lock_guard lock(mutex_);
+  if (const auto known = textNumbers_.find(text); known != textNumbers_.end()) {
+    return known->second;
+  }
+  const auto number = static_cast<uint32_t>(texts_.size());
+  texts_.emplace_back(text);
+  textNumbers_.emplace(text, number);
+  return number;
+}
+
+std::string QVReportingPayloadStore::interned(uint32_t number) const {
+  const std::lock_guard lock(mutex_);
+  return texts_[number];
+}
+
+std::size_t QVReportingPayloadStore::footprint() const {
+  const std::lock_guard lock(mutex_);
+  std::size_t bytes = 0;
+  for (const Chunk& chunk : chunks_) bytes += chunk.capacity;
+  return bytes;
+}

@@ -1,0 +1,64 @@
+#pragma once
+
+#include "platform/QVValue.h"
+
+#include <cstdint>
+#include <map>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <string_view>
+#include <vector>
+
+// Keeps the payloads of one running session encoded in a fraction of their decoded size: the keys
+// of a payload are kept once per set of keys, values in as few bytes as they need. Shared by the
+// session's two payload arrays, so that a payload is kept once for both.
+//
+// Append-only; everything goes with the last owner.
+// Threads: any; locked inside, never calls out.
+class QVReportingPayloadStore {
+ public:
+  // Names one payload within its store.
+  using Position = uint64_t;
+
+  Position append(const QVDictionary& payload);
+  QVDictionary payload(Position position) const;
+
+  // A short number for a text that many entries share.
+  uint32_t intern(std::string_view text);
+  std::string interned(uint32_t number) const;
+
+  // Bytes of memory that the encoded payloads take.
+  std::size_t footprint() const;
+
+ private:
+  using Keys = std::vector<std::string>;
+
+  // Sets of keys beyond these are written out with each payload: a client that never sends the
+  // same keys twice must not make the table larger than what it describes.
+  static constexpr std::size_t kMaximumKeySets = 4096;
+  // Chunks grow from the first size to the last, so that a session with one message stays small.
+  static constexpr std::size_t kFirstChunkBytes = 512;
+  static constexpr std::size_t kLargestChunkBytes = 65536;
+
+  struct Chunk {
+    std::unique_ptr<uint8_t[]> bytes;
+    std::size_t used = 0;
+    std::size_t capacity = 0;
+  };
+
+  static bool hasKeys(const QVDictionary& payload, const Keys& keys);
+  // The number of the payload's set of keys, from 1; 0 where it has to be written out.
+  uint64_t keySetOf(const QVDictionary& payload);
+  Position place(std::string_view encoded);
+
+  mutable std::mutex mutex_;
+  // All guarded by mutex_.
+  std::vector<Keys> keySets_;
+  std::multimap<std::size_t, std::size_t> keySetsByHash_;
+  std::size_t latestKeySet_ = 0;  // index into keySets_; messages come in runs of one kind
+  std::vector<Chunk> chunks_;
+  std::vector<std::string> texts_;
+  std::map<std::string, uint32_t, std::less<>> textNumbers_;
+  std::string scratch_;  // the payload being encoded, kept for its capacity
+};

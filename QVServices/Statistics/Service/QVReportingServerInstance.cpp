@@ -1,0 +1,298 @@
+#include "QVServices/Statistics/Service/QVReportingServerInstance.h"
+
+#include "QVServices/Statistics/QVReportingVocabulary.h"
+#include "QVServices/Statistics/Service/QVReportingServer.h"
+#include "platform/QVPlatform.h"
+
+#include <algorithm>
+#include <utility>
+
+namespace {
+
+constexpr uint32_t kTraceCreate = 0x21042814;
+constexpr uint32_t kTraceStart = 0x21042818;
+constexpr uint32_t kTraceStop = 0x2104281c;
+constexpr uint32_t kTraceDestroy = 0x21042820;
+
+// Exit status of a service that a client ended.
+constexpr int kKilledStatus = 2;
+
+QVLog& log() {
+  return *QVPlatform::shared().log;
+}
+const QVLogScope* scope() {
+  return QVReportingServer::logScope();
+}
+void mark(uint32_t code) {
+  QVPlatform::shared().tracePoints->mark(code);
+}
+
+}  // namespace
+
+std::shared_ptr<QVReportingServerInstance> QVReportingServerInstance::initWithPID(
+    int32_t pid, std::weak_ptr<QVReportingServiceDelegateProtocol> delegate) {
+  log().standard(scope(), "-[QVReportingServerInstance initWithPID:delegate:]",
+                 "new client with pid ", pid);
+  return std::shared_ptr<QVReportingServerInstance>(
+      new QVReportingServerInstance(pid, std::move(delegate)));
+}
+
+QVReportingServerInstance::QVReportingServerInstance(
+    int32_t pid, std::weak_ptr<QVReportingServiceDelegateProtocol> delegate)
+    : processIdentifier_(pid), delegate_(std::move(delegate)) {}
+
+QVReportingServerInstance::~QVReportingServerInstance() {
+  log().standard(scope(), "-[QVReportingServerInstance dealloc]", "dealloc ", processIdentifier_,
+                 " from the server client list");
+}
+
+std::optional<QVDate> QVReportingServerInstance::clientStartDate() const {
+  const std::lock_guard lock(mutex_);
+  return clientStartDate_;
+}
+
+void QVReportingServerInstance::setClientStartDate(QVDate date) {
+  const std::lock_guard lock(mutex_);
+  clientStartDate_ = date;
+}
+
+std::optional<std::string> QVReportingServerInstance::clientProcessName() const {
+  const std::lock_guard lock(mutex_);
+  return clientProcessName_;
+}
+
+void QVReportingServerInstance::setClientProcessName(std::optional<std::string> name) {
+  const std::lock_guard lock(mutex_);
+  clientProcessName_ = std::move(name);
+}
+
+std::shared_ptr<QVReportingSession> QVReportingServerInstance::findReportingSessionForID(
+    int64_t reporterID, bool acrossAllClients) const {
+  const auto own = clientReportingSessionMap_.find(reporterID);
+  if (own != clientReportingSessionMap_.end()) return own->second;
+  if (!acrossAllClients) return nullptr;
+  const auto delegate = delegate_.lock();
+  return delegate ? delegate->findReportingSessionForID(reporterID) : nullptr;
+}
+
+void QVReportingServerInstance::createReportingSession(int64_t reporterID, Reply<bool> reply) {
+  log().verbose(scope(), "-[QVReportingServerInstance createReportingSession:reply:]",
+                "creating session for reporter ", reporterID);
+  QVReportingServer::queue().async(
+      [self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
+        mark(kTraceCreate);
+        self->create(reporterID, reply);
+      });
+}
+
+void QVReportingServerInstance::create(int64_t reporterID, Reply<bool>& reply) {
+  constexpr const char* kFunction = "-[QVReportingServerInstance createReportingSession:reply:]";
+  if (clientReportingSessionMap_.size() >= kMaximumSessions &&
+      !clientReportingSessionMap_.contains(reporterID)) {
+    log().error(scope(), kFunction, "client ", processIdentifier_, " has ", kMaximumSessions,
+                " sessions, none created for reporter ", reporterID);
+  } else {
+    // A session that was there is let go, not stopped.
+    clientReportingSessionMap_[reporterID] =
+        QVReportingSession::initWithID(reporterID, {processIdentifier_});
+    log().standard(scope(), kFunction, "session created for reporter ", reporterID);
+  }
+  reply(true);
+}
+
+void QVReportingServerInstance::setServiceType(uint16_t serviceType, int64_t reportingSession,
+                                               Reply<bool> reply) {
+  constexpr const char* kFunction =
+      "-[QVReportingServerInstance setServiceType:reportingSession:reply:]";
+  log().verbose(scope(), kFunction, "setting service type ", serviceType, " for reporter ",
+                reportingSession);
+  QVReportingServer::queue().async([self = shared_from_this(), serviceType, reportingSession,
+                                    reply = std::move(reply)]() mutable {
+    if (reportingSession != 0) {
+      if (const auto session = self->findReportingSessionForID(reportingSession, false)) {
+        session->setServiceType(serviceType);
+        log().standard(scope(), kFunction, "service type ", serviceType, " set for reporter  ",
+                       reportingSession);
+      }
+    }
+    reply(true);
+  });
+}
+
+void QVReportingServerInstance::getServiceNameForReporterID(int64_t reporterID,
+                                                            Reply<uint16_t> reply) {
+  log().verbose(scope(), "-[QVReportingServerInstance getServiceNameForReporterID:reply:]",
+                "fetching seviceType");
+  QVReportingServer::queue().async(
+      [self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
+        self->answerServiceType(reporterID, reply);
+      });
+}
+
+void QVReportingServerInstance::answerServiceType(int64_t reporterID,
+                                                  Reply<uint16_t>& reply) const {
+  // ID 0 is answered at once and, as clients have come to expect, once more below.
+  if (reporterID == 0) reply(kQVReportingServiceTypeUnknown);
+  const auto session = findReportingSessionForID(reporterID, true);
+  const uint16_t answer = session ? session->serviceType() : kQVReportingServiceTypeUnknown;
+  reply(answer);
+  log().standard(scope(), "-[QVReportingServerInstance getServiceNameForReporterID:reply:]",
+                 "returnning service type ", answer, " for reporter  ", reporterID);
+}
+
+void QVReportingServerInstance::setConfiguration(QVDictionary configuration, int64_t forReporterID,
+                                                 Reply<bool> reply) {
+  log().verbose(scope(), "-[QVReportingServerInstance setConfiguration:forReporterID:reply:]",
+                "setting configuration");
+  QVReportingServer::queue().async([self = shared_from_this(),
+                                    configuration = std::move(configuration), forReporterID,
+                                    reply = std::move(reply)]() mutable {
+    if (const auto session = self->findReportingSessionForID(forReporterID, false)) {
+      session->setConfiguration(configuration);
+    }
+    reply(true);
+  });
+}
+
+void QVReportingServerInstance::startReportingSessionForID(int64_t reporterID, Reply<bool> reply) {
+  log().verbose(scope(), "-[QVReportingServerInstance startReportingSessionForID:reply:]",
+                "starting session for reporter ", reporterID);
+  QVReportingServer::queue().async(
+      [self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
+        mark(kTraceStart);
+        self->start(reporterID, std::move(reply));
+      });
+}
+
+void QVReportingServerInstance::start(int64_t reporterID, Reply<bool> reply) {
+  const auto session = reporterID == 0 ? nullptr : findReportingSessionForID(reporterID, true);
+  if (session == nullptr || session->started()) {
+    reply(true);
+    return;
+  }
+  session->start();
+  if (const auto delegate = delegate_.lock()) session->setDriverSnapShot(delegate->getSnapShot());
+  if (auto waiting = std::exchange(session->transactionCompleteBlock(), nullptr)) waiting(true);
+  // Answered by the session's next stop, or by a later start that finds it waiting.
+  session->setTransactionCompleteBlock(std::move(reply));
+}
+
+void QVReportingServerInstance::stopReportingSessionForID(int64_t reporterID, Reply<bool> reply) {
+  log().verbose(scope(), "-[QVReportingServerInstance stopReportingSessionForID:reply:]",
+                "stopping session for reporter ", reporterID);
+  QVReportingServer::queue().async(
+      [self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
+        mark(kTraceStop);
+        self->stop(reporterID, reply);
+      });
+}
+
+void QVReportingServerInstance::stop(int64_t reporterID, Reply<bool>& reply) {
+  constexpr const char* kFunction = "-[QVReportingServerInstance stopReportingSessionForID:reply:]";
+  if (reporterID == 0) {
+    reply(true);
+    return;
+  }
+  if (const auto session = findReportingSessionForID(reporterID, false)) {
+    QVDictionary grown;
+    if (const auto delegate = delegate_.lock()) {
+      grown = delegate->getDriverStatisticsRelativeToSnapShot(session->driverSnapShot());
+    }
+    if (grown.isAbsent()) {
+      log().standard(scope(), kFunction, "nothing interesting to fetch from the drivers");
+    } else {
+      session->sendMessage(grown, kQVReportingCategoryTallying, kQVReportingMessageTypeGeneric, {});
+      log().standard(scope(), kFunction, "fetching driver logs ", grown);
+    }
+    session->setDriverSnapShot({});
+    session->stop();
+    if (auto waiting = std::exchange(session->transactionCompleteBlock(), nullptr)) waiting(true);
+  }
+  log().standard(scope(), kFunction, "stopping ", reporterID);
+  reply(true);
+}
+
+void QVReportingServerInstance::destroyReportingSession(int64_t reporterID, Reply<bool> reply) {
+  log().verbose(scope(), "-[QVReportingServerInstance destroyReportingSession:reply:]",
+                "destroying session for reporter ", reporterID);
+  QVReportingServer::queue().async(
+      [self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
+        mark(kTraceDestroy);
+        self->destroy(reporterID, reply);
+      });
+}
+
+void QVReportingServerInstance::destroy(int64_t reporterID, Reply<bool>& reply) {
+  if (reporterID == 0) {
+    reply(true);
+    return;
+  }
+  const auto entry = clientReportingSessionMap_.find(reporterID);
+  if (entry != clientReportingSessionMap_.end()) {
+    if (entry->second->started()) entry->second->stop();
+    clientReportingSessionMap_.erase(entry);
+  }
+  log().standard(scope(), "-[QVReportingServerInstance destroyReportingSession:reply:]",
+                 "destroying ", reporterID);
+  reply(true);
+}
+
+void QVReportingServerInstance::reporterID(int64_t reporterID, Reply<QVDictionary> valid) {
+  log().verbose(scope(), "-[QVReportingServerInstance reporterID:valid:]", "validating reporter ",
+                reporterID);
+  QVReportingServer::queue().async(
+      [self = shared_from_this(), reporterID, reply = std::move(valid)]() mutable {
+        self->answerValidity(reporterID, reply);
+      });
+}
+
+void QVReportingServerInstance::answerValidity(int64_t reporterID,
+                                               Reply<QVDictionary>& reply) const {
+  const auto session = findReportingSessionForID(reporterID, true);
+  log().standard(scope(), "-[QVReportingServerInstance reporterID:valid:]", "validating reporter ",
+                 reporterID);
+  reply({{"reporterID", session ? reporterID : int64_t{0}},
+         {"serviceType", session ? session->serviceType() : kQVReportingServiceTypeUnknown}});
+}
+
+void QVReportingServerInstance::getAllReporters(Reply<std::vector<int64_t>> reply) {
+  QVReportingServer::queue().async([self = shared_from_this(), reply = std::move(reply)]() mutable {
+    self->answerAllReporters(reply);
+  });
+}
+
+void QVReportingServerInstance::answerAllReporters(Reply<std::vector<int64_t>>& reply) const {
+  std::vector<int64_t> reporterIDs;
+  if (const auto delegate = delegate_.lock()) {
+    for (const auto& client : delegate->getAllClients()) {
+      for (const auto& [reporterID, session] : client->clientReportingSessionMap()) {
+        reporterIDs.push_back(reporterID);
+      }
+    }
+  }
+  reply(std::move(reporterIDs));
+}
+
+void QVReportingServerInstance::killService([[maybe_unused]] Reply<bool> reply) {
+  log().standard(scope(), "-[QVReportingServerInstance killService:]", "DESTROYING SERVICE");
+  log().flush();
+  QVPlatform::shared().process->exitImmediately(kKilledStatus);
+}
+
+void QVReportingServerInstance::handleConnectionError() {
+  QVReportingServer::queue().async([self = shared_from_this()] { self->removeFromService(); });
+}
+
+void QVReportingServerInstance::removeFromService() {
+  const auto delegate = delegate_.lock();
+  if (delegate == nullptr) return;
+  const auto& clients = delegate->getAllClients();
+  const auto isThis = [this](const auto& client) { return client.get() == this; };
+  if (std::ranges::none_of(clients, isThis)) return;
+  for (const auto& [reporterID, session] : clientReportingSessionMap_) {
+    if (session->started()) session->stop();
+  }
+  delegate->removeClient(*this);
+  log().standard(scope(), "-[QVReportingServerInstance handleConnectionError]", "removing ",
+                 processIdentifier_, " from the server client list");
+}

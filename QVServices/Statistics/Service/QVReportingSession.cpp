@@ -1,0 +1,228 @@
+#include "QVServices/Statistics/Service/QVReportingSession.h"
+
+#include "QVServices/Statistics/QVReportingUtility.h"
+#include "QVServices/Statistics/QVReportingVocabulary.h"
+#include "QVServices/Statistics/Service/QVReportingBeaconClient.h"
+#include "QVServices/Statistics/Service/QVReportingSessionLog.h"
+#include "platform/QVPlatform.h"
+
+#include <cstdlib>
+#include <utility>
+
+namespace {
+
+constexpr uint32_t kTraceCreated = 0x21042828;
+constexpr uint32_t kTraceStarted = 0x2104282C;
+constexpr uint32_t kTraceStopped = 0x21042830;
+constexpr uint32_t kTraceDestroyed = 0x21042834;
+
+constexpr const char* kBackendWaitSeconds = "9.0";
+
+// Device class on which orientation means nothing.
+constexpr int32_t kDeviceClassWithoutOrientation = 6;
+
+QVPlatform& platform() {
+  return QVPlatform::shared();
+}
+QVLog& log() {
+  return *platform().log;
+}
+const QVLogScope* scope() {
+  return QVReportingSessionLog::scope();
+}
+
+// What the completion of a backend search and the waiting set-up share. The flag is written and
+// read under the condition's lock.
+struct BackendSearch {
+  std::shared_ptr<QVCondition> condition;
+  bool found;
+};
+
+void handleBackends(BackendSearch& search, const std::optional<QVArray>& backends) {
+  constexpr const char* kFunction = "-[QVReportingSession start]";
+  if (!backends) {
+    log().error(scope(), kFunction, "No backends found, this session won't get sent to the server");
+    return;
+  }
+  log().standard(scope(), kFunction, "List of backends ", *backends);
+  const std::lock_guard lock(*search.condition);
+  search.found = true;
+  search.condition->signal();
+}
+
+}  // namespace
+
+std::shared_ptr<QVReportingSession> QVReportingSession::initWithID(
+    int64_t reporterID, std::vector<int32_t> processIdentifiers) {
+  QVReportingSessionLog::registerScope();
+  std::shared_ptr<QVReportingSession> session(
+      new QVReportingSession(reporterID, std::move(processIdentifiers)));
+  log().info(scope(), "-[QVReportingSession initWithID:processIdentifiers:]",
+             "created reporting session for ID: ", reporterID);
+  platform().tracePoints->mark(kTraceCreated);
+  return session;
+}
+
+QVReportingSession::QVReportingSession(int64_t reporterID, std::vector<int32_t> processIdentifiers)
+    : reporterID_(reporterID),
+      processIdentifiers_(std::move(processIdentifiers)),
+      userInfo_(std::make_shared<QVReportingUserInfo>()),
+      beaconQueue_(platform().queues->makeSerialQueue("net.quillon.quietvox.session.beacon",
+                                                      QVQualityOfService::utility, 0)),
+      serviceType_(kQVReportingServiceTypeUnknown),
+      serviceName_("unknown") {
+  makeEmptyPayloadArrays();
+}
+
+QVReportingSession::~QVReportingSession() {
+  log().info(scope(), "-[QVReportingSession dealloc]", "deallocing this session ", reporterID_);
+  platform().tracePoints->mark(kTraceDestroyed);
+}
+
+void QVReportingSession::setServiceType(uint16_t serviceType) {
+  serviceType_ = serviceType;
+  serviceName_ = QVReportingServiceTypeName(serviceType);
+  log().info(scope(), "-[QVReportingSession setServiceType:]", "setting service type ",
+             serviceName_);
+}
+
+void QVReportingSession::setConfiguration(const QVDictionary& configuration) {
+  userInfo_->addEntries(configuration);
+}
+
+void QVReportingSession::updateDefaults(const QVDictionary& defaults) {
+  userInfo_->addEntries(defaults);
+}
+
+void QVReportingSession::start() {
+  constexpr const char* kFunction = "-[QVReportingSession start]";
+  log().verbose(scope(), kFunction, "starting session owned by ", reporterID_);
+  if (started_) {
+    log().info(scope(), kFunction, reporterID_, " is already started");
+    return;
+  }
+  started_ = true;
+  makeEmptyPayloadArrays();
+  platform().tracePoints->mark(kTraceStarted);
+  if (shouldReportOrientation()) {
+    orientationCallbackID_ = QVText("QVReportingService ", reporterID_);
+    startDate_ = platform().clock->currentDate();
+  }
+  // Name and type are those of now, the user information is read when the set-up runs.
+  beaconQueue_->async([self = shared_from_this(), serviceName = serviceName_,
+                       serviceType = serviceType(), startFlag = beaconSessionStarted()] {
+    self->setUpBeaconSession(serviceName, serviceType, startFlag);
+  });
+}
+
+void QVReportingSession::setUpBeaconSession(const std::optional<std::string_view>& serviceName,
+                                            uint16_t serviceType, bool startFlag) {
+  if (serviceType == kQVReportingServiceTypeTest) return;
+
+  QVBeacon& beacon = *platform().beacon;
+  beaconAgentToken_ = beacon.newSecureHierarchyTokenFromParentToken(nullptr);
+  const bool realtime = serviceType == kQVReportingServiceTypeAPIUsage;
+  const QVDictionary sessionInfo{
+      {kBeaconSessionInfoClientType, QVReportingBeaconClient::kType},
+      {kBeaconSessionInfoClientVersion, QVReportingBeaconClient::version()},
+      {kBeaconSessionInfoSessionID, reporterID_},
+      {kBeaconSessionInfoBatchEvent, !realtime},
+      {kBeaconSessionInfoHierarchyToken, beaconAgentToken_->description()},
+      {kBeaconSessionInfoContainsRealtimeEvents, realtime}};
+  // The client's entries come last: they may replace the two names.
+  const QVDictionary userInfo =
+      QVDictionary{{kBeaconUserInfoClientName, QVReportingBeaconClient::kName},
+                   {kBeaconUserInfoServiceName, QVText(serviceName, "_session")}}
+          .merging(this->userInfo());
+  beaconSession_ = beacon.initWithSessionInfo(sessionInfo, userInfo, {});
+
+  const auto search =
+      std::make_shared<BackendSearch>(platform().conditions->makeCondition(), startFlag);
+  beaconSession_->startConfigurationWithCompletionHandler(
+      [search](const std::optional<QVArray>& backends) { handleBackends(*search, backends); });
+  if (!QVReportingUtilityWait(*search->condition, search->found,
+                              "waiting for beacond to find backends", "failed to find backend",
+                              scope(), std::strtod(kBackendWaitSeconds, nullptr))) {
+    beaconSession_ = nullptr;
+    beaconSessionStarted_ = false;
+  }
+  // Success is not stored: it is known to the search alone, and `beaconSessionStarted` stays false.
+}
+
+void QVReportingSession::stop() {
+  constexpr const char* kFunction = "-[QVReportingSession stop]";
+  log().verbose(scope(), kFunction, "ending session ", reporterID_);
+  if (shouldReportOrientation() && orientationCallbackID_) orientationCallbackID_.reset();
+  if (!started_) return;
+
+  // Written again for a started session; tools count on two lines.
+  log().verbose(scope(), kFunction, "ending session ", reporterID_);
+  platform().tracePoints->mark(kTraceStopped);
+  const QVDictionary summary = createSummaryEventForSession();
+  if (!summary.isAbsent()) {
+    log().standard(scope(), kFunction, "sending summary event for reporter ", reporterID_);
+    sendMessage(summary, kQVReportingCategorySummary, kQVReportingMessageTypeSummary, true, {});
+  }
+  beaconQueue_->async([self = shared_from_this()] { self->flushBeaconSession(); });
+  replacePayloadArrays(nullptr, nullptr);
+  started_ = false;
+}
+
+void QVReportingSession::flushBeaconSession() {
+  if (serviceType() == kQVReportingServiceTypeTest || beaconSession_ == nullptr) return;
+  beaconSession_->flushMessagesWithCompletion([](const std::optional<QVError>& error) {
+    if (error) {
+      log().error(scope(), "-[QVReportingSession stop]", "flush error ", error->description());
+    }
+  });
+  beaconSession_ = nullptr;
+}
+
+bool QVReportingSession::shouldReportOrientation() const {
+  const uint16_t type = serviceType();
+  return QVReportingIsInternalBuild() &&
+         (type == kQVReportingServiceTypeLongFormAudio ||
+          type == kQVReportingServiceTypeTelephony) &&
+         platform().deviceInformation->integerAnswer("DeviceClassNumber").value_or(0) !=
+             kDeviceClassWithoutOrientation;
+}
+
+std::shared_ptr<QVReportingPayloadArray> QVReportingSession::aggregatedPayloadData() const {
+  const std::lock_guard lock(payloadArraysMutex_);
+  return aggregatedPayloadData_;
+}
+
+std::shared_ptr<QVReportingPayloadArray> QVReportingSession::nestedAggregatedPayloadData() const {
+  const std::lock_guard lock(payloadArraysMutex_);
+  return nestedAggregatedPayloadData_;
+}
+
+void QVReportingSession::makeEmptyPayloadArrays() {
+  const auto store = std::make_shared<QVReportingPayloadStore>();
+  replacePayloadArrays(std::make_shared<QVReportingPayloadArray>(store),
+                       std::make_shared<QVReportingPayloadArray>(store));
+}
+
+void QVReportingSession::replacePayloadArrays(std::shared_ptr<QVReportingPayloadArray> aggregated,
+                                              std::shared_ptr<QVReportingPayloadArray> nested) {
+  // Each property changes under the lock of the array that it held, so that whoever has that lock
+  // works on the array that the session means; the lock is let go before the array may go.
+  const auto replace = [this](std::shared_ptr<QVReportingPayloadArray>& property,
+                              std::shared_ptr<QVReportingPayloadArray>& replacement) {
+    std::shared_ptr<QVReportingPayloadArray> old;
+    {
+      const std::lock_guard lock(payloadArraysMutex_);
+      old = property;
+    }
+    std::unique_lock<QVReportingPayloadArray> arrayLock;
+    if (old) arrayLock = std::unique_lock(*old);
+    const std::lock_guard lock(payloadArraysMutex_);
+    property = std::move(replacement);
+  };
+  replace(aggregatedPayloadData_, aggregated);
+  replace(nestedAggregatedPayloadData_, nested);
+}
+
+std::string QVReportingSession::description() const {
+  return QVText("<QVReportingSession ", reporterID_, '>');
+}
