@@ -4,7 +4,6 @@
 
 #include <atomic>
 #include <cstdint>
-#include <source_location>
 #include <string>
 #include <string_view>
 
@@ -20,14 +19,16 @@ struct QVLogScope {
 };
 
 // Where a line comes from: the function as the log names it ("-[QVReportingSession start]"), with
-// file and line of the place that names it. Made implicitly from the function's name.
+// file and line of the place that names it. Made implicitly from the function's name. (Not
+// std::source_location, which clang 14 lacks.)
 struct QVLogSite {
   const char* function;
-  std::source_location place;
+  const char* file;  // as the compiler was given it, with directories
+  uint32_t line;
 
-  QVLogSite(const char* functionName,
-            std::source_location location = std::source_location::current())
-      : function(functionName), place(location) {}
+  QVLogSite(const char* functionName, const char* fileName = __builtin_FILE(),
+            uint32_t lineNumber = __builtin_LINE())
+      : function(functionName), file(fileName), line(lineNumber) {}
 };
 
 // The service's log. Every line begins with "file:line:function: " (the file's name without

@@ -1,7 +1,14 @@
 #include "platform/fake/QVFakeCondition.h"
 
-#include <cstdio>
-#include <cstdlib>
+#include "platform/fake/QVFakeAbort.h"
+
+namespace {
+
+void require(bool fulfilled, const char* rule) {
+  if (!fulfilled) QVFakeAbort(std::string("QVFakeCondition: wrong use: ") + rule);
+}
+
+}  // namespace
 
 QVFakeCondition::QVFakeCondition(QVFakeWorkQueues& queues, const QVFakeClock& clock,
                                  const std::atomic<bool>& waitsAreCutShort)
@@ -39,10 +46,4 @@ void QVFakeCondition::signal() {
   require(locked_, "signal() without the lock");
   ++signalCount_;
   if (pendingSignalCount_ < waiterCount_) ++pendingSignalCount_;
-}
-
-void QVFakeCondition::require(bool fulfilled, const char* rule) const {
-  if (fulfilled) return;
-  std::fprintf(stderr, "QVFakeCondition: wrong use: %s\n", rule);
-  std::abort();
 }

@@ -26,8 +26,6 @@ class QVFakeCondition final : public QVCondition {
   std::size_t signalCount() const { return signalCount_; }
 
  private:
-  void require(bool fulfilled, const char* rule) const;
-
   QVFakeWorkQueues& queues_;
   const QVFakeClock& clock_;
   const std::atomic<bool>& waitsAreCutShort_;

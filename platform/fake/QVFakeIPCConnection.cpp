@@ -1,9 +1,7 @@
 #include "platform/fake/QVFakeIPCConnection.h"
 
 #include "platform/QVText.h"
-
-#include <cstdio>
-#include <cstdlib>
+#include "platform/fake/QVFakeAbort.h"
 
 std::string QVFakeIPCConnection::description() const {
   return QVText("connection ", number_, " of process ", processIdentifier_);
@@ -43,9 +41,7 @@ QVReportingServiceProtocol& QVFakeIPCConnection::call() {
   }
   if (state_ == State::resumed && exportedObject_ == nullptr) obstacle = "it exports no object";
   if (obstacle != nullptr) {
-    std::fprintf(stderr, "QVFakeIPCConnection: %s cannot be called: %s\n", description().c_str(),
-                 obstacle);
-    std::abort();
+    QVFakeAbort(QVText("QVFakeIPCConnection: ", description(), " cannot be called: ", obstacle));
   }
   return *exportedObject_;
 }

@@ -24,11 +24,11 @@ QVLogScope* QVFakeLog::registerScope(bool enabled, uint32_t code, std::string_vi
 
 void QVFakeLog::write(const QVLogScope* scope, QVLogLevel level, const QVLogSite& site,
                       std::string text) {
-  const std::string_view path = site.place.file_name();
+  const std::string_view path = site.file;
   const std::lock_guard lock(mutex_);
   lines_.push_back({level, scope == nullptr ? std::string(kDefaultScope) : scope->name,
                     site.function, std::move(text), std::string(path.substr(path.rfind('/') + 1)),
-                    site.place.line()});
+                    site.line});
 }
 
 void QVFakeLog::flush() {

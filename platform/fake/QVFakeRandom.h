@@ -1,9 +1,9 @@
 #pragma once
 
 #include "platform/QVRandom.h"
+#include "platform/QVText.h"
+#include "platform/fake/QVFakeAbort.h"
 
-#include <cstdio>
-#include <cstdlib>
 #include <deque>
 #include <mutex>
 #include <vector>
@@ -20,8 +20,7 @@ class QVFakeRandom final : public QVRandom {
     const uint32_t value = script_.front();
     script_.pop_front();
     if (value >= bound) {
-      std::fprintf(stderr, "QVFakeRandom: scripted %u is not below the bound %u\n", value, bound);
-      std::abort();
+      QVFakeAbort(QVText("QVFakeRandom: scripted ", value, " is not below the bound ", bound));
     }
     return value;
   }

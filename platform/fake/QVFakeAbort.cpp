@@ -1,0 +1,9 @@
+#include "platform/fake/QVFakeAbort.h"
+
+#include <cstdlib>
+#include <iostream>
+
+void QVFakeAbort(const std::string& message) {
+  std::cerr << message << std::endl;
+  std::abort();
+}
