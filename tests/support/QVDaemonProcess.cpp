@@ -1,0 +1,107 @@
+#include "tests/support/QVDaemonProcess.h"
+
+#include <csignal>
+#include <fstream>
+#include <iterator>
+#include <stdexcept>
+#include <string_view>
+
+#include <poll.h>
+#include <sys/socket.h>
+#include <sys/un.h>
+#include <time.h>
+#include <unistd.h>
+
+namespace {
+
+constexpr std::chrono::seconds kReadinessLimit{60};
+
+std::filesystem::path readinessPath(const QVTemporaryRoot& root) {
+  return root.path() / "ready";
+}
+std::filesystem::path logPath(const QVTemporaryRoot& root) {
+  return root.path() / "log";
+}
+
+std::string contents(const std::filesystem::path& file) {
+  std::ifstream stream(file);
+  return {std::istreambuf_iterator<char>(stream), {}};
+}
+
+}  // namespace
+
+std::filesystem::path QVDaemonProcess::program(const std::string& name) {
+  return std::filesystem::read_symlink("/proc/self/exe").parent_path() / name;
+}
+
+std::filesystem::path QVDaemonProcess::program() {
+  return program("quietvoxd");
+}
+
+std::map<std::string, std::string> QVDaemonProcess::environment(const QVTemporaryRoot& root) {
+  return {{"RUNTIME_DIRECTORY", root.runtime()},
+          {"STATE_DIRECTORY", root.state()},
+          {"LOGS_DIRECTORY", root.logs()},
+          {"CONFIGURATION_DIRECTORY", root.configuration()},
+          {"NOTIFY_SOCKET", readinessPath(root)}};
+}
+
+int QVDaemonProcess::makeReadinessSocket(const QVTemporaryRoot& root) {
+  const int socket = ::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+  sockaddr_un address{.sun_family = AF_UNIX, .sun_path = {}};
+  const std::string path = readinessPath(root);
+  ::unlink(path.c_str());
+  path.copy(address.sun_path, sizeof address.sun_path - 1);
+  if (::bind(socket, reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) {
+    throw std::runtime_error("cannot bind " + path);
+  }
+  return socket;
+}
+
+QVDaemonProcess::QVDaemonProcess(const QVTemporaryRoot& root, int inheritedSocket)
+    : root_(root),
+      readiness_(makeReadinessSocket(root)),
+      process_({.arguments = {program().string()},
+                .environment = environment(root),
+                .standardOutputFile = logPath(root),
+                .standardErrorFile = logPath(root),
+                .inheritedDescriptor = inheritedSocket}) {
+  pollfd events[] = {{readiness_, POLLIN, 0}, {process_.endDescriptor(), POLLIN, 0}};
+  const auto limit = std::chrono::milliseconds(kReadinessLimit);
+  char text[256];
+  if (::poll(events, 2, static_cast<int>(limit.count())) > 0 && events[0].revents != 0) {
+    const ssize_t length = ::recv(readiness_, text, sizeof text, 0);
+    const std::string_view message(text, length > 0 ? static_cast<std::size_t>(length) : 0);
+    if (message.find("READY=1") != std::string_view::npos) return;
+  }
+  throw std::runtime_error("the service did not become ready:\n" + log());
+}
+
+QVDaemonProcess::~QVDaemonProcess() {
+  ::close(readiness_);
+}
+
+std::string QVDaemonProcess::log() const {
+  return contents(logPath(root_));
+}
+
+std::optional<QVSubprocess::Status> QVDaemonProcess::terminate() {
+  signal(SIGTERM);
+  return wait();
+}
+
+std::chrono::nanoseconds QVDaemonProcess::processorTime() const {
+  clockid_t clock;
+  timespec time;
+  if (::clock_getcpuclockid(pid(), &clock) != 0 || ::clock_gettime(clock, &time) != 0) {
+    throw std::runtime_error("the service has no processor clock");
+  }
+  return std::chrono::seconds(time.tv_sec) + std::chrono::nanoseconds(time.tv_nsec);
+}
+
+long QVDaemonProcess::statusNumber(const std::string& file, const std::string& key) const {
+  const std::string text = contents("/proc/" + std::to_string(pid()) + "/" + file);
+  const auto line = text.find(key + ":");
+  if (line == std::string::npos) throw std::runtime_error("no " + key + " in " + file);
+  return std::stol(text.substr(line + key.size() + 1));
+}
