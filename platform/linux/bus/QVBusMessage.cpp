@@ -2,7 +2,12 @@
 
 #include "platform/linux/bus/QVBusNames.h"
 
+#include <algorithm>
+
 namespace {
+
+// Bytes. Enough for all fields of a call, with names of usual length.
+constexpr std::size_t kLongestRememberedHeader = kBusFixedHeaderBytes + 256;
 
 // Reserved for a library's messages to itself; never to be sent.
 constexpr std::string_view kLocalPath = "/org/freedesktop/DBus/Local";
@@ -32,16 +37,11 @@ char typeOfField(unsigned code) noexcept {
 
 const char* QVBusMessage::parse(std::string_view bytes) noexcept {
   *this = QVBusMessage();
-  bigEndian_ = bytes[0] == 'B';
-  type_ = static_cast<QVBusMessageType>(bytes[1]);
-  flags_ = static_cast<uint8_t>(bytes[2]);
+  if (const char* reason = takeFixedPart(bytes)) return reason;
   if (type_ == QVBusMessageType::invalid) return "message of type 0";
-  const std::size_t bodyLength = QVBusLoad<uint32_t>(bytes.data() + 4, bigEndian_);
-  serial_ = QVBusLoad<uint32_t>(bytes.data() + 8, bigEndian_);
-  if (serial_ == 0) return "message without a serial";
 
-  QVBusReader reader(bytes.substr(0, bytes.size() - bodyLength), bigEndian_);
-  reader.readNumber<uint64_t>();  // what was read above
+  QVBusReader reader(bytes.substr(0, bytes.size() - body_.size()), bigEndian_);
+  reader.readNumber<uint64_t>();  // what was taken above
   reader.readNumber<uint32_t>();
   const std::size_t end = reader.enterArray(8);
   while (reader.position() < end) readField(reader);
@@ -49,9 +49,31 @@ const char* QVBusMessage::parse(std::string_view bytes) noexcept {
   reader.align(8);
   if (!reader.ok()) return reader.failure();
   if (!reader.atEnd()) return "header longer than its fields";
-
-  body_ = bytes.substr(bytes.size() - bodyLength);
   return checkFields();
+}
+
+const char* QVBusMessage::parse(std::string_view bytes, QVBusKnownHeader& known) {
+  const std::size_t bodyLength = QVBusLoad<uint32_t>(bytes.data() + 4, bytes[0] == 'B');
+  const auto header = bytes.substr(0, bytes.size() - bodyLength);
+  if (known.matches(header)) {
+    *this = known.message();
+    if (const char* reason = takeFixedPart(bytes)) return reason;
+    return checkBodyIsNamed();
+  }
+  const char* reason = parse(bytes);
+  if (reason == nullptr && type_ == QVBusMessageType::methodCall) known.remember(header);
+  return reason;
+}
+
+// Order, type, flags, serial and where the body lies.
+const char* QVBusMessage::takeFixedPart(std::string_view bytes) noexcept {
+  bigEndian_ = bytes[0] == 'B';
+  type_ = static_cast<QVBusMessageType>(bytes[1]);
+  flags_ = static_cast<uint8_t>(bytes[2]);
+  const std::size_t bodyLength = QVBusLoad<uint32_t>(bytes.data() + 4, bigEndian_);
+  body_ = bytes.substr(bytes.size() - bodyLength);
+  serial_ = QVBusLoad<uint32_t>(bytes.data() + 8, bigEndian_);
+  return serial_ == 0 ? "message without a serial" : nullptr;
 }
 
 void QVBusMessage::readField(QVBusReader& reader) noexcept {
@@ -122,7 +144,6 @@ const char* QVBusMessage::checkFields() const noexcept {
   if (has(QVBusField::sender) && !QVBusIsValidBusName(sender_)) return "not a bus name as sender";
   if (has(QVBusField::replySerial) && replySerial_ == 0) return "reply to serial 0";
   if (path_ == kLocalPath || interface_ == kLocalInterface) return "message for local use only";
-  if (!body_.empty() && signature_.empty()) return "body without a signature";
 
   switch (type_) {
     case QVBusMessageType::methodCall:
@@ -146,7 +167,11 @@ const char* QVBusMessage::checkFields() const noexcept {
     default:
       break;
   }
-  return nullptr;
+  return checkBodyIsNamed();
+}
+
+const char* QVBusMessage::checkBodyIsNamed() const noexcept {
+  return !body_.empty() && signature_.empty() ? "body without a signature" : nullptr;
 }
 
 const char* QVBusMessage::checkBody() const noexcept {
@@ -159,4 +184,17 @@ const char* QVBusMessage::checkBody() const noexcept {
   }
   if (!reader.ok()) return reader.failure();
   return reader.atEnd() ? nullptr : "body longer than its signature";
+}
+
+bool QVBusKnownHeader::matches(std::string_view header) const noexcept {
+  // Byte order and type, then from the fields' length on: what lies between differs by message.
+  return header.size() == header_.size() && header[0] == header_[0] && header[1] == header_[1] &&
+         header.substr(12) == std::string_view(header_).substr(12);
+}
+
+void QVBusKnownHeader::remember(std::string_view header) {
+  if (header.size() > kLongestRememberedHeader) return;
+  header_ = header;
+  std::fill_n(header_.begin() + 4, sizeof(uint32_t), '\0');  // no body here
+  if (message_.parse(header_) != nullptr) header_.clear();
 }

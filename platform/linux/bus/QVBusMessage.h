@@ -4,7 +4,10 @@
 #include "platform/linux/bus/QVBusReader.h"
 
 #include <cstdint>
+#include <string>
 #include <string_view>
+
+class QVBusKnownHeader;
 
 // One message: its header, checked, and its body, to be read. Views of the message's bytes; as
 // short-lived as those.
@@ -20,6 +23,9 @@ class QVBusMessage {
   // Takes in one message as QVBusFrameDecoder cut it out. Null where its header is in order, else
   // the reason why it is not.
   [[nodiscard]] const char* parse(std::string_view bytes) noexcept;
+  // The same, quicker for one of a row of calls to the same member: fields that equal those in
+  // `known` byte by byte are known to be in order. The views may then lie in `known`.
+  [[nodiscard]] const char* parse(std::string_view bytes, QVBusKnownHeader& known);
 
   // Checks the signature and every value of the body. Null or the reason.
   [[nodiscard]] const char* checkBody() const noexcept;
@@ -44,7 +50,9 @@ class QVBusMessage {
 
  private:
   void readField(QVBusReader& reader) noexcept;
+  const char* takeFixedPart(std::string_view bytes) noexcept;
   const char* checkFields() const noexcept;
+  const char* checkBodyIsNamed() const noexcept;
   bool has(QVBusField field) const noexcept {
     return (fields_ & (1U << static_cast<unsigned>(field))) != 0;
   }
@@ -56,4 +64,26 @@ class QVBusMessage {
   QVBusMessageType type_ = QVBusMessageType::invalid;
   uint8_t flags_ = 0;
   bool bigEndian_ = false;
+};
+
+// The fields of the last call that a connection took in, and what they say. A client's calls differ
+// in serial and body, seldom in the fields, and checking their names takes longer than all the rest
+// of a message.
+//
+// Threads: one at a time. One per connection.
+// Limits: only fields of up to 256 bytes are remembered.
+class QVBusKnownHeader {
+ public:
+  QVBusKnownHeader() = default;
+  QVBusKnownHeader(const QVBusKnownHeader&) = delete;
+  QVBusKnownHeader& operator=(const QVBusKnownHeader&) = delete;
+
+  // Does the message that begins with `header` have these fields, in the same byte order and type?
+  bool matches(std::string_view header) const noexcept;
+  const QVBusMessage& message() const noexcept { return message_; }
+  void remember(std::string_view header);
+
+ private:
+  std::string header_;
+  QVBusMessage message_;  // views of header_
 };

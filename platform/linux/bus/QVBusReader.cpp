@@ -1,7 +1,6 @@
 #include "platform/linux/bus/QVBusReader.h"
 
 #include "platform/linux/bus/QVBusNames.h"
-#include "platform/linux/bus/QVBusText.h"
 
 void QVBusReader::fail(const char* reason) noexcept {
   if (failure_ == nullptr) failure_ = reason;
@@ -22,32 +21,6 @@ void QVBusReader::skipPadding(std::size_t aligned) noexcept {
   }
 }
 
-bool QVBusReader::readBoolean() noexcept {
-  const auto number = readNumber<uint32_t>();
-  if (number > 1) fail("a boolean is neither 0 nor 1");
-  return number == 1;
-}
-
-std::string_view QVBusReader::readString() noexcept {
-  const std::size_t length = readNumber<uint32_t>();
-  // One byte more for the NUL behind it.
-  if (bytes_.size() - position_ <= length) {
-    fail("truncated");
-    return {};
-  }
-  const auto text = bytes_.substr(position_, length);
-  if (bytes_[position_ + length] != 0) {
-    fail("a string is not ended by NUL");
-    return {};
-  }
-  if (!QVBusIsValidText(text)) {
-    fail("a string is not UTF-8 without NUL");
-    return {};
-  }
-  position_ += length + 1;
-  return text;
-}
-
 std::string_view QVBusReader::readObjectPath() noexcept {
   const auto path = readString();
   if (ok() && !QVBusIsValidObjectPath(path)) {
@@ -55,21 +28,6 @@ std::string_view QVBusReader::readObjectPath() noexcept {
     return {};
   }
   return path;
-}
-
-std::string_view QVBusReader::readSignatureText() noexcept {
-  const std::size_t length = readNumber<uint8_t>();
-  if (bytes_.size() - position_ <= length) {
-    fail("truncated");
-    return {};
-  }
-  const auto text = bytes_.substr(position_, length);
-  if (bytes_[position_ + length] != 0) {
-    fail("a signature is not ended by NUL");
-    return {};
-  }
-  position_ += length + 1;
-  return text;
 }
 
 std::size_t QVBusReader::enterArray(std::size_t elementAlignment) noexcept {

@@ -3,6 +3,7 @@
 #include "platform/linux/bus/QVBusBytes.h"
 #include "platform/linux/bus/QVBusProtocol.h"
 #include "platform/linux/bus/QVBusSignature.h"
+#include "platform/linux/bus/QVBusText.h"
 
 #include <bit>
 #include <cstddef>
@@ -26,18 +27,27 @@ class QVBusReader {
   const char* failure() const noexcept { return failure_; }
   std::size_t position() const noexcept { return position_; }
   bool atEnd() const noexcept { return position_ == bytes_.size(); }
-  void fail(const char* reason) noexcept;
+  [[gnu::cold]] void fail(const char* reason) noexcept;
 
   // Goes to the next multiple of `alignment`; the bytes between must be 0.
   void align(std::size_t alignment) noexcept {
     const std::size_t aligned = QVBusAlign(position_, alignment);
-    if (aligned != position_) skipPadding(aligned);
+    if (aligned == position_) return;
+    if (bytes_.size() - position_ >= sizeof(uint64_t)) [[likely]] {
+      // All of the padding, which is less than a word, in one.
+      const auto word = QVBusLoad<uint64_t>(bytes_.data() + position_, false);
+      if (word << (64 - 8 * (aligned - position_)) == 0) {
+        position_ = aligned;
+        return;
+      }
+    }
+    skipPadding(aligned);
   }
 
   template <class Number>
   Number readNumber() noexcept {
     align(sizeof(Number));
-    if (bytes_.size() - position_ < sizeof(Number)) {
+    if (bytes_.size() - position_ < sizeof(Number)) [[unlikely]] {
       fail("truncated");
       return 0;
     }
@@ -45,12 +55,24 @@ class QVBusReader {
     position_ += sizeof(Number);
     return number;
   }
-  bool readBoolean() noexcept;
+  bool readBoolean() noexcept {
+    const auto number = readNumber<uint32_t>();
+    if (number > 1) [[unlikely]]
+      fail("a boolean is neither 0 nor 1");
+    return number == 1;
+  }
   double readDouble() noexcept { return std::bit_cast<double>(readNumber<uint64_t>()); }
-  std::string_view readString() noexcept;
+  std::string_view readString() noexcept {
+    const auto text = readTerminated(readNumber<uint32_t>());
+    if (!QVBusIsValidText(text)) [[unlikely]] {
+      fail("a string is not UTF-8 without NUL");
+      return {};
+    }
+    return text;
+  }
   std::string_view readObjectPath() noexcept;
   // A signature's text; its grammar is left to QVBusSignature::parse().
-  std::string_view readSignatureText() noexcept;
+  std::string_view readSignatureText() noexcept { return readTerminated(readNumber<uint8_t>()); }
 
   // Containers. Each enter is followed by a leave, whatever fails between.
   //
@@ -78,9 +100,24 @@ class QVBusReader {
   void skipBasic(char type) noexcept;
 
  private:
+  // A text of that length and the NUL behind it, which the length does not count.
+  std::string_view readTerminated(std::size_t length) noexcept {
+    if (bytes_.size() - position_ <= length) [[unlikely]] {
+      fail("truncated");
+      return {};
+    }
+    const char* text = bytes_.data() + position_;
+    if (text[length] != 0) [[unlikely]] {
+      fail("a text is not ended by NUL");
+      return {};
+    }
+    position_ += length + 1;
+    return {text, length};
+  }
   void skipPadding(std::size_t aligned) noexcept;
   void deepen() noexcept {
-    if (++depth_ > kBusMaximumDepth) fail("containers nested too deeply");
+    if (++depth_ > kBusMaximumDepth) [[unlikely]]
+      fail("containers nested too deeply");
   }
   void skipVariant() noexcept;
   void skipArray(const QVBusSignature& signature, std::size_t element) noexcept;

@@ -35,35 +35,27 @@ std::size_t lengthOfSequence(const unsigned char* at, std::size_t available) noe
 
 }  // namespace
 
-bool QVBusIsValidText(std::string_view text) noexcept {
-  constexpr uint64_t kOnes = 0x0101010101010101;
-  constexpr uint64_t kHighs = 0x8080808080808080;
+bool QVBusIsValidTextBytewise(std::string_view text) noexcept {
   const auto* at = reinterpret_cast<const unsigned char*>(text.data());
-  std::size_t left = text.size();
-  while (left != 0) {
-    // Eight bytes at once where none has its high bit set and none is 0 (a 0 borrows in the
-    // subtraction, which sets the high bit). Nearly every text is done here.
-    while (left >= sizeof(uint64_t)) {
-      uint64_t word;
+  const auto* end = at + text.size();
+  while (at < end) {
+    // What is settled by words stays so within a long text with a few other characters in it.
+    uint64_t word;
+    if (static_cast<std::size_t>(end - at) >= sizeof word) {
       std::memcpy(&word, at, sizeof word);
-      if (((word | (word - kOnes)) & kHighs) != 0) break;
-      at += sizeof word;
-      left -= sizeof word;
-    }
-    // The rest, or up to the end of what the word could not settle.
-    std::size_t together = left < sizeof(uint64_t) ? left : sizeof(uint64_t);
-    while (together != 0) {
-      std::size_t length = 1;
-      if (*at >= 0x80) {
-        length = lengthOfSequence(at, left);
-        if (length == 0) return false;
-      } else if (*at == 0) {
-        return false;
+      if (QVBusIsPlainWord(word)) {
+        at += sizeof word;
+        continue;
       }
-      at += length;
-      left -= length;
-      together -= length < together ? length : together;
     }
+    std::size_t length = 1;
+    if (*at >= 0x80) {
+      length = lengthOfSequence(at, static_cast<std::size_t>(end - at));
+      if (length == 0) return false;
+    } else if (*at == 0) {
+      return false;
+    }
+    at += length;
   }
   return true;
 }

@@ -38,15 +38,18 @@ void QVBusValueDecoder::tidy() {
 
 QVValue QVBusValueDecoder::readVariant(QVBusReader& reader) {
   const auto text = reader.enterVariantText();
-  QVValue value;
-  if (text.size() == 1 && QVBusSignature::isBasic(text.front())) {
-    value = readBasic(reader, text.front());
-  } else {
-    QVBusSignature signature;
-    if (reader.parseVariantSignature(text, signature)) value = readValue(reader, signature, 0);
-  }
+  // Nearly all variants hold one basic value and need no look at their signature's grammar.
+  QVValue value = text.size() == 1 && QVBusSignature::isBasic(text.front())
+                      ? readBasic(reader, text.front())
+                      : readVariantOf(reader, text);
   reader.leaveVariant();
   return value;
+}
+
+QVValue QVBusValueDecoder::readVariantOf(QVBusReader& reader, std::string_view text) {
+  QVBusSignature signature;
+  if (!reader.parseVariantSignature(text, signature)) return {};
+  return readValue(reader, signature, 0);
 }
 
 QVValue QVBusValueDecoder::readValue(QVBusReader& reader, const QVBusSignature& signature,

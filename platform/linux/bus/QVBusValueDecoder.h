@@ -29,6 +29,7 @@ class QVBusValueDecoder {
 
  private:
   QVValue readVariant(QVBusReader& reader);
+  QVValue readVariantOf(QVBusReader& reader, std::string_view text);
   QVValue readValue(QVBusReader& reader, const QVBusSignature& signature, std::size_t index);
   QVValue readBasic(QVBusReader& reader, char type);
   QVValue readArray(QVBusReader& reader, const QVBusSignature& signature, std::size_t element);
