@@ -1,0 +1,26 @@
+#pragma once
+
+#include <filesystem>
+#include <optional>
+#include <string>
+
+// Where the service's files are: the directories that the service manager hands over, else the
+// usual ones. A value; made by the composition root.
+struct QVServiceDirectories {
+  std::filesystem::path runtime;
+  std::filesystem::path state;
+  std::filesystem::path logs;
+  std::filesystem::path configuration;
+
+  // From RUNTIME_DIRECTORY, STATE_DIRECTORY, LOGS_DIRECTORY and CONFIGURATION_DIRECTORY. A manager
+  // that was asked for several directories lists them with ":" between; the first is meant.
+  static QVServiceDirectories fromEnvironment();
+
+  std::filesystem::path socket() const { return runtime / "reporting.socket"; }
+  std::filesystem::path store() const { return state / "reporting.db"; }
+  std::filesystem::path preferences() const { return configuration / "preferences"; }
+  std::filesystem::path deviceInformation() const { return configuration / "device.json"; }
+
+  // Why the service could not write into `directory`; nothing where it can.
+  static std::optional<std::string> obstacle(const std::filesystem::path& directory);
+};
