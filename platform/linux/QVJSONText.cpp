@@ -1,0 +1,208 @@
+#include "platform/linux/QVJSONText.h"
+
+#include <algorithm>
+#include <array>
+#include <charconv>
+#include <cmath>
+#include <cstdint>
+#include <cstring>
+#include <string>
+
+#if defined(__SSE2__)
+#define RAPIDJSON_SSE2
+#elif defined(__ARM_NEON)
+#define RAPIDJSON_NEON
+#endif
+#include <rapidjson/prettywriter.h>
+#include <rapidjson/stringbuffer.h>
+#include <rapidjson/writer.h>
+
+namespace {
+
+// A buffer that one large text has grown beyond this is given back, in bytes.
+constexpr std::size_t kKeptBufferBytes = 256 * 1024;
+
+constexpr std::string_view kReplacement = "\xEF\xBF\xBD";
+
+// What stands at the beginning of `bytes`: a whole character, or the longest piece of one that
+// still could have become a character (at least one byte).
+struct Sequence {
+  std::size_t length;
+  bool valid;
+};
+
+Sequence sequenceAt(std::string_view bytes) {
+  const auto at = [&bytes](std::size_t i) { return static_cast<unsigned char>(bytes[i]); };
+  const unsigned char lead = at(0);
+  if (lead < 0x80) return {1, true};
+  if (lead < 0xC2 || lead > 0xF4) return {1, false};
+  const std::size_t length = lead < 0xE0 ? 2 : lead < 0xF0 ? 3 : 4;
+  // The second byte's range keeps out overlong forms, surrogates and what lies above U+10FFFF.
+  unsigned char low = 0x80;
+  unsigned char high = 0xBF;
+  if (lead == 0xE0) low = 0xA0;
+  if (lead == 0xED) high = 0x9F;
+  if (lead == 0xF0) low = 0x90;
+  if (lead == 0xF4) high = 0x8F;
+  for (std::size_t i = 1; i < length; ++i) {
+    if (i >= bytes.size() || at(i) < low || at(i) > high) return {i, false};
+    low = 0x80;
+    high = 0xBF;
+  }
+  return {length, true};
+}
+
+std::size_t validPrefix(std::string_view bytes) {
+  std::size_t i = 0;
+  while (i < bytes.size()) {
+    // Nearly all text is ASCII: eight bytes at a time.
+    uint64_t eight = 0;
+    if (i + sizeof eight <= bytes.size()) {
+      std::memcpy(&eight, bytes.data() + i, sizeof eight);
+      if ((eight & 0x8080808080808080U) == 0) {
+        i += sizeof eight;
+        continue;
+      }
+    }
+    const Sequence sequence = sequenceAt(bytes.substr(i));
+    if (!sequence.valid) return i;
+    i += sequence.length;
+  }
+  return i;
+}
+
+std::string repaired(std::string_view bytes) {
+  std::string text;
+  while (!bytes.empty()) {
+    const std::size_t valid = validPrefix(bytes);
+    text.append(bytes.substr(0, valid));
+    bytes.remove_prefix(valid);
+    if (bytes.empty()) break;
+    text.append(kReplacement);
+    bytes.remove_prefix(sequenceAt(bytes).length);
+  }
+  return text;
+}
+
+template <class Writer>
+class Streamer {
+ public:
+  Streamer(Writer& writer, bool quoteNonFinite)
+      : writer_(writer), quoteNonFinite_(quoteNonFinite) {}
+
+  bool value(const QVValue& value) {
+    switch (value.kind()) {
+      case QVValue::Kind::absent:
+        return writer_.Null();
+      case QVValue::Kind::boolean:
+        return writer_.Bool(value.boolean());
+      case QVValue::Kind::integer:
+        return writer_.Int64(value.integer());
+      case QVValue::Kind::unsignedInteger:
+        return writer_.Uint64(value.unsignedInteger());
+      case QVValue::Kind::real:
+        return real(value.real());
+      case QVValue::Kind::string:
+        return string(value.string());
+      case QVValue::Kind::array:
+        return array(value.array());
+      case QVValue::Kind::dictionary:
+        return dictionary(value.dictionary());
+    }
+    return false;
+  }
+
+  bool dictionary(const QVDictionary& dictionary) {
+    writer_.StartObject();
+    for (const QVDictionaryEntry& entry : dictionary) {
+      if (!string(entry.key) || !value(entry.value)) return false;
+    }
+    return writer_.EndObject();
+  }
+
+ private:
+  bool array(const QVArray& array) {
+    writer_.StartArray();
+    for (const QVValue& item : array) {
+      if (!value(item)) return false;
+    }
+    return writer_.EndArray();
+  }
+
+  bool string(std::string_view text) {
+    if (validPrefix(text) == text.size()) return plain(text);
+    return plain(repaired(text));
+  }
+
+  bool plain(std::string_view text) {
+    // The writer wants a pointer even for no characters.
+    return writer_.String(text.data() == nullptr ? "" : text.data(),
+                          static_cast<rapidjson::SizeType>(text.size()));
+  }
+
+  bool real(double number) {
+    if (!std::isfinite(number)) {
+      if (!quoteNonFinite_) return false;
+      return plain(std::isnan(number) ? "nan" : number < 0 ? "-inf" : "inf");
+    }
+    const double magnitude = std::fabs(number);
+    const bool fixed = number == 0 || (magnitude >= 1e-4 && magnitude < 1e17);
+    std::array<char, 64> text;
+    char* end = std::to_chars(text.data(), text.data() + text.size(), number,
+                              fixed ? std::chars_format::fixed : std::chars_format::scientific)
+                    .ptr;
+    if (fixed && std::find(text.data(), end, '.') == end) {
+      *end++ = '.';
+      *end++ = '0';
+    }
+    return writer_.RawValue(text.data(), static_cast<std::size_t>(end - text.data()),
+                            rapidjson::kNumberType);
+  }
+
+  Writer& writer_;
+  const bool quoteNonFinite_;
+};
+
+}  // namespace
+
+struct QVJSONText::State {
+  State(Layout chosenLayout, NonFinite chosenNonFinite)
+      : layout(chosenLayout), nonFinite(chosenNonFinite) {
+    pretty.SetIndent(' ', 2);
+  }
+
+  const Layout layout;
+  const NonFinite nonFinite;
+  rapidjson::StringBuffer buffer;
+  rapidjson::Writer<rapidjson::StringBuffer> compact{buffer};
+  rapidjson::PrettyWriter<rapidjson::StringBuffer> pretty{buffer};
+
+  template <class Part>
+  std::optional<std::string_view> write(Part part) {
+    const bool large = buffer.GetSize() > kKeptBufferBytes;
+    buffer.Clear();
+    if (large) buffer.ShrinkToFit();
+    return layout == Layout::compact ? write(compact, part) : write(pretty, part);
+  }
+
+  template <class Writer, class Part>
+  std::optional<std::string_view> write(Writer& writer, Part part) {
+    writer.Reset(buffer);
+    Streamer<Writer> streamer(writer, nonFinite == NonFinite::quote);
+    if (!part(streamer)) return std::nullopt;
+    return std::string_view(buffer.GetString(), buffer.GetSize());
+  }
+};
+
+QVJSONText::QVJSONText(Layout layout, NonFinite nonFinite)
+    : state_(std::make_unique<State>(layout, nonFinite)) {}
+
+QVJSONText::~QVJSONText() = default;
+
+std::optional<std::string_view> QVJSONText::write(const QVValue& value) {
+  return state_->write([&value](auto& streamer) { return streamer.value(value); });
+}
+
+std::optional<std::string_view> QVJSONText::write(const QVDictionary& value) {
+  return state_->write([&value](auto& streamer) { return streamer.dictionary(value); });
+}
