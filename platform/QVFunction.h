@@ -55,7 +55,10 @@ class QVFunction<Result(Arguments...), Capacity> {
 
   explicit operator bool() const noexcept { return operations_ != nullptr; }
 
+  // By value, as the callable behind it may take them so.
+  // NOLINTNEXTLINE(performance-unnecessary-value-param)
   Result operator()(Arguments... arguments) {
+    // NOLINTNEXTLINE(clang-analyzer-core.NullDereference): an empty one is not called, see above.
     return operations_->invoke(storage_, std::forward<Arguments>(arguments)...);
   }
 
@@ -73,9 +76,18 @@ class QVFunction<Result(Arguments...), Capacity> {
   }
 
   template <class Stored>
+  static Result call(Stored& callable, Arguments&&... arguments) {
+    if constexpr (std::is_void_v<Result>) {
+      callable(std::forward<Arguments>(arguments)...);  // a result that nobody asked for
+    } else {
+      return callable(std::forward<Arguments>(arguments)...);
+    }
+  }
+
+  template <class Stored>
   static constexpr Operations kInPlace{
       [](void* storage, Arguments&&... arguments) -> Result {
-        return (*static_cast<Stored*>(storage))(std::forward<Arguments>(arguments)...);
+        return call(*static_cast<Stored*>(storage), std::forward<Arguments>(arguments)...);
       },
       [](void* from, void* to) noexcept {
         auto* source = static_cast<Stored*>(from);
@@ -87,7 +99,7 @@ class QVFunction<Result(Arguments...), Capacity> {
   template <class Stored>
   static constexpr Operations kOnHeap{
       [](void* storage, Arguments&&... arguments) -> Result {
-        return (**static_cast<Stored**>(storage))(std::forward<Arguments>(arguments)...);
+        return call(**static_cast<Stored**>(storage), std::forward<Arguments>(arguments)...);
       },
       [](void* from, void* to) noexcept { new (to) Stored*(*static_cast<Stored**>(from)); },
       [](void* storage) noexcept { delete *static_cast<Stored**>(storage); }};
