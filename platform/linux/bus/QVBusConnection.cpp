@@ -1,0 +1,241 @@
+#include "platform/linux/bus/QVBusConnection.h"
+
+#include "platform/QVPlatform.h"
+#include "platform/linux/bus/QVBusLoop.h"
+#include "platform/linux/bus/QVBusServer.h"
+
+#include <utility>
+
+namespace {
+
+// Bytes that may wait for a peer before its calls are no longer read. Enough for the largest reply
+// and a batch of small ones.
+constexpr std::size_t kMostUnwritten = std::size_t{1} << 20;
+
+// Bytes of buffer that an idle connection may keep; there may be thousands of them.
+constexpr std::size_t kIdleBuffer = 4096;
+
+}  // namespace
+
+QVBusConnection::QVBusConnection(QVBusServer& server, int descriptor, uint64_t number)
+    : server_(server),
+      number_(number),
+      socket_(server.loop(), descriptor),
+      peer_(socket_.peer()),
+      account_(server.budget().open()) {}
+
+std::string QVBusConnection::description() const {
+  return QVText("<QVBusConnection :1.", number_, " pid ", peer_.processIdentifier, ">");
+}
+
+void QVBusConnection::setExportedInterface(QVIPCInterface exportedInterface) {
+  exportedInterface_ = exportedInterface;
+}
+
+void QVBusConnection::setExportedObject(
+    std::shared_ptr<QVReportingServiceProtocol> exportedObject) {
+  exportedObject_ = std::move(exportedObject);
+}
+
+std::shared_ptr<QVReportingServiceProtocol> QVBusConnection::exportedObject() const {
+  return exportedObject_;
+}
+
+void QVBusConnection::setInterruptionHandler(QVFunction<void()> handler) {
+  interruptionHandler_ = std::move(handler);
+}
+
+void QVBusConnection::setInvalidationHandler(QVFunction<void()> handler) {
+  invalidationHandler_ = std::move(handler);
+}
+
+void QVBusConnection::resume() {
+  if (state_ != State::accepted) return;
+  state_ = State::authenticating;
+  authentication_ = std::make_unique<QVBusAuthServer>(peer_.userID, server_.identifier());
+  outbox_ = std::make_shared<QVBusOutbox>([&loop = server_.loop(), weak = weak_from_this()] {
+    loop.post([weak] {
+      if (const auto self = weak.lock()) self->onWake();
+    });
+  });
+  continueReading();
+}
+
+// ---- Reading
+
+void QVBusConnection::continueReading() {
+  if (state_ == State::accepted || state_ == State::closed || waitsToRead_) return;
+  // While bytes wait there is a wait to write, or a wake, after which we come here again.
+  if (unwritten() > kMostUnwritten) return;
+  if (!server_.budget().admits(*account_)) {
+    server_.resumeWhenAdmitted(*this);
+    return;
+  }
+  waitsToRead_ = true;
+  socket_.waitReadable([weak = weak_from_this()] {
+    if (const auto self = weak.lock()) self->onReadable();
+  });
+}
+
+void QVBusConnection::onReadable() {
+  waitsToRead_ = false;
+  // Replies may have piled up since the wait began.
+  if (unwritten() <= kMostUnwritten) {
+    // What a batch of calls is answered on this thread goes out in one write after it.
+    outbox_->hold();
+    const auto buffer = server_.readBuffer();
+    const auto received = socket_.receive(buffer);
+    switch (received.status) {
+      case QVBusSocket::Status::done:
+        takeBytes({buffer.data(), received.bytes});
+        break;
+      case QVBusSocket::Status::wouldBlock:
+        break;
+      case QVBusSocket::Status::ended:
+      case QVBusSocket::Status::failed:
+        invalidate();
+        break;
+    }
+    flush();
+  }
+  continueReading();
+}
+
+void QVBusConnection::takeBytes(std::string_view bytes) {
+  if (authentication_ != nullptr) {
+    std::string answer;
+    bytes.remove_prefix(authentication_->feed(bytes, answer));
+    outbox_->putBytes(answer);
+    if (authentication_->state() == QVBusAuthServer::State::failed) {
+      violated(authentication_->failure());
+      return;
+    }
+    if (authentication_->state() != QVBusAuthServer::State::done) return;
+    authentication_.reset();
+    state_ = State::open;
+  }
+  takeMessages(bytes);
+}
+
+void QVBusConnection::takeMessages(std::string_view bytes) {
+  decoder_.feed(bytes);
+  std::string_view message;
+  for (;;) {
+    switch (decoder_.next(message)) {
+      case QVBusFrameDecoder::Result::message:
+        if (const char* reason = takeMessage(message)) {
+          violated(reason);
+          return;
+        }
+        break;
+      case QVBusFrameDecoder::Result::needsMore:
+        chargeHeldBytes();
+        return;
+      case QVBusFrameDecoder::Result::malformed:
+        violated(decoder_.failure());
+        return;
+    }
+  }
+}
+
+const char* QVBusConnection::takeMessage(std::string_view bytes) {
+  QVBusMessage message;
+  if (const char* reason = message.parse(bytes, knownHeader_)) return reason;
+  // We call nobody and listen to no signals: what is no call is checked and ignored.
+  if (message.type() != QVBusMessageType::methodCall) return message.checkBody();
+
+  const bool exported = exportedInterface_ == QVIPCInterface::reportingService;
+  return server_.exporter().handle(
+      {.message = message,
+       .reply = message.noReplyExpected() ? QVBusReply() : QVBusReply(outbox_, message.serial()),
+       .object = exported ? exportedObject_.get() : nullptr,
+       .charge = account_.get(),
+       .connectionNumber = number_});
+}
+
+void QVBusConnection::chargeHeldBytes() {
+  const std::size_t held = decoder_.bytesHeld();
+  if (held > charged_) account_->add(held - charged_);
+  if (held < charged_) account_->remove(charged_ - held);
+  charged_ = held;
+}
+
+// ---- Writing
+
+void QVBusConnection::onWake() {
+  flush();
+  continueReading();
+}
+
+void QVBusConnection::flush() {
+  while (state_ != State::closed && !waitsToWrite_) {
+    if (sending_.empty()) {
+      outbox_->take(sending_);
+      if (sending_.empty()) return;
+    }
+    const auto written = socket_.send(std::string_view(sending_).substr(sent_));
+    switch (written.status) {
+      case QVBusSocket::Status::wouldBlock:
+        waitsToWrite_ = true;
+        socket_.waitWritable([weak = weak_from_this()] {
+          if (const auto self = weak.lock()) {
+            self->waitsToWrite_ = false;
+            self->onWake();
+          }
+        });
+        return;
+      case QVBusSocket::Status::failed:
+        // The peer is gone; what it sent before may still be there to be read, and then the end.
+        outbox_->close();
+        sent_ = sending_.size();
+        break;
+      default:
+        sent_ += written.bytes;
+        break;
+    }
+    if (sent_ == sending_.size()) {
+      sending_.clear();
+      sent_ = 0;
+      if (sending_.capacity() > kIdleBuffer) std::string().swap(sending_);
+    }
+  }
+}
+
+// ---- The end
+
+void QVBusConnection::violated(const char* reason) {
+  if (state_ == State::closed) return;
+  const auto self = shared_from_this();
+  QVPlatform::shared().log->error(nullptr, "-[QVBusConnection violated:]",
+                                  "protocol violation, closing the connection of process ",
+                                  peer_.processIdentifier, ": ", reason);
+  close();
+  if (interruptionHandler_) interruptionHandler_();
+  end();
+}
+
+void QVBusConnection::invalidate() {
+  if (state_ == State::closed) return;
+  const auto self = shared_from_this();
+  close();
+  end();
+}
+
+void QVBusConnection::close() {
+  if (outbox_ != nullptr) {
+    flush();  // what was answered already, as far as the peer takes it
+    outbox_->close();
+  }
+  state_ = State::closed;
+  socket_.close();
+  if (charged_ != 0) account_->remove(charged_);
+  account_.reset();
+  server_.forget(*this);
+}
+
+void QVBusConnection::end() {
+  if (invalidationHandler_) invalidationHandler_();
+  interruptionHandler_ = nullptr;
+  invalidationHandler_ = nullptr;
+  exportedObject_.reset();
+}

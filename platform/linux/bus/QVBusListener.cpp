@@ -1,0 +1,133 @@
+#include "platform/linux/bus/QVBusListener.h"
+
+#include "platform/QVPlatform.h"
+#include "platform/linux/bus/QVBusConnection.h"
+#include "platform/linux/bus/QVBusListeningSocket.h"
+#include "platform/linux/bus/QVBusLoop.h"
+#include "platform/linux/bus/QVBusServer.h"
+#include "platform/linux/bus/QVBusSocket.h"
+
+#include <cerrno>
+#include <chrono>
+#include <csignal>
+#include <cstring>
+#include <utility>
+
+#include <asio/io_context.hpp>
+#include <asio/signal_set.hpp>
+#include <systemd/sd-daemon.h>
+#include <unistd.h>
+
+namespace {
+
+// Connections accepted in one go before those that are open get their turn.
+constexpr int kMostAcceptedAtOnce = 64;
+
+// After descriptors ran out: they may be used up by others than our connections.
+constexpr auto kAcceptAgainAfter = std::chrono::seconds(1);
+
+}  // namespace
+
+// Members in the order of their dependence: what waits on the loop goes before the loop.
+struct QVBusListener::Inside {
+  QVBusLoop loop;
+  QVBusServer server{loop};
+  QVBusListenerOptions options;
+  std::unique_ptr<QVBusListeningSocket> place;
+  QVBusSocket listening;
+  asio::signal_set signals{loop.context()};
+  std::weak_ptr<QVIPCListenerDelegate> delegate;
+  bool waits = false;             // for a client
+  bool outOfDescriptors = false;  // does not wait, and has said so
+  bool ending = false;
+
+  Inside(QVBusListenerOptions given, std::unique_ptr<QVBusListeningSocket> socket)
+      : options(std::move(given)),
+        place(std::move(socket)),
+        listening(loop, place->takeDescriptor()) {}
+};
+
+std::unique_ptr<QVBusListener> QVBusListener::create(QVBusListenerOptions options,
+                                                     std::string& error) {
+  auto place = QVBusListeningSocket::open(options.socketPath, error);
+  if (place == nullptr) return nullptr;
+  return std::unique_ptr<QVBusListener>(
+      new QVBusListener(std::make_unique<Inside>(std::move(options), std::move(place))));
+}
+
+QVBusListener::QVBusListener(std::unique_ptr<Inside> inside) : inside_(std::move(inside)) {}
+
+QVBusListener::~QVBusListener() {
+  inside_->server.setClosedHandler(nullptr);
+  inside_->place->unlink();
+}
+
+void QVBusListener::setDelegate(std::weak_ptr<QVIPCListenerDelegate> delegate) {
+  inside_->delegate = std::move(delegate);
+}
+
+void QVBusListener::resume() {
+  std::signal(SIGPIPE, SIG_IGN);
+  inside_->signals.add(SIGTERM);
+  inside_->signals.add(SIGINT);
+  inside_->signals.async_wait([this](const asio::error_code& error, int) {
+    if (!error) inside_->loop.stop();
+  });
+  inside_->server.setClosedHandler([this] { acceptWhenReadable(); });
+  acceptWhenReadable();
+  ::sd_notify(0, "READY=1");
+  inside_->loop.run();
+  endService();
+}
+
+void QVBusListener::endService() {
+  inside_->ending = true;
+  inside_->listening.close();
+  inside_->place->unlink();
+  ::sd_notify(0, "STOPPING=1");
+  inside_->server.invalidateAll();
+  if (inside_->options.drain) inside_->options.drain();
+}
+
+void QVBusListener::acceptWhenReadable() {
+  if (inside_->waits || inside_->ending) return;
+  inside_->waits = true;
+  inside_->listening.waitReadable([this] {
+    inside_->waits = false;
+    acceptAll();
+  });
+}
+
+void QVBusListener::acceptAll() {
+  for (int accepted = 0; accepted < kMostAcceptedAtOnce; ++accepted) {
+    const int descriptor = inside_->listening.accept();
+    if (descriptor < 0) {
+      switch (-descriptor) {
+        case EAGAIN:
+        case EINTR:
+        case ECONNABORTED:
+          break;
+        default:
+          acceptLater(-descriptor);
+          return;
+      }
+      break;
+    }
+    inside_->outOfDescriptors = false;
+    const auto connection = inside_->server.adopt(descriptor);
+    const auto delegate = inside_->delegate.lock();
+    if (delegate == nullptr || !delegate->listener(*this, connection)) connection->invalidate();
+  }
+  acceptWhenReadable();
+}
+
+// The client that waits would be announced again and again: so nothing is accepted until a
+// connection closes, or some time has passed.
+void QVBusListener::acceptLater(int error) {
+  if (!std::exchange(inside_->outOfDescriptors, true)) {
+    QVPlatform::shared().log->error(nullptr, "-[QVBusListener acceptLater:]",
+                                    "cannot accept a connection: ", std::strerror(error),
+                                    "; clients wait until one closes");
+  }
+  inside_->loop.postAfter(kAcceptAgainAfter, [this] { acceptWhenReadable(); });
+}

@@ -1,0 +1,37 @@
+#pragma once
+
+#include "platform/QVDate.h"
+#include "platform/QVFunction.h"
+
+#include <memory>
+
+namespace asio {
+class io_context;
+}
+
+// The event loop of the IPC thread: an Asio io_context, kept out of everybody's headers.
+//
+// Threads: post() from any, at any time of the loop's life; everything else on the thread that runs
+// the loop. What is posted is destroyed unrun when the loop goes.
+class QVBusLoop {
+ public:
+  QVBusLoop();
+  ~QVBusLoop();
+  QVBusLoop(const QVBusLoop&) = delete;
+  QVBusLoop& operator=(const QVBusLoop&) = delete;
+
+  void post(QVFunction<void()> work);
+  // Runs `work` on the loop once that time has passed.
+  void postAfter(QVDuration delay, QVFunction<void()> work);
+
+  // Runs what is posted and what is waited for, until stop().
+  void run();
+  void stop();
+  // Runs one piece of work, waiting for it no longer than `longest`; false where there was none.
+  bool runOne(QVDuration longest);
+
+  asio::io_context& context() noexcept { return *context_; }
+
+ private:
+  const std::unique_ptr<asio::io_context> context_;
+};
