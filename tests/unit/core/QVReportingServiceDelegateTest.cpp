@@ -1,0 +1,240 @@
+#include "QVServices/Statistics/Service/QVReportingServiceDelegate.h"
+#include "QVServices/Statistics/Service/QVReportingServiceMain.h"
+#include "tests/support/QVServiceFixture.h"
+
+#include <chrono>
+#include <optional>
+
+namespace {
+
+using namespace std::chrono_literals;
+using enum QVLogLevel;
+using testing::ElementsAre;
+using testing::IsEmpty;
+
+constexpr std::string_view kNewConnection = "listener:shouldAcceptNewConnection:";
+constexpr std::string_view kLookup = "findReportingSessionForID:";
+
+class QVReportingServiceDelegateTest : public QVServiceFixture {};
+
+TEST_F(QVReportingServiceDelegateTest, RegistersTheServerScope) {
+  service();
+  EXPECT_THAT(platform_.log().registrations(),
+              ElementsAre(QVFakeLog::Registration{true, 0x71767273, "qvrs", "net.quillon.quietvox",
+                                                  "reporting_server_verbose", 31}));
+}
+
+TEST_F(QVReportingServiceDelegateTest, MakesTheServerQueue) {
+  service();
+  const auto queues = platform_.queues().queues();
+  ASSERT_EQ(queues.size(), 1u);
+  EXPECT_EQ(queues[0].label, "net.quillon.quietvox.reporting.server");
+  EXPECT_EQ(queues[0].quality, QVQualityOfService::userInteractive);
+  EXPECT_EQ(queues[0].relativePriority, 0);
+}
+
+TEST_F(QVReportingServiceDelegateTest, StartsEnabledWithoutReadingPreferences) {
+  platform_.preferences().setValue("net.quillon.quietvox", "disable_reporting", true);
+  platform_.preferences().setValue("net.quillon.quietvox", "device_name", "Kitchen");
+  EXPECT_TRUE(service().isReportingEnabled());
+  EXPECT_TRUE(service().getDefaults().isAbsent());
+  EXPECT_THAT(service().getAllClients(), IsEmpty());
+  EXPECT_EQ(platform_.preferences().readingsOfDomain("net.quillon.quietvox"), 0u);
+}
+
+TEST_F(QVReportingServiceDelegateTest, WritesNothingWhenItStarts) {
+  service();
+  EXPECT_THAT(takeJournal(), IsEmpty());
+}
+
+TEST_F(QVReportingServiceDelegateTest, HasAnEmptySnapShotAndNothingThatGrewWithoutDrivers) {
+  EXPECT_FALSE(service().getSnapShot().isAbsent());
+  EXPECT_TRUE(service().getSnapShot().empty());
+  EXPECT_TRUE(service().getDriverStatisticsRelativeToSnapShot(service().getSnapShot()).isAbsent());
+}
+
+TEST_F(QVReportingServiceDelegateTest, ServesFromTheEntryPointUntilThePlatformEndsIt) {
+  std::optional<bool> created;
+  platform_.listener().onResume([&] {
+    const auto connection = platform_.listener().connect(42);
+    connection->call().createReportingSession(7, [&created](bool reply) { created = reply; });
+    runUntilIdle();
+  });
+  EXPECT_EQ(QVReportingServiceMain(), 0);
+  EXPECT_TRUE(platform_.listener().hasResumed());
+  EXPECT_EQ(created, true);
+}
+
+TEST_F(QVReportingServiceDelegateTest, AcceptsAConnection) {
+  QVTestClient& client = connectClient(42);
+  EXPECT_TRUE(client.connection().isResumed());
+  EXPECT_EQ(client.connection().exportedInterface(), QVIPCInterface::reportingService);
+  ASSERT_NE(client.instance(), nullptr);
+  EXPECT_EQ(client.instance()->processIdentifier(), 42);
+  EXPECT_THAT(
+      takeJournal(),
+      ElementsAre(hostLine(standard, kNewConnection, "newConnection: connection 1 of process 42"),
+                  clientLine(standard, "initWithPID:delegate:", "new client with pid 42")));
+}
+
+TEST_F(QVReportingServiceDelegateTest, NamesTheSourceFileOfItsLines) {
+  connectClient(42);
+  const auto lines = platform_.log().lines();
+  ASSERT_FALSE(lines.empty());
+  EXPECT_EQ(lines[0].file, "QVReportingServiceDelegate.cpp");
+  EXPECT_GT(lines[0].line, 0u);
+}
+
+TEST_F(QVReportingServiceDelegateTest, AcceptsWhoeverComes) {
+  for (const int32_t pid : {-1, 0, 1, INT32_MAX}) {
+    EXPECT_FALSE(connectClient(pid).connection().isInvalidated()) << pid;
+  }
+  runUntilIdle();
+  EXPECT_EQ(service().getAllClients().size(), 4u);
+}
+
+TEST_F(QVReportingServiceDelegateTest, ListsClientsInTheOrderOfTheirRegistration) {
+  const QVTestClient& first = connectClient(42);
+  const QVTestClient& second = connectClient(43);
+  EXPECT_THAT(service().getAllClients(), IsEmpty()) << "registered on the server queue only";
+  runUntilIdle();
+  EXPECT_THAT(service().getAllClients(), ElementsAre(first.instance(), second.instance()));
+}
+
+TEST_F(QVReportingServiceDelegateTest, ListsTwoConnectionsOfOneProcessApart) {
+  const QVTestClient& first = connectClient(42);
+  const QVTestClient& second = connectClient(42);
+  runUntilIdle();
+  EXPECT_THAT(service().getAllClients(), ElementsAre(first.instance(), second.instance()));
+  EXPECT_NE(first.instance(), second.instance());
+}
+
+TEST_F(QVReportingServiceDelegateTest, LeavesTheClientToItsConnectionUntilRegistration) {
+  QVTestClient& client = connectClient(42);
+  const std::weak_ptr<QVReportingServerInstance> instance = client.instance();
+  EXPECT_EQ(instance.use_count(), 1);
+  client.connection().abandon();
+  EXPECT_TRUE(instance.expired());
+  runUntilIdle();
+  EXPECT_THAT(service().getAllClients(), IsEmpty()) << "nobody is left to be registered";
+}
+
+TEST_F(QVReportingServiceDelegateTest, RegistersBeforeTheClientsFirstOperation) {
+  QVTestClient& client = connectClient(42);
+  client.listReporters();
+  client.create(7);
+  client.listReporters();
+  runUntilIdle();
+  EXPECT_THAT(replies(), ElementsAre("reply 42 reporters:", "reply 42 create 7: YES",
+                                     "reply 42 reporters: 7"));
+}
+
+TEST_F(QVReportingServiceDelegateTest, RegistersOnTheServerQueueWithTheDateOfThatMoment) {
+  const QVTestClient& client = connectClient(42);
+  EXPECT_EQ(client.instance()->clientStartDate(), std::nullopt);
+  platform_.clock().advance(3s);
+  EXPECT_EQ(platform_.queues().pendingCount(kServerQueue), 1u);
+  runServerQueue();
+  EXPECT_EQ(client.instance()->clientStartDate(), QVFakeClock::kStart + 3s);
+}
+
+TEST_F(QVReportingServiceDelegateTest, AsksTheKernelForTheClientsName) {
+  platform_.process().addProcess(42, "player");
+  const QVTestClient& client = connectClient(42);
+  EXPECT_EQ(client.instance()->clientProcessName(), std::nullopt);
+  runUntilIdle();
+  EXPECT_EQ(client.instance()->clientProcessName(), "player");
+}
+
+TEST_F(QVReportingServiceDelegateTest, NamesItsOwnProcessWithoutAskingTheKernel) {
+  platform_.process().setOwnProcess(100, "quietvoxd");
+  platform_.process().addProcess(100, "not this");
+  const QVTestClient& client = connectClient(100);
+  runUntilIdle();
+  EXPECT_EQ(client.instance()->clientProcessName(), "quietvoxd");
+  EXPECT_EQ(platform_.process().lookUpCount(), 0);
+}
+
+TEST_F(QVReportingServiceDelegateTest, DoesNotAskForTheNamesOfZeroAndNegativeProcesses) {
+  platform_.process().addProcess(0, "kernel");
+  platform_.process().addProcess(-1, "nobody");
+  const QVTestClient& zero = connectClient(0);
+  const QVTestClient& negative = connectClient(-1);
+  runUntilIdle();
+  EXPECT_EQ(zero.instance()->clientProcessName(), std::nullopt);
+  EXPECT_EQ(negative.instance()->clientProcessName(), std::nullopt);
+  EXPECT_EQ(platform_.process().lookUpCount(), 0);
+}
+
+TEST_F(QVReportingServiceDelegateTest, LeavesAnUnknownProcessWithoutAName) {
+  const QVTestClient& client = connectClient(42);
+  runUntilIdle();
+  EXPECT_EQ(client.instance()->clientProcessName(), std::nullopt);
+  EXPECT_EQ(platform_.process().lookUpCount(), 1);
+  EXPECT_THAT(service().getAllClients(), ElementsAre(client.instance()));
+}
+
+TEST_F(QVReportingServiceDelegateTest, FindsTheFirstClientsSession) {
+  QVTestClient& first = clientWithSession(42, 7);
+  clientWithSession(43, 7);
+  EXPECT_EQ(service().findReportingSessionForID(7), first.session(7));
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(hostLine(info, kLookup, "found reporting session 7 for client 42")));
+}
+
+TEST_F(QVReportingServiceDelegateTest, FindsALaterClientsSession) {
+  clientWithSession(42, 7);
+  QVTestClient& second = clientWithSession(43, -9);
+  EXPECT_EQ(service().findReportingSessionForID(-9), second.session(-9));
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(hostLine(info, kLookup, "found reporting session -9 for client 43")));
+}
+
+TEST_F(QVReportingServiceDelegateTest, ComplainsAboutASessionThatNobodyHas) {
+  clientWithSession(42, 7);
+  EXPECT_EQ(service().findReportingSessionForID(INT64_MIN), nullptr);
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(hostLine(error, kLookup,
+                                   "failed to find reporting session -9223372036854775808")));
+}
+
+TEST_F(QVReportingServiceDelegateTest, NeverFindsSessionZero) {
+  QVTestClient& client = connectClient(42);
+  client.create(0);
+  runUntilIdle();
+  takeJournal();
+  EXPECT_NE(client.session(0), nullptr);
+  EXPECT_EQ(service().findReportingSessionForID(0), nullptr);
+  EXPECT_THAT(takeJournal(), IsEmpty());
+}
+
+TEST_F(QVReportingServiceDelegateTest, FindsNothingWhileReportingIsSwitchedOff) {
+  QVTestClient& client = clientWithSession(42, 7);
+  service().setReportingEnabled(false);
+  EXPECT_EQ(service().findReportingSessionForID(7), nullptr);
+  EXPECT_EQ(service().findReportingSessionForID(8), nullptr);
+  EXPECT_THAT(takeJournal(), IsEmpty());
+  service().setReportingEnabled(true);
+  EXPECT_EQ(service().findReportingSessionForID(7), client.session(7));
+}
+
+TEST_F(QVReportingServiceDelegateTest, RemovesAClientFromTheListAndTakesNoteOfNoOther) {
+  const QVTestClient& first = connectClient(42);
+  const QVTestClient& second = connectClient(43);
+  runUntilIdle();
+  const auto removed = first.instance();
+  service().removeClient(*removed);
+  EXPECT_THAT(service().getAllClients(), ElementsAre(second.instance()));
+  service().removeClient(*removed);
+  EXPECT_THAT(service().getAllClients(), ElementsAre(second.instance()));
+}
+
+TEST_F(QVReportingServiceDelegateTest, GivesNewSessionsNoDefaults) {
+  service().setDefaults({{"device_name", "Kitchen"}, {"disable_reporting", 0}});
+  QVTestClient& client = clientWithSession(42, 7);
+  EXPECT_EQ(service().getDefaults(),
+            (QVDictionary{{"device_name", "Kitchen"}, {"disable_reporting", 0}}));
+  EXPECT_TRUE(client.session(7)->userInfo().empty());
+}
+
+}  // namespace
