@@ -1,0 +1,132 @@
+#pragma once
+
+#include "platform/QVBeacon.h"
+#include "platform/QVClock.h"
+#include "platform/QVCountwise.h"
+
+#include <chrono>
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <utility>
+#include <vector>
+
+// What is handed to the event store's writer: rows, in lanes by table, in their order of arrival.
+// Times are microseconds since the epoch. Plain data; a row belongs to one thread at a time.
+
+inline int64_t QVEventStoreTime(const QVClock& clock) {
+  return std::chrono::duration_cast<std::chrono::microseconds>(
+             clock.currentDate().time_since_epoch())
+      .count();
+}
+
+// What the rows of one Beacon session share. Constant but for the writer's own members.
+struct QVEventSession {
+  int64_t sessionID = 0;
+  std::string token{};
+  int64_t clientType = 0;
+  double clientVersion = 0;
+  bool batchEvent = false;
+  bool containsRealtimeEvents = false;
+  bool single = false;  // stands for one message without a session; gets no row of its own
+  std::string clientName{};
+  std::string serviceName{};
+
+  // Touched by the writer's thread only: the session's row, and which database it was written to
+  // (the writer counts them from 1, since a damaged one is replaced).
+  int64_t row = 0;
+  uint64_t database = 0;
+};
+
+struct QVBeaconSessionRow {
+  int64_t time = 0;
+  std::shared_ptr<QVEventSession> session;
+  QVDictionary userInfo;
+
+  std::size_t footprint() const { return sizeof *this + userInfo.footprint(); }
+};
+
+struct QVBeaconMessageRow {
+  int64_t time = 0;
+  std::shared_ptr<QVEventSession> session;
+  uint16_t category = 0;
+  uint16_t type = 0;
+  QVDictionary payload;
+
+  std::size_t footprint() const { return sizeof *this + payload.footprint(); }
+};
+
+struct QVCountwiseRow {
+  enum class State : uint8_t { unasked, wanted, unwanted };
+
+  int64_t time = 0;
+  std::string name;
+  QVCountwise::PayloadCallback callback;  // until it is asked
+  QVDictionary payload{};                 // from then on
+  State state = State::unasked;
+
+  std::size_t footprint() const { return sizeof *this + name.size() + payload.footprint(); }
+};
+
+struct QVJoulewellRow {
+  int64_t time = 0;
+  int32_t agent = 0;
+  std::string name;
+  QVDictionary payload;
+
+  std::size_t footprint() const { return sizeof *this + name.size() + payload.footprint(); }
+};
+
+// A session's flush: sets its flushed_at, and is answered once everything before it is stored.
+struct QVFlushRow {
+  int64_t time = 0;
+  std::shared_ptr<QVEventSession> session;
+  QVBeaconSession::FlushCompletion completion;
+
+  std::size_t footprint() const { return sizeof *this; }
+};
+
+template <class Row>
+struct QVEventLane {
+  std::vector<Row> rows;
+  std::size_t head = 0;  // rows before it were given up
+
+  bool empty() const { return head == rows.size(); }
+  std::size_t size() const { return rows.size() - head; }
+  void clear() {
+    rows.clear();
+    head = 0;
+  }
+};
+
+struct QVEventRows {
+  QVEventLane<QVBeaconSessionRow> sessions;
+  QVEventLane<QVBeaconMessageRow> messages;
+  QVEventLane<QVCountwiseRow> countwise;
+  QVEventLane<QVJoulewellRow> joulewell;
+  QVEventLane<QVFlushRow> flushes;
+  bool urgent = false;  // to be committed at once
+
+  void add(QVBeaconSessionRow&& row) { sessions.rows.push_back(std::move(row)); }
+  void add(QVBeaconMessageRow&& row) { messages.rows.push_back(std::move(row)); }
+  void add(QVCountwiseRow&& row) { countwise.rows.push_back(std::move(row)); }
+  void add(QVJoulewellRow&& row) { joulewell.rows.push_back(std::move(row)); }
+  void add(QVFlushRow&& row) { flushes.rows.push_back(std::move(row)); }
+
+  std::size_t size() const {
+    return sessions.size() + messages.size() + countwise.size() + joulewell.size() + flushes.size();
+  }
+  template <class Visitor>
+  void forEachLane(Visitor&& visit) {
+    visit(sessions);
+    visit(messages);
+    visit(countwise);
+    visit(joulewell);
+    visit(flushes);
+  }
+  void clear() {
+    forEachLane([](auto& lane) { lane.clear(); });
+    urgent = false;
+  }
+};
