@@ -1,0 +1,62 @@
+#include "platform/linux/QVAsioSerialQueue.h"
+
+#include "platform/linux/QVRunWorkItem.h"
+#include "platform/linux/QVWakeUpBatch.h"
+
+#include <utility>
+
+QVAsioSerialQueue::QVAsioSerialQueue(std::string_view label, QVWorkExecutor& executor,
+                                     QVAsioTimers& timers, QVLog& log, std::size_t keptItems)
+    : label_(label), executor_(executor), timers_(timers), log_(log), keptItems_(keptItems) {}
+
+void QVAsioSerialQueue::async(QVWorkItem item) {
+  {
+    const QVMutexLock lock(mutex_);
+    enqueued_.push_back(std::move(item));
+    if (std::exchange(isScheduled_, true)) return;
+  }
+  if (auto* const wakeUps = QVWakeUpBatch::current()) {
+    wakeUps->add([self = shared_from_this()] { self->submit(); });
+  } else {
+    submit();
+  }
+}
+
+void QVAsioSerialQueue::asyncAfter(QVDuration delay, QVWorkItem item) {
+  timers_.enqueueAfter(delay, shared_from_this(), std::move(item));
+}
+
+void QVAsioSerialQueue::submit() {
+  QVWorkItem task = [self = shared_from_this()] { self->runBatch(); };
+  if (executor_.submit(task)) return;
+  // Destroyed after the lock, because an item may hold whatever enqueues again on its way out.
+  std::vector<QVWorkItem> refused;
+  const QVMutexLock lock(mutex_);
+  refused.swap(enqueued_);
+  isScheduled_ = false;
+}
+
+void QVAsioSerialQueue::runBatch() {
+  {
+    const QVMutexLock lock(mutex_);
+    batch_.swap(enqueued_);
+  }
+  for (QVWorkItem& item : batch_) QVRunWorkItem(item, label_, log_);
+  batch_.clear();
+  {
+    const QVMutexLock lock(mutex_);
+    if (enqueued_.empty()) {
+      isScheduled_ = false;
+      // Still under the lock: the next task may begin right after it.
+      keepOrFree(batch_);
+      keepOrFree(enqueued_);
+      return;
+    }
+  }
+  // Behind the executor's other tasks, so that a busy queue does not keep a thread to itself.
+  submit();
+}
+
+void QVAsioSerialQueue::keepOrFree(std::vector<QVWorkItem>& items) const {
+  if (items.capacity() > keptItems_) std::vector<QVWorkItem>().swap(items);
+}

@@ -1,0 +1,31 @@
+#pragma once
+
+#include "platform/linux/QVThreadAnnotations.h"
+
+#include <atomic>
+#include <condition_variable>
+#include <cstdint>
+
+// Counts the work that the queues of one process have accepted and not finished, over all their
+// threads, so that the end of the service can wait for none. Work that makes more work enters it
+// before it leaves itself, so the count does not touch 0 in between.
+//
+// Used by the executors. Threads: any.
+class QVWorkLedger {
+ public:
+  void enter() noexcept { count_.fetch_add(1, std::memory_order_relaxed); }
+  void leave() noexcept {
+    if (count_.fetch_sub(1, std::memory_order_acq_rel) != 1) return;
+    const QVMutexLock lock(mutex_);
+    empty_.notify_all();
+  }
+  void waitUntilEmpty() {
+    QVMutexLock lock(mutex_);
+    while (count_.load(std::memory_order_acquire) != 0) lock.wait(empty_);
+  }
+
+ private:
+  std::atomic<uint64_t> count_{0};
+  QVMutex mutex_;  // only makes sure that the wake-up is not missed
+  std::condition_variable empty_;
+};

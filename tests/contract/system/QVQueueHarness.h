@@ -1,0 +1,73 @@
+#pragma once
+
+#include "platform/fake/QVFakeConditions.h"
+#include "platform/fake/QVFakeLog.h"
+#include "platform/fake/QVFakeWorkQueues.h"
+#include "platform/linux/QVAsioWorkQueues.h"
+#include "platform/linux/QVStdConditions.h"
+
+#include <atomic>
+#include <chrono>
+#include <condition_variable>
+#include <mutex>
+
+// Counts down to an event that a test waits for. Threads: any.
+class QVCountdown {
+ public:
+  explicit QVCountdown(int count) : count_(count) {}
+
+  void hit() {
+    const std::lock_guard lock(mutex_);
+    --count_;
+    changed_.notify_all();
+  }
+  bool isOver() const {
+    const std::lock_guard lock(mutex_);
+    return count_ <= 0;
+  }
+  bool waitUntilOver(std::chrono::steady_clock::duration limit) {
+    std::unique_lock lock(mutex_);
+    return changed_.wait_for(lock, limit, [this] { return count_ <= 0; });
+  }
+
+ private:
+  mutable std::mutex mutex_;
+  std::condition_variable changed_;
+  int count_;
+};
+
+// Queues and conditions that belong together, and how a test lets them work until an event: the
+// fakes by running them, the adapters by waiting. The limit only ends a test that has failed.
+class QVFakeQueueHarness {
+ public:
+  QVWorkQueues& queues() { return queues_; }
+  QVFakeConditions& conditions() { return conditions_; }
+  QVFakeLog& log() { return log_; }
+
+  bool runUntil(QVCountdown& countdown) {
+    return queues_.runOthersUntil(clock_.steadyTime() + std::chrono::minutes{1},
+                                  [&countdown] { return countdown.isOver(); });
+  }
+
+ private:
+  QVFakeClock clock_;
+  QVFakeLog log_;
+  QVFakeWorkQueues queues_{clock_, log_};
+  QVFakeConditions conditions_{queues_, clock_};
+};
+
+class QVRealQueueHarness {
+ public:
+  QVWorkQueues& queues() { return queues_; }
+  QVStdConditions& conditions() { return conditions_; }
+  QVFakeLog& log() { return log_; }
+
+  static bool runUntil(QVCountdown& countdown) {
+    return countdown.waitUntilOver(std::chrono::minutes{1});
+  }
+
+ private:
+  QVFakeLog log_;
+  QVStdConditions conditions_;
+  QVAsioWorkQueues queues_{log_};
+};

@@ -1,0 +1,122 @@
+#include "platform/fake/QVFakeLog.h"
+#include "platform/linux/QVAsioSerialQueue.h"
+#include "platform/linux/QVWakeUpBatch.h"
+
+#include <deque>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include <gmock/gmock.h>
+
+namespace {
+
+using testing::ElementsAre;
+
+// Runs tasks when told.
+class ManualExecutor final : public QVWorkExecutor {
+ public:
+  bool submit(QVWorkItem& task) override {
+    if (isClosed_) return false;
+    tasks_.push_back(std::move(task));
+    ++submitCount_;
+    return true;
+  }
+  void close() override { isClosed_ = true; }
+
+  void runOne() {
+    QVWorkItem task = std::move(tasks_.front());
+    tasks_.pop_front();
+    task();
+  }
+  int submitCount() const { return submitCount_; }
+  std::size_t taskCount() const { return tasks_.size(); }
+
+ private:
+  bool isClosed_ = false;
+  int submitCount_ = 0;
+  std::deque<QVWorkItem> tasks_;
+};
+
+class QVAsioSerialQueueTest : public testing::Test {
+ protected:
+  std::shared_ptr<QVAsioSerialQueue> makeQueue() {
+    return std::make_shared<QVAsioSerialQueue>("queue", executor_, timers_, log_, 0);
+  }
+  QVWorkItem note(const std::string& name) {
+    return [this, name] { ran_.push_back(name); };
+  }
+
+  QVFakeLog log_;
+  ManualExecutor executor_;
+  QVAsioTimers timers_;
+  std::vector<std::string> ran_;
+};
+
+TEST_F(QVAsioSerialQueueTest, SubmitsItselfOnceForABatch) {
+  const auto queue = makeQueue();
+  queue->async(note("a"));
+  queue->async(note("b"));
+  EXPECT_EQ(executor_.submitCount(), 1);
+  executor_.runOne();
+  EXPECT_THAT(ran_, ElementsAre("a", "b"));
+  EXPECT_EQ(executor_.taskCount(), 0U);
+  queue->async(note("c"));
+  EXPECT_EQ(executor_.submitCount(), 2);
+  executor_.runOne();
+  EXPECT_THAT(ran_, ElementsAre("a", "b", "c"));
+}
+
+TEST_F(QVAsioSerialQueueTest, LetsOthersInBetweenItsBatches) {
+  const auto busy = makeQueue();
+  const auto other = makeQueue();
+  busy->async([this, busy] {
+    ran_.emplace_back("busy 1");
+    busy->async(note("busy 2"));
+  });
+  other->async(note("other"));
+  while (executor_.taskCount() > 0) executor_.runOne();
+  EXPECT_THAT(ran_, ElementsAre("busy 1", "other", "busy 2"));
+}
+
+TEST_F(QVAsioSerialQueueTest, WaitsForTheEndOfAWakeUpBatch) {
+  const auto a = makeQueue();
+  const auto b = makeQueue();
+  {
+    const QVWakeUpBatch outer;
+    a->async(note("a1"));
+    {
+      const QVWakeUpBatch inner;
+      b->async(note("b1"));
+    }
+    a->async(note("a2"));
+    EXPECT_EQ(executor_.submitCount(), 0);
+  }
+  EXPECT_EQ(executor_.submitCount(), 2);
+  while (executor_.taskCount() > 0) executor_.runOne();
+  EXPECT_THAT(ran_, ElementsAre("a1", "a2", "b1"));
+}
+
+TEST_F(QVAsioSerialQueueTest, LivesUntilItsItemsHaveRun) {
+  auto queue = makeQueue();
+  const std::weak_ptr<QVAsioSerialQueue> watched = queue;
+  queue->async(note("a"));
+  queue.reset();
+  EXPECT_FALSE(watched.expired());
+  executor_.runOne();
+  EXPECT_THAT(ran_, ElementsAre("a"));
+  EXPECT_TRUE(watched.expired());
+}
+
+TEST_F(QVAsioSerialQueueTest, DestroysItemsOfAClosedExecutor) {
+  const auto queue = makeQueue();
+  executor_.close();
+  const auto capture = std::make_shared<int>(0);
+  queue->async([capture, queue] {});
+  EXPECT_EQ(capture.use_count(), 1);
+  EXPECT_EQ(queue.use_count(), 1);
+  queue->async([capture] {});
+  EXPECT_EQ(capture.use_count(), 1);
+}
+
+}  // namespace

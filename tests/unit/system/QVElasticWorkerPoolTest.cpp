@@ -1,0 +1,192 @@
+#include "platform/fake/QVFakeLog.h"
+#include "platform/linux/QVElasticWorkerPool.h"
+#include "platform/linux/QVStdConditions.h"
+#include "tests/unit/system/QVEvent.h"
+
+#include <algorithm>
+#include <atomic>
+#include <chrono>
+#include <memory>
+#include <mutex>
+#include <set>
+#include <thread>
+#include <vector>
+
+#include <gmock/gmock.h>
+
+namespace {
+
+using namespace std::chrono_literals;
+
+class QVElasticWorkerPoolTest : public testing::Test {
+ protected:
+  void makePool(QVElasticWorkerPool::Limits limits) {
+    pool_ = std::make_unique<QVElasticWorkerPool>("test", 0, log_, ledger_, limits);
+  }
+  void submit(QVWorkItem task) { EXPECT_TRUE(pool_->submit(task)); }
+
+  // Submits `count` tasks that wait until endWaits(), and returns when all of them wait.
+  void startWaits(int count) {
+    QVEvent allWait;
+    for (int i = 0; i < count; ++i) {
+      submit([this, count, &allWait] {
+        condition_->lock();
+        if (++waitCount_ == count) allWait.happen();
+        while (!mayEnd_) condition_->waitForTimeout(1min);
+        condition_->unlock();
+      });
+    }
+    EXPECT_TRUE(allWait.wait());
+  }
+  void endWaits() {
+    condition_->lock();
+    mayEnd_ = true;
+    for (int i = 0; i < waitCount_; ++i) condition_->signal();
+    condition_->unlock();
+  }
+
+  QVFakeLog log_;
+  QVWorkLedger ledger_;
+  QVStdConditions conditions_;
+  const std::shared_ptr<QVCondition> condition_ = conditions_.makeCondition();
+  // With the condition's lock.
+  int waitCount_ = 0;
+  bool mayEnd_ = false;
+  std::unique_ptr<QVElasticWorkerPool> pool_;
+};
+
+TEST_F(QVElasticWorkerPoolTest, RunsOtherWorkWhileTwoHundredTasksWait) {
+  makePool({});
+  startWaits(200);
+  QVEvent ran;
+  submit([&ran] { ran.happen(); });
+  EXPECT_TRUE(ran.wait());
+  endWaits();
+  ledger_.waitUntilEmpty();
+}
+
+// Notes the thread that it is made on, and when that thread ends.
+class ThreadWatch {
+ public:
+  struct Ends {
+    std::mutex mutex;
+    std::condition_variable changed;
+    int madeCount = 0;
+    int endedCount = 0;
+  };
+
+  static void watchThisThread(Ends& ends) { thread_local const ThreadWatch kWatch(ends); }
+
+ private:
+  explicit ThreadWatch(Ends& ends) : ends_(ends) {
+    const std::lock_guard lock(ends_.mutex);
+    ++ends_.madeCount;
+  }
+  ~ThreadWatch() {
+    const std::lock_guard lock(ends_.mutex);
+    ++ends_.endedCount;
+    ends_.changed.notify_all();
+  }
+
+  Ends& ends_;
+};
+
+TEST_F(QVElasticWorkerPoolTest, RetiresAllRestingWorkersButOne) {
+  constexpr int kCount = 20;
+  makePool({.concurrency = 2, .workers = 64, .rest = 1ms});
+  ThreadWatch::Ends ends;
+  QVEvent allWait;
+  for (int i = 0; i < kCount; ++i) {
+    submit([this, &ends, &allWait] {
+      ThreadWatch::watchThisThread(ends);
+      condition_->lock();
+      if (++waitCount_ == kCount) allWait.happen();
+      while (!mayEnd_) condition_->waitForTimeout(1min);
+      condition_->unlock();
+    });
+  }
+  ASSERT_TRUE(allWait.wait());
+  endWaits();
+  ledger_.waitUntilEmpty();
+  std::unique_lock lock(ends.mutex);
+  EXPECT_TRUE(
+      ends.changed.wait_for(lock, 1min, [&ends] { return ends.endedCount >= ends.madeCount - 1; }));
+  EXPECT_EQ(ends.madeCount, kCount);
+  lock.unlock();
+  // One is left, or is made again.
+  QVEvent ran;
+  submit([&ran] { ran.happen(); });
+  EXPECT_TRUE(ran.wait());
+  pool_->close();
+  lock.lock();
+  EXPECT_EQ(ends.endedCount, ends.madeCount) << "closing ends the last one, too";
+}
+
+TEST_F(QVElasticWorkerPoolTest, HasNoMoreWorkersThanItsLimit) {
+  constexpr int kTasks = 12;
+  makePool({.concurrency = 2, .workers = 3, .rest = 5s});
+  std::mutex mutex;
+  std::set<std::thread::id> threads;
+  std::atomic<bool> maySignal{false};
+  std::atomic<int> early{0};
+  QVEvent threeWait;
+  for (int i = 0; i < kTasks; ++i) {
+    submit([&] {
+      {
+        const std::lock_guard lock(mutex);
+        threads.insert(std::this_thread::get_id());
+      }
+      condition_->lock();
+      if (++waitCount_ == 3) threeWait.happen();
+      if (waitCount_ > 3 && !mayEnd_) ++early;
+      while (!mayEnd_) condition_->waitForTimeout(1min);
+      condition_->unlock();
+    });
+  }
+  ASSERT_TRUE(threeWait.wait());
+  endWaits();
+  ledger_.waitUntilEmpty();
+  EXPECT_EQ(threads.size(), 3U);
+  EXPECT_EQ(early, 0);
+  EXPECT_EQ(waitCount_, kTasks);
+}
+
+TEST_F(QVElasticWorkerPoolTest, RunsNoMoreAtOnceThanItsConcurrency) {
+  makePool({.concurrency = 2, .workers = 64, .rest = 5s});
+  std::atomic<int> running{0};
+  std::atomic<int> most{0};
+  for (int i = 0; i < 500; ++i) {
+    submit([&] {
+      const int now = ++running;
+      int known = most;
+      while (known < now && !most.compare_exchange_weak(known, now)) {
+      }
+      --running;
+    });
+  }
+  ledger_.waitUntilEmpty();
+  EXPECT_LE(most, 2);
+}
+
+TEST_F(QVElasticWorkerPoolTest, KnowsItsOwnThreads) {
+  makePool({});
+  EXPECT_EQ(QVElasticWorkerPool::current(), nullptr);
+  QVElasticWorkerPool* current = nullptr;
+  submit([&current] { current = QVElasticWorkerPool::current(); });
+  ledger_.waitUntilEmpty();
+  EXPECT_EQ(current, pool_.get());
+}
+
+TEST_F(QVElasticWorkerPoolTest, RunsWhatItTookAndNothingAfterItsClose) {
+  makePool({.concurrency = 1, .workers = 1, .rest = 5s});
+  std::atomic<int> ran{0};
+  for (int i = 0; i < 100; ++i) submit([&ran] { ++ran; });
+  pool_->close();
+  EXPECT_EQ(ran, 100);
+  QVWorkItem late = [&ran] { ++ran; };
+  EXPECT_FALSE(pool_->submit(late));
+  EXPECT_TRUE(static_cast<bool>(late)) << "a refused task stays the caller's";
+  pool_->close();
+}
+
+}  // namespace
