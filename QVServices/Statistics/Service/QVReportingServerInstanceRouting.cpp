@@ -74,8 +74,7 @@ void QVReportingServerInstance::route(const QVDictionary& message, uint32_t cate
                                       Reply<std::optional<QVError>>& reply) const {
   QVPlatform::shared().tracePoints->mark(kTraceRouted);
   const auto delegate = delegate_.lock();
-  if (delegate == nullptr) return;
-  if (!delegate->isReportingEnabled()) {
+  if (delegate == nullptr || !delegate->isReportingEnabled()) {
     reply(QVError{kErrorDomain, kErrorSwitchedOff, {}});
     return;
   }

@@ -1,0 +1,474 @@
+// A session by itself: what it is made of, how it starts and stops.
+
+#include "QVServices/Statistics/Service/QVReportingSession.h"
+#include "tests/support/QVServiceFixture.h"
+
+#include <chrono>
+
+namespace {
+
+using namespace std::chrono_literals;
+using enum QVLogLevel;
+using testing::Contains;
+using testing::ElementsAre;
+using testing::IsEmpty;
+using testing::Not;
+using testing::Pair;
+using testing::SizeIs;
+using Kind = QVFakeBeaconEvent::Kind;
+
+class QVReportingSessionTest : public QVServiceFixture {
+ protected:
+  std::shared_ptr<QVReportingSession> makeSession(int64_t reporterID = 7,
+                                                  uint16_t serviceType = 65535) {
+    auto session = QVReportingSession::initWithID(reporterID, {42});
+    if (serviceType != 65535) session->setServiceType(serviceType);
+    journal_.forget();
+    return session;
+  }
+  std::shared_ptr<QVReportingSession> makeStartedSession(uint16_t serviceType = 1) {
+    auto session = makeSession(7, serviceType);
+    session->start();
+    runUntilIdle();
+    journal_.forget();
+    takeBeaconStory();
+    return session;
+  }
+  static void send(QVReportingSession& session, const QVDictionary& message) {
+    session.sendMessage(message, kSessionPlayback, kStart, {});
+  }
+};
+
+// ---- creation and properties
+
+TEST_F(QVReportingSessionTest, IsCreatedWithItsLineAndMark) {
+  const auto session = QVReportingSession::initWithID(-7, {42, 43});
+  EXPECT_THAT(takeJournal(), ElementsAre(sessionLine(info, "initWithID:processIdentifiers:",
+                                                     "created reporting session for ID: -7"),
+                                         traceEntry(kTraceSessionCreated)));
+  EXPECT_EQ(session->reporterID(), -7);
+  EXPECT_THAT(session->processIdentifiers(), ElementsAre(42, 43));
+  EXPECT_FALSE(session->started());
+  EXPECT_FALSE(session->beaconSessionStarted());
+  EXPECT_EQ(session->serviceType(), 65535);
+  EXPECT_EQ(session->serviceName(), "unknown");
+  EXPECT_TRUE(session->userInfo().empty());
+  EXPECT_TRUE(session->driverSnapShot().isAbsent());
+  EXPECT_FALSE(session->transactionCompleteBlock());
+  EXPECT_THAT(session->messageTypeCounts(), IsEmpty());
+  EXPECT_EQ(session->orientationCallbackID(), std::nullopt);
+  EXPECT_EQ(session->startDate(), std::nullopt);
+  ASSERT_NE(session->aggregatedPayloadData(), nullptr);
+  ASSERT_NE(session->nestedAggregatedPayloadData(), nullptr);
+  EXPECT_TRUE(session->aggregatedPayloadData()->empty());
+  EXPECT_TRUE(session->nestedAggregatedPayloadData()->empty());
+}
+
+TEST_F(QVReportingSessionTest, RegistersTheSessionScopeOnce) {
+  const auto first = makeSession(1);
+  const auto second = makeSession(2);
+  EXPECT_THAT(platform_.log().registrations(),
+              ElementsAre(QVFakeLog::Registration{true, 0x71767272, "qvrr", "net.quillon.quietvox",
+                                                  "reporting_session_verbose", 31}));
+}
+
+TEST_F(QVReportingSessionTest, MakesAQueueOfItsOwn) {
+  const auto first = makeSession(1);
+  const auto second = makeSession(2);
+  const auto queues = platform_.queues().queues();
+  ASSERT_THAT(queues, SizeIs(2));
+  for (const auto& queue : queues) {
+    EXPECT_EQ(queue.label, "net.quillon.quietvox.session.beacon");
+    EXPECT_EQ(queue.quality, QVQualityOfService::utility);
+    EXPECT_EQ(queue.relativePriority, 0);
+  }
+}
+
+TEST_F(QVReportingSessionTest, WritesAndMarksItsDestruction) {
+  auto session = makeSession(-7);
+  session.reset();
+  EXPECT_THAT(takeJournal(), ElementsAre(sessionLine(info, "dealloc", "deallocing this session -7"),
+                                         traceEntry(kTraceSessionDestroyed)));
+}
+
+TEST_F(QVReportingSessionTest, TakesTheNameOfItsServiceType) {
+  const auto session = makeSession();
+  session->setServiceType(2);
+  EXPECT_EQ(session->serviceName(), "telephony");
+  session->setServiceType(65535);
+  EXPECT_EQ(session->serviceName(), "unknown");
+  session->setServiceType(13);
+  EXPECT_EQ(session->serviceType(), 13);
+  EXPECT_EQ(session->serviceName(), std::nullopt);
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(sessionLine(info, "setServiceType:", "setting service type telephony"),
+                          sessionLine(info, "setServiceType:", "setting service type unknown"),
+                          sessionLine(info, "setServiceType:", "setting service type (null)")));
+}
+
+TEST_F(QVReportingSessionTest, MergesConfigurationsAndDefaultsSilently) {
+  const auto session = makeSession();
+  session->setConfiguration({{"a", 1}, {"b", 1}});
+  session->updateDefaults({{"b", 2}, {"device_name", "Kitchen"}});
+  session->setConfiguration({{"device_name", "Hall"}});
+  session->setConfiguration({});
+  session->setConfiguration(QVDictionary());
+  session->updateDefaults(QVDictionary());
+  EXPECT_EQ(session->userInfo(), (QVDictionary{{"a", 1}, {"b", 2}, {"device_name", "Hall"}}));
+  EXPECT_THAT(takeJournal(), IsEmpty());
+}
+
+TEST_F(QVReportingSessionTest, IsDescribedByItsID) {
+  EXPECT_EQ(makeSession(-7)->description(), "<QVReportingSession -7>");
+}
+
+// ---- start
+
+TEST_F(QVReportingSessionTest, SetsItsFrameworkSessionUpOnItsQueue) {
+  const auto session = makeSession(7, 2);
+  session->start();
+  EXPECT_TRUE(session->started());
+  EXPECT_THAT(takeJournal(), ElementsAre(traceEntry(kTraceSessionStarted)));
+  EXPECT_THAT(takeBeaconStory(), IsEmpty()) << "start returns at once";
+  EXPECT_EQ(platform_.queues().runUntilIdle(kSessionQueue), 1u);
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(sessionLine(standard, "start", R"(List of backends ["backend"])")))
+      << "found before the wait: no line about waiting";
+  const auto made = latestBeaconEvent(Kind::session);
+  EXPECT_EQ(made.sessionInfo, (QVDictionary{{"kBeaconSessionInfoClientType", 19},
+                                            {"kBeaconSessionInfoClientVersion", 2.0},
+                                            {"kBeaconSessionInfoSessionID", 7},
+                                            {"kBeaconSessionInfoBatchEvent", true},
+                                            {"kBeaconSessionInfoHierarchyToken", "token 1"},
+                                            {"kBeaconSessionInfoContainsRealtimeEvents", false}}));
+  EXPECT_EQ(made.userInfo, (QVDictionary{{"kBeaconUserInfoClientName", "net.quillon.quietvox"},
+                                         {"kBeaconUserInfoServiceName", "telephony_session"}}));
+  EXPECT_TRUE(made.frameworksToCheck.empty());
+  EXPECT_THAT(takeBeaconStory(), ElementsAre("session 1", "configuration 1"));
+  EXPECT_FALSE(session->beaconSessionStarted()) << "a success is not stored";
+}
+
+TEST_F(QVReportingSessionTest, ReportsInRealTimeForTheUseOfInterfacesOnly) {
+  for (const uint16_t type : std::initializer_list<uint16_t>{0, 1, 10, 12, 13, 65535}) {
+    const auto session = makeSession(type, type);
+    session->start();
+    runUntilIdle();
+    const auto made = latestBeaconEvent(Kind::session);
+    EXPECT_EQ(*made.sessionInfo.find("kBeaconSessionInfoBatchEvent"), QVValue(type != 12)) << type;
+    EXPECT_EQ(*made.sessionInfo.find("kBeaconSessionInfoContainsRealtimeEvents"),
+              QVValue(type == 12))
+        << type;
+  }
+}
+
+TEST_F(QVReportingSessionTest, NamesAServiceWithoutANameNull) {
+  const auto session = makeSession(7, 13);
+  session->start();
+  runUntilIdle();
+  EXPECT_EQ(*latestBeaconEvent(Kind::session).userInfo.find("kBeaconUserInfoServiceName"),
+            QVValue("(null)_session"));
+}
+
+TEST_F(QVReportingSessionTest, NamesTheServiceUnknownUntilItIsSet) {
+  const auto session = makeSession();
+  session->start();
+  runUntilIdle();
+  EXPECT_EQ(*latestBeaconEvent(Kind::session).userInfo.find("kBeaconUserInfoServiceName"),
+            QVValue("unknown_session"));
+}
+
+TEST_F(QVReportingSessionTest, LetsTheConfigurationReplaceTheFrameworksNames) {
+  const auto session = makeSession(7, 1);
+  session->setConfiguration({{"kBeaconUserInfoClientName", "mine"}, {"rate", 48000}});
+  session->start();
+  runUntilIdle();
+  EXPECT_EQ(latestBeaconEvent(Kind::session).userInfo,
+            (QVDictionary{{"kBeaconUserInfoClientName", "mine"},
+                          {"kBeaconUserInfoServiceName", "voxa_session"},
+                          {"rate", 48000}}));
+}
+
+TEST_F(QVReportingSessionTest, TakesNameAndTypeAtTheStartAndTheUserInformationAtTheSetUp) {
+  const auto session = makeSession(7, 12);
+  session->start();
+  session->setServiceType(2);
+  session->setConfiguration({{"late", "but in time"}});
+  runUntilIdle();
+  session->setConfiguration({{"later", "too late"}});
+  const auto made = latestBeaconEvent(Kind::session);
+  EXPECT_EQ(*made.userInfo.find("kBeaconUserInfoServiceName"), QVValue("apiusage_session"));
+  EXPECT_EQ(*made.sessionInfo.find("kBeaconSessionInfoBatchEvent"), QVValue(false));
+  EXPECT_EQ(*made.userInfo.find("late"), QVValue("but in time"));
+  EXPECT_FALSE(made.userInfo.contains("later"));
+  EXPECT_TRUE(session->userInfo().contains("later"));
+}
+
+TEST_F(QVReportingSessionTest, RefusesASecondStart) {
+  const auto session = makeStartedSession();
+  send(*session, {{"a", 1}});
+  const auto aggregated = session->aggregatedPayloadData();
+  journal_.forget();
+  session->start();
+  runUntilIdle();
+  EXPECT_THAT(takeJournal(), ElementsAre(sessionLine(info, "start", "7 is already started")));
+  EXPECT_EQ(session->aggregatedPayloadData(), aggregated);
+  EXPECT_EQ(aggregated->size(), 1u);
+  EXPECT_THAT(takeBeaconStory(), ElementsAre(R"(message 1: 3/1 {"a":1})"));
+}
+
+TEST_F(QVReportingSessionTest, WritesItsStartOnlyWhenVerbose) {
+  makeSessionsVerbose();
+  const auto session = makeSession(7, 11);
+  session->start();
+  session->start();
+  EXPECT_THAT(takeJournal(), ElementsAre(sessionLine(debug, "start", "starting session owned by 7"),
+                                         traceEntry(kTraceSessionStarted),
+                                         sessionLine(debug, "start", "starting session owned by 7"),
+                                         sessionLine(info, "start", "7 is already started")));
+}
+
+TEST_F(QVReportingSessionTest, ThrowsAwayWhatWasCollectedBeforeTheStart) {
+  const auto session = makeSession(7, 1);
+  send(*session, {{"early", 1}});
+  EXPECT_EQ(session->aggregatedPayloadData()->size(), 1u);
+  session->start();
+  EXPECT_EQ(session->aggregatedPayloadData()->size(), 0u);
+  EXPECT_EQ(session->nestedAggregatedPayloadData()->size(), 0u);
+  EXPECT_THAT(session->messageTypeCounts(), ElementsAre(Pair("Session_Playback_Start", 1)))
+      << "but it was counted";
+  send(*session, {{"late", 2}});
+  session->stop();
+  runUntilIdle();
+  EXPECT_THAT(takeBeaconStory(),
+              Contains(R"(message 1: 65535/65535 {"QV_Session_Summary_Event":"1","late":"2"})"));
+}
+
+// ---- stop
+
+TEST_F(QVReportingSessionTest, StopsWithASummaryAndAFlush) {
+  const auto session = makeStartedSession(2);
+  send(*session, {{"a", 1}});
+  journal_.forget();
+  session->stop();
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(traceEntry(kTraceSessionStopped),
+                          sessionLine(standard, "stop", "sending summary event for reporter 7"),
+                          traceEntry(kTraceMessageSent)));
+  EXPECT_FALSE(session->started());
+  EXPECT_EQ(session->aggregatedPayloadData(), nullptr);
+  EXPECT_EQ(session->nestedAggregatedPayloadData(), nullptr);
+  EXPECT_THAT(takeBeaconStory(), IsEmpty()) << "stop returns at once";
+  runUntilIdle();
+  EXPECT_THAT(takeBeaconStory(),
+              ElementsAre(R"(message 1: 3/1 {"a":1})",
+                          R"(message 1: 65535/65535 {"QV_Session_Summary_Event":"2","a":"1"})",
+                          "flush 1", "end 1"));
+}
+
+TEST_F(QVReportingSessionTest, SendsNoSummaryOfASessionWithoutMessages) {
+  const auto session = makeStartedSession();
+  session->stop();
+  runUntilIdle();
+  EXPECT_THAT(takeJournal(), ElementsAre(traceEntry(kTraceSessionStopped)));
+  EXPECT_THAT(takeBeaconStory(), ElementsAre("flush 1", "end 1"));
+}
+
+TEST_F(QVReportingSessionTest, WritesItsEndTwiceWhenStartedAndOnceWhenNot) {
+  makeSessionsVerbose();
+  const auto session = makeStartedSession();
+  session->stop();
+  runUntilIdle();
+  EXPECT_THAT(takeJournal(), ElementsAre(sessionLine(debug, "stop", "ending session 7"),
+                                         sessionLine(debug, "stop", "ending session 7"),
+                                         traceEntry(kTraceSessionStopped)));
+  session->stop();
+  runUntilIdle();
+  EXPECT_THAT(takeJournal(), ElementsAre(sessionLine(debug, "stop", "ending session 7")));
+}
+
+TEST_F(QVReportingSessionTest, ChangesNothingWhenItIsStoppedWithoutAStart) {
+  const auto session = makeSession();
+  send(*session, {{"a", 1}});
+  runUntilIdle();
+  journal_.forget();
+  takeBeaconStory();
+  session->stop();
+  runUntilIdle();
+  EXPECT_THAT(takeJournal(), IsEmpty());
+  EXPECT_THAT(takeBeaconStory(), IsEmpty());
+  EXPECT_NE(session->aggregatedPayloadData(), nullptr);
+}
+
+TEST_F(QVReportingSessionTest, WritesAFlushThatFailed) {
+  const auto session = makeStartedSession();
+  platform_.beacon().setFlushError(QVError{"disk", 28, {{"failureReason", "No space left"}}});
+  session->stop();
+  runUntilIdle();
+  EXPECT_THAT(takeJournal(), ElementsAre(traceEntry(kTraceSessionStopped),
+                                         sessionLine(error, "stop", "flush error No space left")));
+  EXPECT_THAT(takeBeaconStory(), ElementsAre("failed flush 1", "end 1")) << "dropped all the same";
+}
+
+TEST_F(QVReportingSessionTest, FlushesAfterEverythingThatWasQueuedBefore) {
+  const auto session = makeStartedSession();
+  for (int i = 0; i < 3; ++i) send(*session, {{"n", i}});
+  session->stop();
+  send(*session, {{"n", 4}});
+  runUntilIdle();
+  EXPECT_THAT(takeBeaconStory(),
+              ElementsAre(R"(message 1: 3/1 {"n":0})", R"(message 1: 3/1 {"n":1})",
+                          R"(message 1: 3/1 {"n":2})",
+                          R"(message 1: 65535/65535 {"QV_Session_Summary_Event":"1","n":"0,1,2"})",
+                          "flush 1", "end 1", R"(single: 3/1 {"n":4})"));
+}
+
+TEST_F(QVReportingSessionTest, StartsAgainWithNewArraysAndANewFrameworkSession) {
+  const auto session = makeStartedSession();
+  session->setConfiguration({{"kept", true}});
+  send(*session, {{"a", 1}});
+  session->stop();
+  session->start();
+  EXPECT_EQ(session->aggregatedPayloadData()->size(), 0u);
+  send(*session, {{"b", 2}});
+  session->stop();
+  runUntilIdle();
+  EXPECT_THAT(
+      takeBeaconStory(),
+      ElementsAre(R"(message 1: 3/1 {"a":1})",
+                  R"(message 1: 65535/65535 {"QV_Session_Summary_Event":"1","a":"1"})", "flush 1",
+                  "end 1", "session 2", "configuration 2", R"(message 2: 3/1 {"b":2})",
+                  R"(message 2: 65535/65535 {"QV_Session_Summary_Event":"1","b":"2"})", "flush 2",
+                  "end 2"));
+  EXPECT_THAT(session->messageTypeCounts(),
+              ElementsAre(Pair("Session_Playback_Start", 2), Pair("Undefined_Unknown", 2)));
+  EXPECT_TRUE(session->userInfo().contains("kept"));
+}
+
+TEST_F(QVReportingSessionTest, NeitherStopsNorSummarisesWhenItIsDropped) {
+  auto session = makeStartedSession();
+  send(*session, {{"a", 1}});
+  session.reset();
+  runUntilIdle();
+  EXPECT_THAT(takeBeaconStory(), ElementsAre(R"(message 1: 3/1 {"a":1})", "end 1"));
+  EXPECT_THAT(takeJournal(),
+              Not(Contains(sessionLine(standard, "stop", "sending summary event for reporter 7"))));
+}
+
+// ---- test sessions
+
+TEST_F(QVReportingSessionTest, GivesATestSessionNoFrameworkSession) {
+  platform_.beacon().setBackends(QVFakeBeacon::Backends::never);
+  const auto session = makeSession(7, 11);
+  session->start();
+  runUntilIdle();
+  EXPECT_EQ(platform_.clock().steadyTime(), 0s) << "nothing to wait for";
+  EXPECT_EQ(platform_.beacon().liveTokens(), 0);
+  journal_.forget();
+  session->stop();
+  runUntilIdle();
+  EXPECT_THAT(takeBeaconStory(), IsEmpty());
+  EXPECT_THAT(takeJournal(), ElementsAre(traceEntry(kTraceSessionStopped)));
+}
+
+TEST_F(QVReportingSessionTest, DropsTheMessagesOfATestSessionButCountsAndRecordsThem) {
+  const auto session = makeStartedSession(11);
+  send(*session, {{"a", 1}});
+  EXPECT_EQ(session->aggregatedPayloadData()->size(), 1u);
+  EXPECT_THAT(session->messageTypeCounts(), ElementsAre(Pair("Session_Playback_Start", 1)));
+  runUntilIdle();
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(traceEntry(kTraceMessageSent),
+                          sessionLine(info, "sendMessage:category:type:sync:reply:",
+                                      "transactions aren't allowed on this platform")));
+  session->stop();
+  runUntilIdle();
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(traceEntry(kTraceSessionStopped),
+                          sessionLine(standard, "stop", "sending summary event for reporter 7"),
+                          traceEntry(kTraceMessageSent),
+                          sessionLine(info, "sendMessage:category:type:sync:reply:",
+                                      "transactions aren't allowed on this platform")));
+  EXPECT_THAT(takeBeaconStory(), IsEmpty());
+}
+
+TEST_F(QVReportingSessionTest, GoesByTheTypeOfTheMomentForSendsAndFlush) {
+  const auto session = makeStartedSession(1);
+  session->setServiceType(11);
+  send(*session, {{"dropped", 1}});
+  session->stop();
+  runUntilIdle();
+  EXPECT_THAT(takeBeaconStory(), IsEmpty()) << "neither sent nor flushed";
+  session->setServiceType(1);
+  session->start();
+  runUntilIdle();
+  EXPECT_THAT(takeBeaconStory(), ElementsAre("session 2", "end 1", "configuration 2"))
+      << "the first framework session lasts until the next takes its place";
+}
+
+TEST_F(QVReportingSessionTest, GoesByTheTypeOfTheStartForTheSetUp) {
+  const auto session = makeSession(7, 11);
+  session->start();
+  session->setServiceType(1);
+  runUntilIdle();
+  EXPECT_THAT(takeBeaconStory(), IsEmpty());
+  journal_.forget();
+  send(*session, {{"a", 1}});
+  runUntilIdle();
+  EXPECT_THAT(takeJournal(), ElementsAre(traceEntry(kTraceMessageSent),
+                                         sessionLine(error, "sendMessage:category:type:sync:reply:",
+                                                     "No valid BeaconSession")));
+}
+
+// ---- orientation
+
+TEST_F(QVReportingSessionTest, ReportsOrientationOfTwoServiceTypesOnInternalBuilds) {
+  makeInternalBuild();
+  for (uint16_t type = 0; type < 16; ++type) {
+    EXPECT_EQ(makeSession(7, type)->shouldReportOrientation(), type == 2 || type == 7) << type;
+  }
+  EXPECT_FALSE(makeSession()->shouldReportOrientation());
+}
+
+TEST_F(QVReportingSessionTest, ReportsNoOrientationOnOneDeviceClass) {
+  makeInternalBuild();
+  const auto session = makeSession(7, 2);
+  for (const int deviceClass : {0, 1, 5, 7, -6}) {
+    platform_.deviceInformation().setAnswer("DeviceClassNumber", deviceClass);
+    EXPECT_TRUE(session->shouldReportOrientation()) << deviceClass;
+  }
+  platform_.deviceInformation().setAnswer("DeviceClassNumber", 6);
+  EXPECT_FALSE(session->shouldReportOrientation()) << "asked anew each time";
+}
+
+TEST_F(QVReportingSessionTest, ReportsNoOrientationOnOtherBuilds) {
+  const auto session = makeSession(7, 2);
+  EXPECT_FALSE(session->shouldReportOrientation());
+  session->start();
+  EXPECT_EQ(session->startDate(), std::nullopt);
+  EXPECT_EQ(session->orientationCallbackID(), std::nullopt);
+}
+
+TEST_F(QVReportingSessionTest, NamesItsOrientationCallbacksWhileItIsStarted) {
+  makeInternalBuild();
+  const auto session = makeSession(-7, 7);
+  advance(5s);
+  session->start();
+  EXPECT_EQ(session->orientationCallbackID(), "QVReportingService -7");
+  EXPECT_EQ(session->startDate(), QVFakeClock::kStart + 5s);
+  session->stop();
+  EXPECT_EQ(session->orientationCallbackID(), std::nullopt);
+}
+
+TEST_F(QVReportingSessionTest, KeepsItsOrientationCallbacksWhenItsTypeChangesBeforeTheStop) {
+  makeInternalBuild();
+  const auto session = makeSession(7, 2);
+  session->start();
+  session->setServiceType(1);
+  session->stop();
+  EXPECT_EQ(session->orientationCallbackID(), "QVReportingService 7");
+  session->setServiceType(2);
+  session->stop();
+  EXPECT_EQ(session->orientationCallbackID(), std::nullopt) << "also when it is not started";
+}
+
+}  // namespace
