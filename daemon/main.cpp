@@ -1,0 +1,115 @@
+// The composition root: makes the adapters, gives them to the core, and runs the service.
+
+#include "QVServices/Statistics/Service/QVReportingServiceMain.h"
+#include "platform/QVPlatform.h"
+#include "platform/linux/QVAsioWorkQueues.h"
+#include "platform/linux/QVJSONDeviceInformation.h"
+#include "platform/linux/QVJSONPreferences.h"
+#include "platform/linux/QVLinuxProcess.h"
+#include "platform/linux/QVSDTTracePoints.h"
+#include "platform/linux/QVSQLiteEventStore.h"
+#include "platform/linux/QVServiceDirectories.h"
+#include "platform/linux/QVStdConditions.h"
+#include "platform/linux/QVStoreBeacon.h"
+#include "platform/linux/QVStoreCountwise.h"
+#include "platform/linux/QVStoreJoulewell.h"
+#include "platform/linux/QVSystemClock.h"
+#include "platform/linux/QVSystemLog.h"
+#include "platform/linux/QVSystemRandom.h"
+#include "platform/linux/bus/QVBusListener.h"
+
+#include <malloc.h>
+
+#include <condition_variable>
+#include <cstdlib>
+#include <memory>
+#include <mutex>
+#include <stop_token>
+#include <string>
+#include <thread>
+
+namespace {
+
+constexpr const char* kFunction = "main";
+
+// Allocations from here on come from the kernel and go back to it when freed: what a session
+// collected leaves no hole behind.
+constexpr int kMappedAllocationBytes = 64 * 1024;
+
+// When the service ends, sessions that still wait for backends get this long: enough for a store
+// that is being opened, too short for anybody to mind.
+constexpr std::chrono::seconds kLastBackendWait{1};
+
+void runDry(QVStdConditions& conditions, QVAsioWorkQueues& queues, QVSQLiteEventStore& store) {
+  {
+    const std::jthread cutter([&conditions](const std::stop_token& drained) {
+      std::mutex mutex;
+      std::condition_variable_any condition;
+      std::unique_lock lock(mutex);
+      condition.wait_for(lock, drained, kLastBackendWait, [] { return false; });
+      if (!drained.stop_requested()) conditions.cutWaitsShort();
+    });
+    queues.drain();
+  }
+  store.close();
+}
+
+// Logs why the service cannot start; answers its exit status.
+int giveUp(QVLog& log, const std::string& reason) {
+  log.error(nullptr, kFunction, reason);
+  log.flush();
+  return EXIT_FAILURE;
+}
+
+}  // namespace
+
+int main() {
+  ::mallopt(M_MMAP_THRESHOLD, kMappedAllocationBytes);
+
+  QVPlatform platform;
+  auto ownedLog = std::make_unique<QVSystemLog>(QVSystemLog::standardSink());
+  QVSystemLog& log = *ownedLog;
+  platform.log = std::move(ownedLog);
+
+  const auto directories = QVServiceDirectories::fromEnvironment();
+  if (const auto obstacle = QVServiceDirectories::obstacle(directories.state)) {
+    return giveUp(log, "cannot keep the event store in " + *obstacle);
+  }
+
+  platform.clock = std::make_unique<QVSystemClock>();
+  platform.random = std::make_unique<QVSystemRandom>();
+  platform.process = std::make_unique<QVLinuxProcess>();
+  platform.tracePoints = std::make_unique<QVSDTTracePoints>();
+  platform.preferences = std::make_unique<QVJSONPreferences>(log, directories.preferences());
+  platform.deviceInformation =
+      std::make_unique<QVJSONDeviceInformation>(log, directories.deviceInformation());
+  log.readSwitchesFrom(platform.preferences.get());
+
+  auto ownedConditions = std::make_unique<QVStdConditions>();
+  auto ownedQueues = std::make_unique<QVAsioWorkQueues>(log);
+  QVStdConditions& conditions = *ownedConditions;
+  QVAsioWorkQueues& queues = *ownedQueues;
+  platform.conditions = std::move(ownedConditions);
+  platform.queues = std::move(ownedQueues);
+
+  const auto store = std::make_shared<QVSQLiteEventStore>(
+      log, *platform.clock, *platform.preferences,
+      QVEventStoreOptions{.path = directories.store().string()});
+  platform.beacon = std::make_unique<QVStoreBeacon>(store);
+  platform.countwise = std::make_unique<QVStoreCountwise>(store);
+  platform.joulewell = std::make_unique<QVStoreJoulewell>(store);
+
+  QVPlatform::install(&platform);
+
+  std::string error;
+  platform.listener = QVBusListener::create(
+      {.socketPath = directories.socket().string(),
+       .drain = [&conditions, &queues, &store] { runDry(conditions, queues, *store); }},
+      error);
+  if (platform.listener == nullptr) return giveUp(log, error);
+
+  const int status = QVReportingServiceMain();
+  log.flush();
+  QVPlatform::install(nullptr);
+  return status;
+}
