@@ -4,6 +4,7 @@
 
 #include <array>
 #include <cerrno>
+#include <string_view>
 #include <utility>
 
 #include <fcntl.h>
@@ -27,20 +28,25 @@ std::optional<std::string> readComm(const std::string& path) {
   return name;
 }
 
-// A byte that begins a character of several.
-bool isLead(char byte) {
-  return (static_cast<unsigned char>(byte) & 0xC0U) == 0xC0U;
+std::size_t lengthOfCharacter(unsigned char lead) {
+  if (lead >= 0xF0 && lead <= 0xF4) return 4;
+  if (lead >= 0xE0) return lead < 0xF0 ? 3 : 0;
+  return lead >= 0xC2 ? 2 : 0;
+}
+
+// Bytes at the end that begin a character and do not finish it.
+std::size_t lengthOfCutCharacter(std::string_view name) {
+  for (std::size_t tail = 1; tail <= kLongestTail && tail <= name.size(); ++tail) {
+    const auto byte = static_cast<unsigned char>(name[name.size() - tail]);
+    if ((byte & 0xC0U) != 0x80U) return lengthOfCharacter(byte) > tail ? tail : 0;
+  }
+  return 0;
 }
 
 std::optional<std::string> validText(std::string name) {
-  if (QVBusIsValidText(name)) return name;
-  for (std::size_t tail = 1; tail <= kLongestTail && tail <= name.size(); ++tail) {
-    if (!isLead(name[name.size() - tail])) continue;
-    name.resize(name.size() - tail);
-    if (QVBusIsValidText(name)) return name;
-    break;
-  }
-  return std::nullopt;
+  name.resize(name.size() - lengthOfCutCharacter(name));
+  if (!QVBusIsValidText(name)) return std::nullopt;
+  return name;
 }
 
 }  // namespace

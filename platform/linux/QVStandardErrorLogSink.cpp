@@ -79,11 +79,11 @@ void QVStandardErrorLogSink::writeText(std::string_view text,
 
 // False where there is nothing to wait for any more.
 bool QVStandardErrorLogSink::waitUntilWritable(const std::atomic<bool>& giveUp) const {
-  for (;;) {
+  while (!giveUp) {
     pollfd request{descriptor_, POLLOUT, 0};
     const int count = poll(&request, 1, kLookUpMilliseconds);
     // An error is for the write to find.
     if (count != 0 && !(count < 0 && errno == EINTR)) return true;
-    if (giveUp) return false;
   }
+  return false;
 }
