@@ -1,0 +1,121 @@
+#pragma once
+
+#include <bit>
+#include <cstddef>
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+// Marshals bytes for tests, in either byte order, right or wrong: it checks nothing, so that it can
+// say what no honest peer says. Made apart from the code under test, so that the one proves the
+// other.
+class QVTestWire {
+ public:
+  explicit QVTestWire(char order = 'l') : order_(order) {}
+
+  template <class Number>
+  QVTestWire& number(Number value) {
+    align(sizeof(Number));
+    for (std::size_t i = 0; i < sizeof(Number); ++i) {
+      const std::size_t byte = order_ == 'B' ? sizeof(Number) - 1 - i : i;
+      bytes.push_back(static_cast<char>(static_cast<uint64_t>(value) >> (8 * byte)));
+    }
+    return *this;
+  }
+  QVTestWire& u8(uint8_t value) { return number(value); }
+  QVTestWire& u16(uint16_t value) { return number(value); }
+  QVTestWire& u32(uint32_t value) { return number(value); }
+  QVTestWire& u64(uint64_t value) { return number(value); }
+  QVTestWire& i64(int64_t value) { return number(value); }
+  QVTestWire& real(double value) { return number(std::bit_cast<uint64_t>(value)); }
+  QVTestWire& string(std::string_view text) {
+    return u32(static_cast<uint32_t>(text.size())).raw(text).raw(std::string(1, '\0'));
+  }
+  QVTestWire& signature(std::string_view text) {
+    return u8(static_cast<uint8_t>(text.size())).raw(text).raw(std::string(1, '\0'));
+  }
+  QVTestWire& raw(std::string_view text) {
+    bytes.append(text);
+    return *this;
+  }
+  QVTestWire& align(std::size_t alignment) {
+    while (bytes.size() % alignment != 0) bytes.push_back('\0');
+    return *this;
+  }
+  // An array whose elements `fill` writes.
+  template <class Fill>
+  QVTestWire& array(std::size_t alignment, Fill&& fill) {
+    u32(0);
+    const std::size_t lengthAt = bytes.size() - 4;
+    align(alignment);
+    const std::size_t begin = bytes.size();
+    fill(*this);
+    setNumber(lengthAt, static_cast<uint32_t>(bytes.size() - begin));
+    return *this;
+  }
+  // An entry of a dictionary of variants, up to the variant's value.
+  QVTestWire& entry(std::string_view key, std::string_view valueSignature) {
+    return align(8).string(key).signature(valueSignature);
+  }
+  // Overwrites four bytes.
+  void setNumber(std::size_t at, uint32_t value) {
+    QVTestWire other(order_);
+    other.u32(value);
+    bytes.replace(at, 4, other.bytes);
+  }
+  char order() const { return order_; }
+
+  std::string bytes;
+
+ private:
+  char order_;
+};
+
+// A message for tests: what a call of the service looks like unless told otherwise.
+struct QVTestMessage {
+  char order = 'l';
+  uint8_t type = 1;
+  uint8_t flags = 0;
+  uint8_t version = 1;
+  uint32_t serial = 1;
+  std::string path = "/net/quillon/quietvox/ReportingService";
+  std::string interface = "net.quillon.quietvox.ReportingService";
+  std::string member = "CreateReportingSession";
+  std::string destination{};
+  std::string signature{};
+  std::string body{};
+  std::string moreFields{};  // marshalled; begins at a multiple of 8
+
+  std::string bytes() const {
+    QVTestWire wire(order);
+    wire.u8(static_cast<uint8_t>(order)).u8(type).u8(flags).u8(version);
+    wire.u32(static_cast<uint32_t>(body.size())).u32(serial);
+    wire.array(8, [this](QVTestWire& fields) {
+      text(fields, 1, "o", path);
+      text(fields, 2, "s", interface);
+      text(fields, 3, "s", member);
+      text(fields, 6, "s", destination);
+      if (!signature.empty()) fields.align(8).u8(8).signature("g").signature(signature);
+      if (!moreFields.empty()) fields.align(8).raw(moreFields);
+    });
+    return wire.align(8).bytes + body;
+  }
+
+ private:
+  static void text(QVTestWire& fields, uint8_t code, std::string_view type,
+                   const std::string& value) {
+    if (!value.empty()) fields.align(8).u8(code).signature(type).string(value);
+  }
+};
+
+// A call of an operation that takes a reporter ID.
+inline std::string QVTestCall(std::string_view member, int64_t reporterID, uint32_t serial = 1,
+                              char order = 'l', uint8_t flags = 0) {
+  return QVTestMessage{.order = order,
+                       .flags = flags,
+                       .serial = serial,
+                       .member = std::string(member),
+                       .signature = "x",
+                       .body = QVTestWire(order).i64(reporterID).bytes}
+      .bytes();
+}
