@@ -22,7 +22,10 @@ std::size_t QVReportingPayloadArray::size() const {
 
 void QVReportingPayloadArray::forEach(Visitor visitor) const {
   const std::lock_guard lock(mutex_);
-  for (const Entry& entry : entries_) {
+  // By index, and up to what is there now: a visitor holds the lock too and may append.
+  const std::size_t count = entries_.size();
+  for (std::size_t i = 0; i < count; ++i) {
+    const Entry entry = entries_[i];
     visitor(entry.count == 0 ? std::string()
                              : QVText(store_->interned(entry.identifierBase), '_', entry.count),
             store_->payload(entry.position));

@@ -1,0 +1,212 @@
+#include "QVServices/Statistics/Service/QVReportingPayloadCoding.h"
+#include "QVServices/Statistics/Service/QVReportingPayloadStore.h"
+#include "platform/QVText.h"
+
+#include <bit>
+#include <cmath>
+#include <cstdint>
+#include <limits>
+#include <string>
+#include <vector>
+
+#include <gmock/gmock.h>
+
+namespace {
+
+constexpr double kInfinity = std::numeric_limits<double>::infinity();
+
+QVValue roundTrip(const QVValue& value) {
+  std::string bytes;
+  QVReportingEncodeValue(bytes, value);
+  QVReportingPayloadDecoder decoder(reinterpret_cast<const uint8_t*>(bytes.data()));
+  QVValue decoded = decoder.value();
+  return QVValue(decoded);  // a copy: what was decoded borrows the bytes
+}
+
+std::size_t encodedBytes(const QVValue& value) {
+  std::string bytes;
+  QVReportingEncodeValue(bytes, value);
+  return bytes.size();
+}
+
+TEST(QVReportingPayloadCoding, KeepsEveryKindOfValue) {
+  const std::vector<QVValue> values{
+      QVValue(),
+      false,
+      true,
+      "",
+      "text",
+      std::string(5000, 'x'),
+      std::string_view("a\0b", 3),
+      QVArray(),
+      QVArray{1, "two", QVArray{3.5, QVDictionary{{"four", QVValue()}}}},
+      QVDictionary(),
+      QVDictionary{{"", 1}, {"nested key", QVDictionary{{"x", QVArray{true}}}}}};
+  for (const QVValue& value : values) EXPECT_EQ(roundTrip(value), value) << QVText(value);
+}
+
+TEST(QVReportingPayloadCoding, KeepsIntegersOfEverySize) {
+  std::vector<int64_t> integers{0, 1, -1, 239, 240, -240, INT64_MAX, INT64_MIN, INT64_MIN + 1};
+  for (int shift = 0; shift < 63; ++shift) {
+    for (const int64_t delta : {-1, 0, 1}) {
+      integers.push_back((int64_t{1} << shift) + delta);
+      integers.push_back(-(int64_t{1} << shift) + delta);
+    }
+  }
+  for (const int64_t integer : integers) EXPECT_EQ(roundTrip(integer), QVValue(integer));
+  for (const uint64_t natural : {uint64_t{INT64_MAX} + 1, UINT64_MAX - 1, UINT64_MAX}) {
+    EXPECT_EQ(roundTrip(natural), QVValue(natural));
+  }
+}
+
+TEST(QVReportingPayloadCoding, KeepsDoublesToTheBit) {
+  std::vector<double> reals{0.0, -0.0, 0.5, 0.1, 1e300, -1e300, 5e-324, 12.5, kInfinity, -kInfinity,
+                            std::nan(""), -std::nan(""),
+                            // NaNs with payloads of their own, quiet and signalling.
+                            std::bit_cast<double>(uint64_t{0x7FF8000000000001}),
+                            std::bit_cast<double>(uint64_t{0x7FF0000000000001}),
+                            std::numeric_limits<float>::max(), std::numeric_limits<double>::max(),
+                            std::numeric_limits<float>::denorm_min()};
+  for (const double real : reals) {
+    const QVValue decoded = roundTrip(real);
+    ASSERT_EQ(decoded.kind(), QVValue::Kind::real);
+    EXPECT_EQ(std::bit_cast<uint64_t>(decoded.real()), std::bit_cast<uint64_t>(real)) << real;
+  }
+}
+
+TEST(QVReportingPayloadCoding, TakesFewBytesForUsualValues) {
+  EXPECT_EQ(encodedBytes(0), 1u);
+  EXPECT_EQ(encodedBytes(239), 1u);
+  EXPECT_EQ(encodedBytes(240), 3u);
+  EXPECT_EQ(encodedBytes(48000), 4u);
+  EXPECT_EQ(encodedBytes(true), 1u);
+  EXPECT_EQ(encodedBytes(0.5), 5u);
+  EXPECT_EQ(encodedBytes(0.1), 9u);
+  EXPECT_EQ(encodedBytes("text"), 6u);
+}
+
+TEST(QVReportingPayloadCoding, KeepsNumbersAndTexts) {
+  for (const uint64_t number :
+       {uint64_t{0}, uint64_t{127}, uint64_t{128}, uint64_t{16383}, uint64_t{16384}, UINT64_MAX}) {
+    std::string bytes;
+    QVReportingEncodeNumber(bytes, number);
+    QVReportingEncodeText(bytes, "after");
+    QVReportingPayloadDecoder decoder(reinterpret_cast<const uint8_t*>(bytes.data()));
+    EXPECT_EQ(decoder.number(), number);
+    EXPECT_EQ(decoder.text(), "after");
+  }
+}
+
+// A message as clients send them: ten entries, about 250 bytes of keys and values.
+QVDictionary typicalMessage(int number) {
+  return {{"processing_time_avg_us", 118.25},
+          {"processing_time_max_us", 1450 + number % 97},
+          {"buffer_fill_frames", 2048 - number % 512},
+          {"qvreporting_timestamp", 1.7041646e9 + number},
+          {"xrun_count", number % 3},
+          {"sample_rate_hz", 48000},
+          {"playback_position_ms", 1000 * number},
+          {"active_route", "BuiltInSpeaker"},
+          {"is_now_playing", true},
+          {"audio_queue_identifier", "queue-17"}};
+}
+
+std::size_t contentBytes(const QVDictionary& message) {
+  std::size_t bytes = 0;
+  for (const auto& [key, value] : message) {
+    bytes += key.size() + (value.isString() ? value.string().size() : sizeof(int64_t));
+  }
+  return bytes;
+}
+
+TEST(QVReportingPayloadStore, GivesPayloadsBack) {
+  QVReportingPayloadStore store;
+  const QVDictionary nested{{"a", QVDictionary{{"deep", QVArray{1, "x"}}}}, {"b", UINT64_MAX}};
+  const auto first = store.append({{"a", 1}});
+  const auto second = store.append(nested);
+  const auto third = store.append({});
+  const auto fourth = store.append({{"a", 2}});
+  EXPECT_EQ(store.payload(first), (QVDictionary{{"a", 1}}));
+  EXPECT_EQ(store.payload(second), nested);
+  EXPECT_TRUE(store.payload(third).empty());
+  EXPECT_EQ(store.payload(fourth), (QVDictionary{{"a", 2}}));
+}
+
+TEST(QVReportingPayloadStore, GivesPayloadsThatOutliveIt) {
+  QVDictionary payload;
+  {
+    QVReportingPayloadStore store;
+    payload = store.payload(store.append({{"key", "characters in the store"}}));
+  }
+  EXPECT_EQ(payload, (QVDictionary{{"key", "characters in the store"}}));
+}
+
+TEST(QVReportingPayloadStore, GivesManyPayloadsOfManyKindsBack) {
+  QVReportingPayloadStore store;
+  std::vector<QVReportingPayloadStore::Position> positions;
+  const auto message = [](int number) {
+    // Three sets of keys in turn, and from time to time a text larger than any chunk.
+    const std::string text(number % 500 == 0 ? 100'000 : static_cast<std::size_t>(number % 40),
+                           'x');
+    return QVDictionary{{number % 3 == 0   ? "a"
+                         : number % 3 == 1 ? "b"
+                                           : "c",
+                         number},
+                        {"text", text}};
+  };
+  for (int number = 0; number < 3000; ++number) positions.push_back(store.append(message(number)));
+  for (int number = 0; number < 3000; ++number) {
+    ASSERT_EQ(store.payload(positions[static_cast<std::size_t>(number)]), message(number))
+        << number;
+  }
+}
+
+TEST(QVReportingPayloadStore, TakesPayloadsWithMoreSetsOfKeysThanItRemembers) {
+  QVReportingPayloadStore store;
+  std::vector<QVReportingPayloadStore::Position> positions;
+  const auto message = [](int number) {
+    return QVDictionary{{QVText("key ", number), number}, {"common", "x"}};
+  };
+  constexpr int kSets = 4096 + 500;
+  for (int number = 0; number < kSets; ++number) positions.push_back(store.append(message(number)));
+  const std::size_t before = store.footprint();
+  // Those that are remembered still are; those that came too late are written out each time.
+  positions.push_back(store.append(message(0)));
+  for (int number = 0; number < kSets; ++number) {
+    ASSERT_EQ(store.payload(positions[static_cast<std::size_t>(number)]), message(number));
+  }
+  EXPECT_EQ(store.payload(positions.back()), message(0));
+  EXPECT_GE(store.footprint(), before);
+}
+
+TEST(QVReportingPayloadStore, StaysSmallForASingleMessage) {
+  QVReportingPayloadStore store;
+  EXPECT_EQ(store.footprint(), 0u);
+  store.append({{"a", 1}});
+  EXPECT_EQ(store.footprint(), 512u);
+}
+
+TEST(QVReportingPayloadStore, TakesLittleForATypicalMessage) {
+  // Both arrays of a session hold an entry of 16 bytes for a message; its payload lies here once.
+  constexpr std::size_t kEntries = 2 * 16;
+  constexpr std::size_t kMost = 120;
+  constexpr int kMessages = 20'000;
+  EXPECT_GE(contentBytes(typicalMessage(1)), 240u);
+  QVReportingPayloadStore store;
+  for (int number = 0; number < kMessages; ++number) store.append(typicalMessage(number));
+  const std::size_t perMessage = store.footprint() / kMessages + kEntries;
+  EXPECT_LE(perMessage, kMost);
+  RecordProperty("bytes_per_message", static_cast<int>(perMessage));
+}
+
+TEST(QVReportingPayloadStore, InternsTexts) {
+  QVReportingPayloadStore store;
+  const uint32_t first = store.intern("Session_Playback_Start");
+  const uint32_t second = store.intern("Session_Playback_Stop");
+  EXPECT_NE(first, second);
+  EXPECT_EQ(store.intern("Session_Playback_Start"), first);
+  EXPECT_EQ(store.interned(first), "Session_Playback_Start");
+  EXPECT_EQ(store.interned(second), "Session_Playback_Stop");
+}
+
+}  // namespace
