@@ -11,8 +11,10 @@ from project import open_project, without_comments
 SOURCE_LINES = 500
 TEST_LINES = 800
 HEADER_CODE_LINES = 100
-# A folder with more C++ files than this says in a README what belongs there.
+# A folder with more C++ files than this says in a README what belongs there. For the folders of
+# tests and measurements one README above them is enough.
 FILES_WITHOUT_README = 6
+SHARED_README = ("tests", "bench", "fuzz")
 
 TEXT_SUFFIXES = (".cpp", ".h", ".py", ".md", ".txt", ".cmake", ".json", ".yml", ".sh", ".service",
                  ".socket", ".c")
@@ -68,7 +70,9 @@ def main():
             check_header(project, name, text)
         folders.setdefault(name.rsplit("/", 1)[0], []).append(name)
     for folder, names in folders.items():
-        if len(names) > FILES_WITHOUT_README and not project.has(f"{folder}/README.md"):
+        top = folder.split("/")[0]
+        readmes = [f"{folder}/README.md", *([f"{top}/README.md"] if top in SHARED_README else [])]
+        if len(names) > FILES_WITHOUT_README and not any(map(project.has, readmes)):
             project.report(folder, 1, "readme",
                            f"{len(names)} files and no README.md: what belongs here, what it may include")
     for name in project.files:

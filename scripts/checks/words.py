@@ -27,7 +27,7 @@ EVERYWHERE = [
      "say what was wrong, not under which number"),
     ("workplace", _pattern(r"\bpro", r"mpts?\b|\bsub-?age", r"nts?\b|\bhelper (?:age", r"nt|session)s?\b"),
      "write as the system's own developer"),
-    ("workplace", _pattern(r"\b(?:this|my|our|the|next|previous|earlier) (?:ta", r"sk|bri", r"ef)\b"),
+    ("workplace", _pattern(r"\b(?:this|my|our) (?:ta", r"sk|bri", r"ef)\b"),
      "write as the system's own developer"),
     ("workplace", _pattern(r"\b(?:language mo", r"del|AI-gen", r"erated|LL", r"Ms?)\b"),
      "write as the system's own developer"),
