@@ -67,14 +67,29 @@ void QVBusConnection::continueReading() {
   if (state_ == State::accepted || state_ == State::closed || waitsToRead_) return;
   // While bytes wait there is a wait to write, or a wake, after which we come here again.
   if (unwritten() > kMostUnwritten) return;
-  if (!server_.budget().admits(*account_)) {
-    server_.resumeWhenAdmitted(*this);
-    return;
-  }
+  if (!isAdmitted()) return;
   waitsToRead_ = true;
   socket_.waitReadable([weak = weak_from_this()] {
     if (const auto self = weak.lock()) self->onReadable();
   });
+}
+
+// If the intake budget does not admit the connection, sees to it that it goes on later.
+bool QVBusConnection::isAdmitted() {
+  // What a peer that has gone left behind is no more than the kernel's buffer holds, and half a
+  // message is let go of only by reading to its end.
+  if (hungUp_ || server_.budget().admits(*account_)) return true;
+  server_.resumeWhenAdmitted(*this);
+  if (!waitsForHangUp_) {
+    waitsForHangUp_ = true;
+    socket_.waitHangUp([weak = weak_from_this()] {
+      if (const auto self = weak.lock()) {
+        self->hungUp_ = true;
+        self->continueReading();
+      }
+    });
+  }
+  return false;
 }
 
 void QVBusConnection::onReadable() {

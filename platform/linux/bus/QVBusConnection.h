@@ -29,7 +29,8 @@ class QVBusServer;
 // Threads: the loop's thread only; replies come from any thread, through the outbox.
 // Ownership: the server holds it until it is closed; waits and wakes hold it weakly.
 // Limits: not read while more than 1 MiB waits to be written to its peer, nor while the intake
-// budget does not admit it. An idle connection holds no buffer of more than 4 KiB.
+// budget does not admit it, unless the peer has gone and only the rest is left. An idle connection
+// holds no buffer of more than 4 KiB.
 class QVBusConnection final : public QVIPCConnection,
                               public std::enable_shared_from_this<QVBusConnection> {
  public:
@@ -56,6 +57,7 @@ class QVBusConnection final : public QVIPCConnection,
  private:
   enum class State { accepted, authenticating, open, closed };
 
+  bool isAdmitted();
   void onReadable();
   void onWake();
   void takeBytes(std::string_view bytes);
@@ -78,6 +80,8 @@ class QVBusConnection final : public QVIPCConnection,
   QVBusFrameDecoder decoder_;
   QVBusKnownHeader knownHeader_;
   bool waitsToRead_ = false;
+  bool waitsForHangUp_ = false;
+  bool hungUp_ = false;
   QVIntakeBudget::AccountHandle account_;
   std::size_t charged_ = 0;  // for the decoder's memory
 

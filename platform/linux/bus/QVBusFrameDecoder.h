@@ -32,7 +32,7 @@ class QVBusFrameDecoder {
   const char* failure() const noexcept { return failure_; }
 
   // Memory held for a message that is not whole yet.
-  std::size_t bytesHeld() const noexcept { return kept_.capacity(); }
+  std::size_t bytesHeld() const noexcept { return kept_.empty() ? 0 : kept_.capacity(); }
 
  private:
   std::size_t messageLength(const char* header) noexcept;

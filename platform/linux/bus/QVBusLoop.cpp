@@ -37,5 +37,5 @@ void QVBusLoop::stop() {
 bool QVBusLoop::runOne(QVDuration longest) {
   const auto guard = asio::make_work_guard(*context_);
   context_->restart();
-  return context_->run_one_for(longest) != 0;
+  return context_->poll_one() != 0 || context_->run_one_for(longest) != 0;
 }

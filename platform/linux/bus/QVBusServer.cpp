@@ -55,7 +55,7 @@ void QVBusServer::forget(const QVBusConnection& connection) {
 }
 
 void QVBusServer::resumeWhenAdmitted(const QVBusConnection& connection) {
-  notAdmitted_.push_back(connection.number());
+  notAdmitted_.insert(connection.number());
 }
 
 void QVBusServer::resumeAdmitted() {

@@ -10,7 +10,7 @@
 #include <span>
 #include <string>
 #include <unordered_map>
-#include <vector>
+#include <unordered_set>
 
 class QVBusConnection;
 class QVBusLoop;
@@ -61,7 +61,7 @@ class QVBusServer {
   QVReportingServiceExporter exporter_;
   const std::shared_ptr<QVIntakeBudget> budget_;
   std::unordered_map<uint64_t, std::shared_ptr<QVBusConnection>> connections_;
-  std::vector<uint64_t> notAdmitted_;
+  std::unordered_set<uint64_t> notAdmitted_;
   uint64_t lastNumber_ = 0;
   QVFunction<void()> closedHandler_;
 };

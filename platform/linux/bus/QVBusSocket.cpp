@@ -73,6 +73,10 @@ void QVBusSocket::waitWritable(QVFunction<void()> handler) {
   wait(asio::posix::stream_descriptor::wait_write, std::move(handler));
 }
 
+void QVBusSocket::waitHangUp(QVFunction<void()> handler) {
+  wait(asio::posix::stream_descriptor::wait_error, std::move(handler));
+}
+
 void QVBusSocket::close() {
   asio::error_code ignored;
   descriptor_->waiter.close(ignored);

@@ -39,6 +39,8 @@ class QVBusSocket {
   // included; never after close(). One wait of each kind at a time.
   void waitReadable(QVFunction<void()> handler);
   void waitWritable(QVFunction<void()> handler);
+  // The same when the peer has gone; what it sent before may still be there.
+  void waitHangUp(QVFunction<void()> handler);
 
   // Closes the descriptor; the waits' handlers go unrun. May be called again.
   void close();

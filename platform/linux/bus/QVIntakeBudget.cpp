@@ -61,6 +61,9 @@ void QVIntakeBudget::Account::remove(std::size_t bytes) noexcept {
   }
   const auto budget = budget_;
   state = state_.fetch_sub(bytes * kUnit) - bytes * kUnit;
-  if (state == 0) delete this;
+  if (state == 0) {
+    delete this;
+    return;
+  }
   if (budget->isWithin(bytesIn(state))) budget->wakeUp();
 }

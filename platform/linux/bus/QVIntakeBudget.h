@@ -73,7 +73,8 @@ class QVIntakeBudget::Account final : public QVMemoryCharge {
   // bit while the connection waits: so one operation removes bytes and tells whether to wake.
   static constexpr std::size_t kWaits = 1;
   static constexpr std::size_t kUnit = 2;
-  static std::size_t bytesIn(std::size_t state) noexcept { return state / kUnit; }
+  // While the connection is open.
+  static std::size_t bytesIn(std::size_t state) noexcept { return state / kUnit - 1; }
 
   const std::shared_ptr<QVIntakeBudget> budget_;
   std::atomic<std::size_t> state_{kUnit};
