@@ -12,6 +12,7 @@
 #include <type_traits>
 #include <utility>
 
+#include <fcntl.h>
 #include <sqlite3.h>
 #include <unistd.h>
 
@@ -53,6 +54,15 @@ std::string timeText(QVDate date) {
   std::array<char, 32> text{};
   const std::size_t length = std::strftime(text.data(), text.size(), "%Y%m%dT%H%M%SZ", &parts);
   return {text.data(), length};
+}
+
+// What keeps files from being made beside `path`; empty where nothing does. SQLite does not tell a
+// directory that may not be written to from a missing one.
+std::string directoryObstacle(const std::string& path) {
+  const std::size_t slash = path.rfind('/');
+  const std::string directory = slash == std::string::npos ? "." : path.substr(0, slash + 1);
+  if (faccessat(AT_FDCWD, directory.c_str(), W_OK | X_OK, AT_EACCESS) == 0) return {};
+  return QVText("its directory: ", std::strerror(errno));
 }
 
 // Rows that are events: what is counted when they are lost.
@@ -125,6 +135,9 @@ bool QVEventStoreWriter::openStore() {
     }
     openFailure_.clear();
     return true;
+  }
+  if (std::string obstacle = directoryObstacle(options_.path); !obstacle.empty()) {
+    reason = std::move(obstacle);
   }
   if (reason != openFailure_) {
     log_.error(nullptr, "QVEventStoreWriter::openStore", "the event store ", options_.path,

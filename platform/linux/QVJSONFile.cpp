@@ -138,7 +138,11 @@ std::optional<QVValue> QVJSONFile::parse(std::string_view text, QVJSONFailure& f
   rapidjson::MemoryStream stream(text.data(), text.size());
   rapidjson::Reader reader;
   Builder builder;
-  const rapidjson::ParseResult result = reader.Parse<kFlags>(stream, builder);
+  rapidjson::ParseResult result = reader.Parse<kFlags>(stream, builder);
+  // The reader takes a NUL for the text's end.
+  if (!result.IsError() && stream.Tell() != text.size()) {
+    result.Set(rapidjson::kParseErrorDocumentRootNotSingular, stream.Tell());
+  }
   if (!result.IsError()) return builder.takeResult();
   const std::string_view before = text.substr(0, std::min(result.Offset(), text.size()));
   const std::size_t lineStart = before.rfind('\n') + 1;  // 0 where there is none
