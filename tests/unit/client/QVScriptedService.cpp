@@ -73,9 +73,8 @@ bool QVScriptedService::receive(bool wait, std::string& bytes) {
     ADD_FAILURE() << "the client sent nothing";
     return false;
   }
-  bytes.resize(std::size_t{1} << 20);
-  const ssize_t count = recv(socket_, bytes.data(), bytes.size(), MSG_DONTWAIT);
-  bytes.resize(count > 0 ? static_cast<std::size_t>(count) : 0);
+  const ssize_t count = recv(socket_, buffer_.data(), buffer_.size(), MSG_DONTWAIT);
+  bytes.assign(buffer_.data(), count > 0 ? static_cast<std::size_t>(count) : 0);
   return count > 0;
 }
 
@@ -164,6 +163,11 @@ void QVScriptedService::send(std::string_view bytes) {
 
 void QVScriptedService::hangUp() {
   if (socket_ >= 0) close(std::exchange(socket_, -1));
+}
+
+std::string nameOfCallbackThread(
+    const testing::TestParamInfo<QVClientOptions::Callbacks>& parameter) {
+  return parameter.param == QVClientOptions::Callbacks::ownThread ? "OwnThread" : "PollLoop";
 }
 
 void dispatchWhenReadable(QVClient& client) {

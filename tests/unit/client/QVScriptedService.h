@@ -13,6 +13,7 @@
 #include <string>
 #include <vector>
 
+#include <gtest/gtest.h>
 #include <sys/socket.h>
 
 // The other end of a client's connection, which says what the test tells it to.
@@ -71,9 +72,17 @@ class QVScriptedService {
   QVBusFrameDecoder frames_;
   std::deque<Call> calls_;
   uint32_t lastSerial_ = 0;
+  // Larger than any one write that a test looks at.
+  std::vector<char> buffer_ = std::vector<char>(std::size_t{256} << 10);
 
   static uint32_t ownUserID();
 };
+
+// For suites that hold for both kinds of callback threads.
+inline const auto kBothCallbackThreads =
+    testing::Values(QVClientOptions::Callbacks::ownThread, QVClientOptions::Callbacks::pollLoop);
+std::string nameOfCallbackThread(
+    const testing::TestParamInfo<QVClientOptions::Callbacks>& parameter);
 
 // Waits until the client's descriptor is readable, and dispatches once.
 void dispatchWhenReadable(QVClient& client);
