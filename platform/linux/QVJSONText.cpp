@@ -8,11 +8,6 @@
 #include <cstring>
 #include <string>
 
-#if defined(__SSE2__)
-#define RAPIDJSON_SSE2
-#elif defined(__ARM_NEON)
-#define RAPIDJSON_NEON
-#endif
 #include <rapidjson/prettywriter.h>
 #include <rapidjson/stringbuffer.h>
 #include <rapidjson/writer.h>
@@ -21,6 +16,9 @@ namespace {
 
 // A buffer that one large text has grown beyond this is given back, in bytes.
 constexpr std::size_t kKeptBufferBytes = 256 * 1024;
+
+// Below this every whole number is a double of its own.
+constexpr double kWholeNumbers = 0x1p53;
 
 constexpr std::string_view kReplacement = "\xEF\xBF\xBD";
 
@@ -55,20 +53,34 @@ Sequence sequenceAt(std::string_view bytes) {
 std::size_t validPrefix(std::string_view bytes) {
   std::size_t i = 0;
   while (i < bytes.size()) {
-    // Nearly all text is ASCII: eight bytes at a time.
-    uint64_t eight = 0;
-    if (i + sizeof eight <= bytes.size()) {
-      std::memcpy(&eight, bytes.data() + i, sizeof eight);
-      if ((eight & 0x8080808080808080U) == 0) {
-        i += sizeof eight;
-        continue;
-      }
-    }
     const Sequence sequence = sequenceAt(bytes.substr(i));
     if (!sequence.valid) return i;
     i += sequence.length;
   }
   return i;
+}
+
+// Is there a byte in the word that JSON escapes, or that is not ASCII? May say yes to a word that
+// has none, never no to one that has. The usual trick: taking 1 from a zero byte sets its top bit.
+constexpr bool mayNeedCare(uint64_t word) {
+  constexpr uint64_t kOnes = 0x0101010101010101;
+  constexpr uint64_t kTops = 0x8080808080808080;
+  const uint64_t quotes = word ^ (kOnes * '"');
+  const uint64_t backslashes = word ^ (kOnes * '\\');
+  return ((word | (word - kOnes * 0x20) | (quotes - kOnes) | (backslashes - kOnes)) & kTops) != 0;
+}
+
+// Printable ASCII without quotes and backslashes: nearly all text is, and is copied as it is.
+bool isPlain(std::string_view text) {
+  uint64_t word = 0;
+  std::size_t i = 0;
+  for (; i + sizeof word <= text.size(); i += sizeof word) {
+    std::memcpy(&word, text.data() + i, sizeof word);
+    if (mayNeedCare(word)) return false;
+  }
+  word = 0x2020202020202020;
+  if (i < text.size()) std::memcpy(&word, text.data() + i, text.size() - i);
+  return !mayNeedCare(word);
 }
 
 std::string repaired(std::string_view bytes) {
@@ -83,6 +95,30 @@ std::string repaired(std::string_view bytes) {
   }
   return text;
 }
+
+// RapidJSON's writers look at each character of a string; these copy the ones that need no look.
+class CompactWriter : public rapidjson::Writer<rapidjson::StringBuffer> {
+ public:
+  using Writer::Writer;
+
+  bool plainString(std::string_view text) {
+    Prefix(rapidjson::kStringType);
+    char* place = os_->Push(text.size() + 2);
+    *place++ = '"';
+    place = std::copy(text.begin(), text.end(), place);
+    *place = '"';
+    return EndValue(true);
+  }
+};
+
+class PrettyWriter : public rapidjson::PrettyWriter<rapidjson::StringBuffer> {
+ public:
+  using rapidjson::PrettyWriter<rapidjson::StringBuffer>::PrettyWriter;
+
+  bool plainString(std::string_view text) {
+    return String(text.data(), static_cast<rapidjson::SizeType>(text.size()));
+  }
+};
 
 template <class Writer>
 class Streamer {
@@ -130,28 +166,34 @@ class Streamer {
   }
 
   bool string(std::string_view text) {
-    if (validPrefix(text) == text.size()) return plain(text);
-    return plain(repaired(text));
+    if (text.empty()) return writer_.plainString("");
+    if (isPlain(text)) return writer_.plainString(text);
+    if (validPrefix(text) == text.size()) return escaped(text);
+    return escaped(repaired(text));
   }
 
-  bool plain(std::string_view text) {
-    // The writer wants a pointer even for no characters.
-    return writer_.String(text.data() == nullptr ? "" : text.data(),
-                          static_cast<rapidjson::SizeType>(text.size()));
+  bool escaped(std::string_view text) {
+    return writer_.String(text.data(), static_cast<rapidjson::SizeType>(text.size()));
   }
 
   bool real(double number) {
     if (!std::isfinite(number)) {
       if (!quoteNonFinite_) return false;
-      return plain(std::isnan(number) ? "nan" : number < 0 ? "-inf" : "inf");
+      return string(std::isnan(number) ? "nan" : number < 0 ? "-inf" : "inf");
     }
-    const double magnitude = std::fabs(number);
-    const bool fixed = number == 0 || (magnitude >= 1e-4 && magnitude < 1e17);
     std::array<char, 64> text;
-    char* end = std::to_chars(text.data(), text.data() + text.size(), number,
-                              fixed ? std::chars_format::fixed : std::chars_format::scientific)
-                    .ptr;
-    if (fixed && std::find(text.data(), end, '.') == end) {
+    char* end = text.data();
+    const double magnitude = std::fabs(number);
+    if (magnitude >= 1 && magnitude < kWholeNumbers && number == std::trunc(number)) {
+      // The same digits, found faster.
+      end = std::to_chars(end, end + text.size(), static_cast<int64_t>(number)).ptr;
+    } else {
+      const bool fixed = number == 0 || (magnitude >= 1e-4 && magnitude < 1e17);
+      end = std::to_chars(end, end + text.size(), number,
+                          fixed ? std::chars_format::fixed : std::chars_format::scientific)
+                .ptr;
+    }
+    if (std::none_of(text.data(), end, [](char c) { return c == '.' || c == 'e'; })) {
       *end++ = '.';
       *end++ = '0';
     }
@@ -174,8 +216,8 @@ struct QVJSONText::State {
   const Layout layout;
   const NonFinite nonFinite;
   rapidjson::StringBuffer buffer;
-  rapidjson::Writer<rapidjson::StringBuffer> compact{buffer};
-  rapidjson::PrettyWriter<rapidjson::StringBuffer> pretty{buffer};
+  CompactWriter compact{buffer};
+  PrettyWriter pretty{buffer};
 
   template <class Part>
   std::optional<std::string_view> write(Part part) {

@@ -4,6 +4,7 @@
 #include <cmath>
 #include <limits>
 #include <string>
+#include <utility>
 
 #include <gtest/gtest.h>
 
@@ -41,6 +42,9 @@ TEST(QVJSONText, KeepsTheKindOfDoubles) {
   EXPECT_EQ(compact(-0.0), "-0.0");
   EXPECT_EQ(compact(44100.0), "44100.0");
   EXPECT_EQ(compact(100000.0), "100000.0");
+  EXPECT_EQ(compact(-1.0), "-1.0");
+  EXPECT_EQ(compact(9007199254740991.0), "9007199254740991.0");
+  EXPECT_EQ(compact(9007199254740994.0), "9007199254740994.0");
   EXPECT_EQ(compact(99999999999999984.0), "99999999999999984.0");
 }
 
@@ -51,6 +55,7 @@ TEST(QVJSONText, WritesDoublesAsTheShortestTextThatReadsBackEqual) {
   EXPECT_EQ(compact(1e-5), "1e-05");
   EXPECT_EQ(compact(1e17), "1e+17");
   EXPECT_EQ(compact(-1.5e300), "-1.5e+300");
+  EXPECT_EQ(compact(1e300), "1e+300");
   for (const double number : {0.1, 1e-300, 1e17, 2.5, 5e-324, 1.7976931348623157e308, 123456.789}) {
     QVJSONFailure failure;
     EXPECT_EQ(QVJSONFile::parse(compact(number), failure), QVValue(number));
@@ -83,6 +88,22 @@ TEST(QVJSONText, EscapesWhatHasToBe) {
   EXPECT_EQ(compact("a\"b\\c\n\t\x01"), R"("a\"b\\c\n\t\u0001")");
   EXPECT_EQ(compact(std::string_view("a\0b", 3)), R"("a\u0000b")");
   EXPECT_EQ(compact(QVDictionary{{"a\"b", 1}}), R"({"a\"b":1})");
+}
+
+TEST(QVJSONText, EscapesWhereverItStands) {
+  for (const auto& [byte, escape] :
+       {std::pair{'"', "\\\""}, std::pair{'\\', "\\\\"}, std::pair{'\x1F', "\\u001F"}}) {
+    for (std::size_t size = 1; size < 20; ++size) {
+      for (std::size_t place = 0; place < size; ++place) {
+        std::string text(size, 'x');
+        text[place] = byte;
+        std::string expected(size - 1, 'x');
+        expected.insert(place, escape);
+        EXPECT_EQ(compact(text), '"' + expected + '"');
+      }
+    }
+  }
+  EXPECT_EQ(compact("\x7F !#[]^~\x7F"), "\"\x7F !#[]^~\x7F\"");
 }
 
 TEST(QVJSONText, LeavesUTF8AsItIs) {
