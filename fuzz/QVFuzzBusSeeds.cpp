@@ -1,6 +1,6 @@
 #include "fuzz/QVFuzzBusSeeds.h"
 
-#include "tests/unit/bus/QVTestWire.h"
+#include "tests/unit/bus/QVTestMessage.h"
 
 #include <string_view>
 

@@ -1,6 +1,7 @@
 #include "platform/linux/bus/QVBusConnection.h"
 
 #include "platform/QVPlatform.h"
+#include "platform/linux/QVWakeUpBatch.h"
 #include "platform/linux/bus/QVBusLoop.h"
 #include "platform/linux/bus/QVBusServer.h"
 
@@ -98,6 +99,7 @@ void QVBusConnection::onReadable() {
   if (unwritten() <= kMostUnwritten) {
     // What a batch of calls is answered on this thread goes out in one write after it.
     outbox_->hold();
+    const QVWakeUpBatch wakeUps;
     const auto buffer = server_.readBuffer();
     const auto received = socket_.receive(buffer);
     switch (received.status) {

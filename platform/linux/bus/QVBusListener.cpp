@@ -15,6 +15,7 @@
 
 #include <asio/io_context.hpp>
 #include <asio/signal_set.hpp>
+#include <asio/steady_timer.hpp>
 #include <systemd/sd-daemon.h>
 #include <unistd.h>
 
@@ -36,6 +37,7 @@ struct QVBusListener::Inside {
   std::unique_ptr<QVBusListeningSocket> place;
   QVBusSocket listening;
   asio::signal_set signals{loop.context()};
+  asio::steady_timer acceptAgain{loop.context()};
   std::weak_ptr<QVIPCListenerDelegate> delegate;
   bool waits = false;             // for a client
   bool outOfDescriptors = false;  // does not wait, and has said so
@@ -129,5 +131,8 @@ void QVBusListener::acceptLater(int error) {
                                     "cannot accept a connection: ", std::strerror(error),
                                     "; clients wait until one closes");
   }
-  inside_->loop.postAfter(kAcceptAgainAfter, [this] { acceptWhenReadable(); });
+  inside_->acceptAgain.expires_after(kAcceptAgainAfter);
+  inside_->acceptAgain.async_wait([this](const asio::error_code& cancelled) {
+    if (!cancelled) acceptWhenReadable();
+  });
 }

@@ -5,7 +5,6 @@
 #include <asio/executor_work_guard.hpp>
 #include <asio/io_context.hpp>
 #include <asio/post.hpp>
-#include <asio/steady_timer.hpp>
 
 // A concurrency hint of 1: one thread runs the loop, others only post.
 QVBusLoop::QVBusLoop() : context_(std::make_unique<asio::io_context>(1)) {}
@@ -14,15 +13,6 @@ QVBusLoop::~QVBusLoop() = default;
 
 void QVBusLoop::post(QVFunction<void()> work) {
   asio::post(*context_, [work = std::move(work)]() mutable { work(); });
-}
-
-void QVBusLoop::postAfter(QVDuration delay, QVFunction<void()> work) {
-  auto timer = std::make_unique<asio::steady_timer>(*context_, delay);
-  auto& waiting = *timer;
-  waiting.async_wait(
-      [timer = std::move(timer), work = std::move(work)](const asio::error_code& error) mutable {
-        if (!error) work();
-      });
 }
 
 void QVBusLoop::run() {

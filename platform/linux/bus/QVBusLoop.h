@@ -21,8 +21,6 @@ class QVBusLoop {
   QVBusLoop& operator=(const QVBusLoop&) = delete;
 
   void post(QVFunction<void()> work);
-  // Runs `work` on the loop once that time has passed.
-  void postAfter(QVDuration delay, QVFunction<void()> work);
 
   // Runs what is posted and what is waited for, until stop().
   void run();

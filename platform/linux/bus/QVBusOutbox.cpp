@@ -1,5 +1,7 @@
 #include "platform/linux/bus/QVBusOutbox.h"
 
+#include "platform/linux/QVWakeUpBatch.h"
+
 void QVBusOutbox::putBytes(std::string_view bytes) {
   const QVMutexLock lock(mutex_);
   if (closed_ || bytes.empty()) return;
@@ -10,8 +12,17 @@ void QVBusOutbox::putBytes(std::string_view bytes) {
 void QVBusOutbox::wakeOnce() {
   if (woken_) return;
   woken_ = true;
-  // Under the lock: once closed, the loop that is woken may be gone.
-  wake_();
+  if (auto* const wakeUps = QVWakeUpBatch::current()) {
+    wakeUps->add([self = shared_from_this()] { self->wake(); });
+  } else {
+    // Under the lock: once closed, the loop that is woken may be gone.
+    wake_();
+  }
+}
+
+void QVBusOutbox::wake() {
+  const QVMutexLock lock(mutex_);
+  if (!closed_) wake_();
 }
 
 void QVBusOutbox::hold() {

@@ -6,6 +6,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <memory>
 #include <string>
 #include <string_view>
 
@@ -16,10 +17,10 @@
 // Owned by the connection and by the replies that are still out, which so outlive it harmlessly.
 //
 // Threads: any.
-class QVBusOutbox {
+class QVBusOutbox : public std::enable_shared_from_this<QVBusOutbox> {
  public:
   // `wake` is called when there is something to take, once until it has been taken; under the lock
-  // and on any thread, so it only posts.
+  // and on any thread, so it only posts. Within a QVWakeUpBatch it is called at the batch's end.
   explicit QVBusOutbox(QVFunction<void()> wake) : wake_(std::move(wake)) {}
 
   // Puts in one message with that header (its serial is given here), its body written by
@@ -53,6 +54,7 @@ class QVBusOutbox {
     return serial_;
   }
   void wakeOnce() QV_REQUIRES(mutex_);
+  void wake() QV_EXCLUDES(mutex_);
 
   QVMutex mutex_;
   std::string bytes_ QV_GUARDED_BY(mutex_);

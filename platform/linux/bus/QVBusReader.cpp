@@ -21,6 +21,12 @@ void QVBusReader::skipPadding(std::size_t aligned) noexcept {
   }
 }
 
+bool QVBusReader::readBoolean() noexcept {
+  const auto number = readNumber<uint32_t>();
+  if (number > 1) fail("a boolean is neither 0 nor 1");
+  return number == 1;
+}
+
 std::string_view QVBusReader::readObjectPath() noexcept {
   const auto path = readString();
   if (ok() && !QVBusIsValidObjectPath(path)) {

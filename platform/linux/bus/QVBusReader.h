@@ -55,12 +55,7 @@ class QVBusReader {
     position_ += sizeof(Number);
     return number;
   }
-  bool readBoolean() noexcept {
-    const auto number = readNumber<uint32_t>();
-    if (number > 1) [[unlikely]]
-      fail("a boolean is neither 0 nor 1");
-    return number == 1;
-  }
+  bool readBoolean() noexcept;
   double readDouble() noexcept { return std::bit_cast<double>(readNumber<uint64_t>()); }
   std::string_view readString() noexcept {
     const auto text = readTerminated(readNumber<uint32_t>());

@@ -7,6 +7,7 @@
 
 #include <asio/io_context.hpp>
 #include <asio/posix/stream_descriptor.hpp>
+#include <poll.h>
 #include <sys/socket.h>
 #include <unistd.h>
 
@@ -54,7 +55,13 @@ QVBusSocket::Result QVBusSocket::send(std::string_view bytes) {
 
 int QVBusSocket::accept() {
   const int accepted = ::accept4(descriptor(), nullptr, nullptr, SOCK_NONBLOCK | SOCK_CLOEXEC);
-  return accepted < 0 ? -errno : accepted;
+  if (accepted >= 0) return accepted;
+  const int error = errno;
+  // The kernel looks for a free descriptor before it looks for a client, so without one it
+  // complains where nobody waits, too.
+  pollfd waiting{descriptor(), POLLIN, 0};
+  const bool outOfDescriptors = error == EMFILE || error == ENFILE;
+  return outOfDescriptors && ::poll(&waiting, 1, 0) == 0 ? -EAGAIN : -error;
 }
 
 template <class Kind>

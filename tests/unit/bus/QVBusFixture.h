@@ -5,7 +5,7 @@
 #include "platform/linux/bus/QVBusLoop.h"
 #include "platform/linux/bus/QVBusServer.h"
 #include "tests/unit/bus/QVRecordingService.h"
-#include "tests/unit/bus/QVTestWire.h"
+#include "tests/unit/bus/QVTestMessage.h"
 
 #include <memory>
 #include <string>

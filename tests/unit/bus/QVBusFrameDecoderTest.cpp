@@ -1,6 +1,6 @@
 #include "platform/linux/bus/QVBusFrameDecoder.h"
 #include "platform/linux/bus/QVBusProtocol.h"
-#include "tests/unit/bus/QVTestWire.h"
+#include "tests/unit/bus/QVTestMessage.h"
 
 #include <string>
 #include <string_view>

@@ -3,7 +3,7 @@
 #include "platform/linux/bus/QVBusListener.h"
 #include "platform/linux/bus/QVBusListeningSocket.h"
 #include "tests/unit/bus/QVRecordingService.h"
-#include "tests/unit/bus/QVTestWire.h"
+#include "tests/unit/bus/QVTestMessage.h"
 
 #include <array>
 #include <atomic>

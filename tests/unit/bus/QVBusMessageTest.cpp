@@ -1,5 +1,5 @@
 #include "platform/linux/bus/QVBusMessage.h"
-#include "tests/unit/bus/QVTestWire.h"
+#include "tests/unit/bus/QVTestMessage.h"
 
 #include <string>
 #include <string_view>

@@ -1,6 +1,6 @@
 #include "platform/linux/bus/QVBusMessage.h"
 #include "platform/linux/bus/QVBusWriter.h"
-#include "tests/unit/bus/QVTestWire.h"
+#include "tests/unit/bus/QVTestMessage.h"
 
 #include <string>
 

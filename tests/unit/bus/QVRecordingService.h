@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <functional>
 #include <map>
+#include <optional>
 #include <string>
 #include <utility>
 #include <vector>
@@ -31,7 +32,6 @@ class QVRecordingService final : public QVReportingServiceProtocol {
   std::vector<Message> messages;
   std::map<int64_t, Session> sessions;
   bool enabled = true;
-  bool keepsMessages = true;
   std::vector<Reply<bool>> keptReplies;  // of killService
   std::function<void(const std::string& call)> onCall = [](const std::string&) {};
 
@@ -63,14 +63,10 @@ class QVRecordingService final : public QVReportingServiceProtocol {
   void sendMessage(QVDictionary message, uint32_t withCategory, uint16_t andType,
                    ReporterIDs forReportingIDs, Reply<std::optional<QVError>> reply) override {
     note("send", withCategory);
-    if (keepsMessages) {
-      messages.push_back({std::move(message), withCategory, andType, std::move(forReportingIDs)});
-    }
-    if (enabled) {
-      reply(std::nullopt);
-    } else {
-      reply(QVError{"net.quillon.audio.reporting", 1, {}});
-    }
+    messages.push_back({std::move(message), withCategory, andType, std::move(forReportingIDs)});
+    std::optional<QVError> error;
+    if (!enabled) error = QVError{"net.quillon.audio.reporting", 1, {}};
+    reply(std::move(error));
   }
   void stopReportingSessionForID(int64_t reporterID, Reply<bool> reply) override {
     note("stop", reporterID);
