@@ -4,7 +4,6 @@
 #include <fstream>
 #include <iterator>
 #include <stdexcept>
-#include <string_view>
 
 #include <poll.h>
 #include <sys/socket.h>
@@ -19,8 +18,17 @@ constexpr std::chrono::seconds kReadinessLimit{60};
 std::filesystem::path readinessPath(const QVTemporaryRoot& root) {
   return root.path() / "ready";
 }
-std::filesystem::path logPath(const QVTemporaryRoot& root) {
-  return root.path() / "log";
+
+QVSubprocess::Options processOptions(const QVTemporaryRoot& root,
+                                     const QVDaemonProcess::Options& options) {
+  QVSubprocess::Options process{.arguments = options.wrapper,
+                                .environment = options.environment,
+                                .standardOutputFile = root.log(),
+                                .standardErrorFile = root.log(),
+                                .inheritedDescriptor = options.inheritedSocket};
+  process.arguments.push_back(QVDaemonProcess::program().string());
+  process.environment.merge(QVDaemonProcess::environment(root));
+  return process;
 }
 
 std::string contents(const std::filesystem::path& file) {
@@ -58,21 +66,13 @@ int QVDaemonProcess::makeReadinessSocket(const QVTemporaryRoot& root) {
   return socket;
 }
 
-QVDaemonProcess::QVDaemonProcess(const QVTemporaryRoot& root, int inheritedSocket)
-    : root_(root),
-      readiness_(makeReadinessSocket(root)),
-      process_({.arguments = {program().string()},
-                .environment = environment(root),
-                .standardOutputFile = logPath(root),
-                .standardErrorFile = logPath(root),
-                .inheritedDescriptor = inheritedSocket}) {
+QVDaemonProcess::QVDaemonProcess(const QVTemporaryRoot& root, const Options& options)
+    : root_(root), readiness_(makeReadinessSocket(root)), process_(processOptions(root, options)) {
   pollfd events[] = {{readiness_, POLLIN, 0}, {process_.endDescriptor(), POLLIN, 0}};
   const auto limit = std::chrono::milliseconds(kReadinessLimit);
-  char text[256];
-  if (::poll(events, 2, static_cast<int>(limit.count())) > 0 && events[0].revents != 0) {
-    const ssize_t length = ::recv(readiness_, text, sizeof text, 0);
-    const std::string_view message(text, length > 0 ? static_cast<std::size_t>(length) : 0);
-    if (message.find("READY=1") != std::string_view::npos) return;
+  if (::poll(events, 2, static_cast<int>(limit.count())) > 0 && events[0].revents != 0 &&
+      nextNotification().find("READY=1") != std::string::npos) {
+    return;
   }
   throw std::runtime_error("the service did not become ready:\n" + log());
 }
@@ -81,8 +81,17 @@ QVDaemonProcess::~QVDaemonProcess() {
   ::close(readiness_);
 }
 
+std::string QVDaemonProcess::nextNotification() const {
+  pollfd event{readiness_, POLLIN, 0};
+  const auto limit = std::chrono::milliseconds(kReadinessLimit);
+  if (::poll(&event, 1, static_cast<int>(limit.count())) != 1) return {};
+  char text[256];
+  const ssize_t length = ::recv(readiness_, text, sizeof text, 0);
+  return {text, length > 0 ? static_cast<std::size_t>(length) : 0};
+}
+
 std::string QVDaemonProcess::log() const {
-  return contents(logPath(root_));
+  return contents(root_.log());
 }
 
 std::optional<QVSubprocess::Status> QVDaemonProcess::terminate() {
@@ -104,4 +113,9 @@ long QVDaemonProcess::statusNumber(const std::string& file, const std::string& k
   const auto line = text.find(key + ":");
   if (line == std::string::npos) throw std::runtime_error("no " + key + " in " + file);
   return std::stol(text.substr(line + key.size() + 1));
+}
+
+std::size_t QVDaemonProcess::openDescriptors() const {
+  const std::filesystem::directory_iterator listed("/proc/" + std::to_string(pid()) + "/fd");
+  return static_cast<std::size_t>(std::distance(begin(listed), end(listed)));
 }

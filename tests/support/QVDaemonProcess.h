@@ -4,19 +4,28 @@
 #include "tests/support/QVTemporaryRoot.h"
 
 #include <chrono>
+#include <cstddef>
 #include <filesystem>
 #include <map>
 #include <optional>
 #include <string>
+#include <vector>
 
 // The real service, running in a temporary root, its log in a file there.
 //
 // Threads: one at a time.
 class QVDaemonProcess {
  public:
+  struct Options {
+    int inheritedSocket = -1;  // listening; handed over as a service manager does
+    std::map<std::string, std::string> environment = {};  // over what a service manager gives
+    std::vector<std::string> wrapper = {};  // a program that turns itself into the service
+  };
+
   // Starts the service and waits until it says that it is ready. Throws where it does not.
-  // `inheritedSocket` (a listening socket, or -1) is handed over as a service manager does.
-  explicit QVDaemonProcess(const QVTemporaryRoot& root, int inheritedSocket = -1);
+  QVDaemonProcess(const QVTemporaryRoot& root, const Options& options);
+  explicit QVDaemonProcess(const QVTemporaryRoot& root, int inheritedSocket = -1)
+      : QVDaemonProcess(root, Options{.inheritedSocket = inheritedSocket}) {}
   ~QVDaemonProcess();
   QVDaemonProcess(const QVDaemonProcess&) = delete;
   QVDaemonProcess& operator=(const QVDaemonProcess&) = delete;
@@ -29,6 +38,9 @@ class QVDaemonProcess {
   static std::filesystem::path program(const std::string& name);
 
   pid_t pid() const { return process_.pid(); }
+  // What the service told its manager next, in lines such as "STOPPING=1"; empty where nothing
+  // comes within a minute.
+  std::string nextNotification() const;
   std::string log() const;
 
   // Asks for an orderly end and waits for it; the exit status.
@@ -44,6 +56,7 @@ class QVDaemonProcess {
   // A number of a line such as "VmRSS:   1234 kB" of /proc/PID/status or "write_bytes: 5" of
   // /proc/PID/io.
   long statusNumber(const std::string& file, const std::string& key) const;
+  std::size_t openDescriptors() const;
 
  private:
   static int makeReadinessSocket(const QVTemporaryRoot& root);

@@ -19,6 +19,8 @@ class QVTemporaryRoot {
   std::filesystem::path configuration() const { return path_ / "etc"; }
   std::filesystem::path socket() const { return runtime() / "reporting.socket"; }
   std::filesystem::path store() const { return state() / "reporting.db"; }
+  // What a service that a test runs here writes to its standard error.
+  std::filesystem::path log() const { return path_ / "log"; }
 
   // Writes a file below the configuration directory, making folders as needed.
   void configure(const std::filesystem::path& file, const std::string& text) const;

@@ -1,0 +1,138 @@
+// Many clients at once that do whatever they may, and what they may not.
+
+#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/e2e/QVFrameBuilder.h"
+
+#include <atomic>
+#include <exception>
+#include <random>
+#include <thread>
+
+#include <gmock/gmock.h>
+
+namespace {
+
+using ::testing::ElementsAre;
+using ::testing::IsEmpty;
+
+constexpr int kClients = 20;
+constexpr int kLives = 15;         // connections of each client, one after the other
+constexpr int kOperations = 40;    // of each connection
+constexpr int64_t kReporters = 8;  // shared by all, so that they meet
+
+// One client's doings, the same at every run for the same seed.
+class SoakingClient {
+ public:
+  SoakingClient(std::filesystem::path socket, unsigned seed)
+      : socket_(std::move(socket)), random_(seed) {}
+
+  void run() {
+    for (int life = 0; life < kLives; ++life) live();
+  }
+
+ private:
+  int64_t below(int64_t bound) {
+    return static_cast<int64_t>(random_() % static_cast<uint64_t>(bound));
+  }
+
+  void live() {
+    QVRawPeer peer(socket_);
+    // Registered now, so its end will be told.
+    peer.call(listCall());
+    bool ended = false;
+    for (int i = 0; i < kOperations && !ended; ++i) ended = !act(peer);
+    if (ended) {
+      peer.awaitClose();
+    } else if (below(2) == 0) {
+      // In good order; otherwise with all replies unread.
+      peer.call(listCall());
+    }
+  }
+
+  // False where the connection is over.
+  bool act(QVRawPeer& peer) {
+    const int64_t reporter = 1 + below(kReporters);
+    switch (below(16)) {
+      case 0:
+      case 1:
+        peer.post(createCall(reporter));
+        break;
+      case 2:
+        // Any type but alarms, whose single messages wait for up to a minute.
+        peer.post(setServiceTypeCall(static_cast<uint16_t>(5 + below(8)), reporter));
+        break;
+      case 3:
+        peer.post(configureCall({{"HostApplicationDisplayID", "soak"}, {"n", below(9)}}, reporter));
+        break;
+      case 4:
+      case 5:
+        peer.post(startCall(reporter));
+        break;
+      case 6:
+      case 7:
+        peer.post(stopCall(reporter));
+        break;
+      case 8:
+        peer.post(destroyCall(reporter));
+        break;
+      case 9:
+        EXPECT_TRUE(peer.call(validateCall(reporter)).isReturn());
+        break;
+      case 10:
+        peer.call(getServiceTypeCall(reporter));
+        break;
+      case 11:
+        peer.post(sendToAllCall({{"to", "all"}}, kSessionPlayback, kStart));
+        break;
+      case 12:
+        if (below(20) == 0) {
+          peer.send(QVFrame{.version = 9}.bytes());
+          return false;
+        }
+        break;
+      default:
+        peer.post(sendCall({{"EngineOnTime", 0.5}, {"some key", below(1000)}},
+                           {reporter, 1 + below(kReporters)}, kSessionPlayback, kStart));
+        break;
+    }
+    return true;
+  }
+
+  const std::filesystem::path socket_;
+  std::mt19937_64 random_;
+};
+
+class QVSoakTest : public QVEndToEndTest {};
+
+TEST_F(QVSoakTest, ManyClientsLeaveTheServiceInGoodOrder) {
+  auto witness = connectClient();
+  std::vector<std::thread> threads;
+  std::atomic<int> failures{0};
+  for (int i = 0; i < kClients; ++i) {
+    threads.emplace_back([this, i, &failures] {
+      try {
+        SoakingClient(root_.socket(), 4711U + static_cast<unsigned>(i)).run();
+      } catch (const std::exception& failure) {
+        ++failures;
+        ADD_FAILURE() << failure.what();
+      }
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+  EXPECT_EQ(failures, 0);
+
+  // Removals run on the server's queue behind everything else that was asked for.
+  expectServes(witness);
+  expectStored("SELECT * FROM countwise_event WHERE name LIKE '%uptime'",
+               static_cast<std::size_t>(kClients * kLives));
+  EXPECT_THAT(witness.reporters(), IsEmpty());
+  endService();
+  EXPECT_THAT(store().rows("PRAGMA integrity_check"), ElementsAre("ok"));
+  EXPECT_GT(store().count("beacon_message"), 0);
+  EXPECT_GT(store().count("joulewell_event"), 0);
+  EXPECT_EQ(store().count("loss"), 0);
+  EXPECT_EQ(store().number("SELECT count(*) FROM beacon_message WHERE NOT json_valid(payload)"), 0);
+  EXPECT_EQ(log().count("an exception"), 0U);
+}
+
+}  // namespace
