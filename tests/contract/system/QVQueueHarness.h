@@ -36,8 +36,8 @@ class QVCountdown {
   int count_;
 };
 
-// Queues and conditions that belong together, and how a test lets them work until an event: the
-// fakes by running them, the adapters by waiting. The limit only ends a test that has failed.
+// Fake queues and conditions in one virtual time, and how a test lets them work until an event: by
+// running them on its thread. The limit only ends a test that has failed.
 class QVFakeQueueHarness {
  public:
   QVWorkQueues& queues() { return queues_; }
@@ -56,6 +56,7 @@ class QVFakeQueueHarness {
   QVFakeConditions conditions_{queues_, clock_};
 };
 
+// The adapters in the same shape: their threads work by themselves and the test waits.
 class QVRealQueueHarness {
  public:
   QVWorkQueues& queues() { return queues_; }
