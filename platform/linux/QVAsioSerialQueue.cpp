@@ -41,8 +41,11 @@ void QVAsioSerialQueue::runBatch() {
     const QVMutexLock lock(mutex_);
     batch_.swap(enqueued_);
   }
-  for (QVWorkItem& item : batch_) QVRunWorkItem(item, label_, log_);
-  batch_.clear();
+  {
+    const QVWakeUpBatch wakeUps;
+    for (QVWorkItem& item : batch_) QVRunWorkItem(item, label_, log_);
+    batch_.clear();
+  }
   {
     const QVMutexLock lock(mutex_);
     if (enqueued_.empty()) {

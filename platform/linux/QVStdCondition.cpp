@@ -1,6 +1,7 @@
 #include "platform/linux/QVStdCondition.h"
 
 #include "platform/linux/QVStdConditions.h"
+#include "platform/linux/QVWakeUpBatch.h"
 #include "platform/linux/QVWorkerBlocking.h"
 
 #include <algorithm>
@@ -9,6 +10,7 @@
 bool QVStdCondition::waitForTimeout(QVDuration timeout) {
   const auto deadline = std::chrono::steady_clock::now() + timeout;
   const auto self = shared_from_this();
+  QVWakeUpBatch::wakeNow();
   Waiter waiter;
   waiters_.push_back(&waiter);
   {

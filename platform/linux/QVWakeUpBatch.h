@@ -2,11 +2,13 @@
 
 #include "platform/QVFunction.h"
 
+#include <utility>
 #include <vector>
 
-// For its life, queues that get work from the calling thread are woken only at the end, once each:
-// the IPC thread handles all calls of one read within a batch and so pays one wake-up for them, not
-// one for each. What is enqueued within must not be waited for within.
+// For its life, whoever gets work from the calling thread is woken only at the end, once: the IPC
+// thread handles all calls of one read within a batch, a serial queue all items that it found
+// waiting, and so they pay one wake-up for them, not one for each. Whoever waits within for what
+// others do calls wakeNow() first.
 //
 // Threads: made, used and destroyed on one thread; they nest, the outermost one counts.
 class QVWakeUpBatch {
@@ -27,6 +29,12 @@ class QVWakeUpBatch {
 
   // The calling thread's; null where there is none.
   static QVWakeUpBatch* current() noexcept { return current_; }
+
+  // Wakes at once whoever the calling thread's batch, if there is one, would wake at its end.
+  static void wakeNow() {
+    if (current_ == nullptr) return;
+    for (WakeUp& wakeUp : std::exchange(current_->wakeUps_, {})) wakeUp();
+  }
 
   void add(WakeUp wakeUp) { wakeUps_.push_back(std::move(wakeUp)); }
 
