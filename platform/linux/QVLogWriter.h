@@ -24,7 +24,8 @@ class QVLogWriter : public std::enable_shared_from_this<QVLogWriter> {
   // A debug session of a busy second. Beyond, a log that nobody takes would eat the memory that
   // the service needs.
   static constexpr std::size_t kMaximumLines = 8'192;
-  static constexpr std::size_t kMaximumBytes = 4 * 1024 * 1024;  // of text, in those lines
+  static constexpr std::size_t kMaximumBytes =
+      std::size_t{4} * 1024 * 1024;  // of text, in those lines
 
   // `scopes` is kept as long as lines that may name one. `patience` is how long flush() and stop()
   // wait for a destination that does not take lines.

@@ -15,7 +15,7 @@
 namespace {
 
 // Text that is collected for one write; more would only cost memory.
-constexpr std::size_t kBatchBytes = 64 * 1024;
+constexpr std::size_t kBatchBytes = std::size_t{64} * 1024;
 
 // What a pipe that polls as writable takes without blocking, and a pipe's unit of atomicity.
 constexpr std::size_t kPieceBytes = PIPE_BUF;

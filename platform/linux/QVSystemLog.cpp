@@ -13,7 +13,7 @@
 namespace {
 
 // Longer texts are a client's doing; the journal itself would take no more than three times this.
-constexpr std::size_t kMaximumTextBytes = 16 * 1024;
+constexpr std::size_t kMaximumTextBytes = std::size_t{16} * 1024;
 
 const char* withoutDirectories(const char* path) {
   const char* const slash = std::strrchr(path, '/');
