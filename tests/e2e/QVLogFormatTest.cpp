@@ -4,8 +4,11 @@
 
 #include <regex>
 
+#include <fcntl.h>
 #include <gmock/gmock.h>
+#include <poll.h>
 #include <sys/prctl.h>
+#include <sys/stat.h>
 
 namespace {
 
@@ -153,6 +156,72 @@ TEST_F(QVLogFormatTest, KeepsAProcessNameOnOneLine) {
   entries();
   EXPECT_EQ(store().rows("SELECT json_extract(payload, '$.processName') FROM countwise_event"),
             std::vector<std::string>{"e\n<3>[qvrs] \x1b"});
+}
+
+// ---- A log that nobody reads
+
+class QVUnreadLogTest : public QVEndToEndTest {
+ protected:
+  // The service's standard error is a pipe; this end of it.
+  void SetUp() override {
+    const std::string pipe = root_.path() / "pipe";
+    ASSERT_EQ(::mkfifo(pipe.c_str(), 0600), 0);
+    // For writing, too: so it opens at once and has no end.
+    reader_ = ::open(pipe.c_str(), O_RDWR | O_CLOEXEC);
+    ASSERT_GE(reader_, 0);
+    startService({.wrapper = {"/bin/sh", "-c", "exec \"$0\" 2>" + pipe}});
+  }
+  void TearDown() override { ::close(reader_); }
+
+  // More lines than pipe and queue have room for.
+  static void makeLines(QVPeerClient& client) {
+    constexpr uint32_t kCalls = 10'000;
+    std::string batch;
+    for (uint32_t serial = 1; serial <= kCalls; ++serial) batch += createCall(7).bytes(serial);
+    ASSERT_TRUE(client.send(batch));
+    for (uint32_t serial = 1; serial <= kCalls; ++serial) {
+      ASSERT_TRUE(client.awaitReply(serial).boolean());
+    }
+  }
+  // Reads the pipe until `text` has come.
+  void expectRead(const std::string& text) const {
+    std::string seen;
+    while (seen.find(text) == std::string::npos) {
+      pollfd event{reader_, POLLIN, 0};
+      ASSERT_EQ(::poll(&event, 1, 60'000), 1) << "not written: " << text;
+      char buffer[65536];
+      const ssize_t length = ::read(reader_, buffer, sizeof buffer);
+      ASSERT_GT(length, 0);
+      // The text may lie across two pieces.
+      seen.erase(0, seen.size() < text.size() ? 0 : seen.size() - text.size());
+      seen.append(buffer, static_cast<std::size_t>(length));
+    }
+  }
+
+  int reader_ = -1;
+};
+
+TEST_F(QVUnreadLogTest, HoldsNobodyUpAndSaysWhatItLost) {
+  auto client = connectClient();
+  makeLines(client);
+  expectServes(client);
+  expectRead(" log lines were lost");
+  // What comes from now on is written again.
+  client.create(4711);
+  expectRead("created reporting session for ID: 4711");
+}
+
+TEST_F(QVUnreadLogTest, DoesNotKeepTheServiceFromEnding) {
+  auto client = connectClient();
+  makeLines(client);
+  endService();
+}
+
+TEST_F(QVUnreadLogTest, DoesNotKeepTheServiceFromBeingKilled) {
+  auto client = connectClient();
+  makeLines(client);
+  client.post(killCall());
+  EXPECT_EQ(service().wait(), 2);
 }
 
 }  // namespace

@@ -33,11 +33,13 @@ int listenAt(const std::filesystem::path& path) {
 class QVOnDemandStartTest : public QVEndToEndTest {
  protected:
   // Runs a service that must not come up, and answers what it wrote.
-  QVSubprocess::Output runInVain(std::map<std::string, std::string> environment = {}) {
+  QVSubprocess::Output runInVain(std::map<std::string, std::string> environment = {},
+                                 std::vector<std::string> wrapper = {}) {
     const auto file = root_.path() / "vain";
+    wrapper.push_back(QVDaemonProcess::program());
     environment.merge(QVDaemonProcess::environment(root_));
     environment.erase("NOTIFY_SOCKET");
-    QVSubprocess process({.arguments = {QVDaemonProcess::program().string()},
+    QVSubprocess process({.arguments = wrapper,
                           .environment = environment,
                           .standardOutputFile = file,
                           .standardErrorFile = file});
@@ -146,6 +148,18 @@ TEST_P(QVOnDemandStartDirectoryTest, EndsWhereItsDirectoryIsAFile) {
   const auto output = runInVain({{GetParam(), file}});
   EXPECT_GT(output.status, 0) << output.text;
   EXPECT_THAT(output.text, AllOf(HasSubstr("<3>"), HasSubstr(file)));
+}
+
+TEST_P(QVOnDemandStartDirectoryTest, EndsWhereItsDirectoryIsNotToBeWritten) {
+  const std::string directory = root_.path() / "read-only";
+  std::filesystem::create_directory(directory);
+  std::filesystem::permissions(directory, std::filesystem::perms(0500));
+  // Root may write everywhere, but for this privilege.
+  std::vector<std::string> wrapper;
+  if (::getuid() == 0) wrapper = {"setpriv", "--bounding-set=-dac_override,-dac_read_search"};
+  const auto output = runInVain({{GetParam(), directory}}, wrapper);
+  EXPECT_GT(output.status, 0) << output.text;
+  EXPECT_THAT(output.text, AllOf(HasSubstr("<3>"), HasSubstr(directory)));
 }
 
 INSTANTIATE_TEST_SUITE_P(Directories, QVOnDemandStartDirectoryTest,

@@ -7,6 +7,7 @@
 #include <cerrno>
 #include <cstring>
 #include <stdexcept>
+#include <system_error>
 #include <utility>
 
 #include <poll.h>
@@ -26,7 +27,8 @@ int connectTo(const std::filesystem::path& path) {
   if (::connect(descriptor, reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) {
     const int error = errno;
     ::close(descriptor);
-    throw std::runtime_error(QVText("cannot connect to ", path.string(), ": ", strerror(error)));
+    throw std::runtime_error(
+        QVText("cannot connect to ", path.string(), ": ", std::generic_category().message(error)));
   }
   return descriptor;
 }

@@ -76,6 +76,24 @@ TEST_F(QVServiceEndTest, ASecondSignalChangesNothing) {
   EXPECT_EQ(store().count("beacon_message"), 2);
 }
 
+TEST_F(QVServiceEndTest, APeerThatSendsWithoutEndDoesNotKeepItAlive) {
+  auto client = connectClient();
+  client.create(1, kTelephony);
+  client.start(1);
+  // The replies stay unread, so at last the service reads no more and the socket is full.
+  auto call = sendCall({{"text", std::string(1000, 'x')}}, {1}, kSessionPlayback, kStart);
+  const std::string bytes = call.bytes(1000);
+  std::size_t sent = bytes.size();
+  for (int i = 0; i < 100'000 && sent == bytes.size(); ++i) {
+    sent = client.sendWithoutWaiting(bytes);
+  }
+  service().signal(SIGTERM);
+  EXPECT_EQ(service().wait(), 0);
+  EXPECT_EQ(store().number("SELECT count(*) FROM beacon_session WHERE flushed_at IS NOT NULL"), 1);
+  EXPECT_EQ(store().number("SELECT count(*) FROM beacon_message WHERE category = 65535"), 1);
+  EXPECT_EQ(store().count("loss"), 0);
+}
+
 TEST_F(QVServiceEndTest, KillServiceEndsAtOnceWithoutAReply) {
   auto client = connectClient();
   auto other = connectClient();
