@@ -69,13 +69,14 @@ class Layer:
 
 _PLATFORM = r"platform/\w+\.h"
 _ANY = r".*"
+# Of the other adapters the wire code, and with it the client, uses these headers, which need no
+# source: it is linked without the rest.
+_SHARED_WITH_BUS = r"platform/linux/(QVThreadAnnotations|QVWakeUpBatch)\.h"
 
 # The first folder that a file lies in decides.
 LAYERS = [
     Layer("platform/fake", [_PLATFORM, r"platform/fake/\w+\.h"]),
-    # The client links the wire code without the other adapters.
-    Layer("platform/linux/bus",
-          [_PLATFORM, r"platform/linux/bus/\w+\.h", r"platform/linux/QVThreadAnnotations\.h"],
+    Layer("platform/linux/bus", [_PLATFORM, r"platform/linux/bus/\w+\.h", _SHARED_WITH_BUS],
           system=True, libraries=LIBRARIES),
     Layer("platform/linux", [_PLATFORM, r"platform/linux/(\w+/)*\w+\.h"],
           system=True, libraries=LIBRARIES),
@@ -84,8 +85,7 @@ LAYERS = [
           machine=False),
     Layer("QVServices", [_PLATFORM, r"QVServices/Statistics/\w+\.h"], machine=False),
     Layer("client",
-          [_PLATFORM, r"client/.*\.h", r"platform/linux/bus/\w+\.h",
-           r"platform/linux/QVThreadAnnotations\.h"],
+          [_PLATFORM, r"client/.*\.h", r"platform/linux/bus/\w+\.h", _SHARED_WITH_BUS],
           system=True),
     Layer("daemon", [_PLATFORM, r"platform/linux/(\w+/)*\w+\.h", r"QVServices/.*\.h", r"daemon/.*\.h"],
           system=True),
