@@ -10,7 +10,7 @@
 #include <cerrno>
 #include <chrono>
 #include <csignal>
-#include <cstring>
+#include <system_error>
 #include <utility>
 
 #include <asio/io_context.hpp>
@@ -127,9 +127,10 @@ void QVBusListener::acceptAll() {
 // connection closes, or some time has passed.
 void QVBusListener::acceptLater(int error) {
   if (!std::exchange(inside_->outOfDescriptors, true)) {
-    QVPlatform::shared().log->error(nullptr, "-[QVBusListener acceptLater:]",
-                                    "cannot accept a connection: ", std::strerror(error),
-                                    "; clients wait until one closes");
+    QVPlatform::shared().log->error(
+        nullptr, "-[QVBusListener acceptLater:]",
+        "cannot accept a connection: ", std::generic_category().message(error),
+        "; clients wait until one closes");
   }
   inside_->acceptAgain.expires_after(kAcceptAgainAfter);
   inside_->acceptAgain.async_wait([this](const asio::error_code& cancelled) {

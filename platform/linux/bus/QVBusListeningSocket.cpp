@@ -2,6 +2,7 @@
 
 #include <cerrno>
 #include <cstring>
+#include <system_error>
 #include <utility>
 
 #include <fcntl.h>
@@ -19,8 +20,8 @@ constexpr mode_t kSocketMode = 0660;
 // Connections that may wait to be accepted; the kernel caps it at its own limit.
 constexpr int kBacklog = 512;
 
-std::string withReason(std::string text) {
-  return std::move(text) + ": " + std::strerror(errno);
+std::string withReason(const std::string& text, int number = errno) {
+  return text + ": " + std::generic_category().message(number);
 }
 
 // A descriptor for the length of a scope.
@@ -90,7 +91,7 @@ std::unique_ptr<QVBusListeningSocket> QVBusListeningSocket::open(const std::stri
 
 std::unique_ptr<QVBusListeningSocket> QVBusListeningSocket::inherit(int count, std::string& error) {
   if (count < 0) {
-    error = std::string("cannot take over the service manager's socket: ") + std::strerror(-count);
+    error = withReason("cannot take over the service manager's socket", -count);
     return nullptr;
   }
   if (count > 1) {

@@ -68,6 +68,8 @@ class QVIntakeBudget::Account final : public QVMemoryCharge {
  private:
   friend class QVIntakeBudget;
   friend struct AccountCloser;
+  // Only by itself and its handle.
+  ~Account() = default;
 
   // `state_` holds twice the bytes charged, two more while the connection is open, and the lowest
   // bit while the connection waits: so one operation removes bytes and tells whether to wake.
