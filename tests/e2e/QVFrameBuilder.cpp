@@ -7,12 +7,12 @@ QVFrameBuilder& QVFrameBuilder::align(std::size_t alignment, char padding) {
 
 QVFrameBuilder& QVFrameBuilder::string(std::string_view text) {
   number(static_cast<uint32_t>(text.size()));
-  return raw(text).raw({"", 1});
+  return raw(text).number(uint8_t{0});
 }
 
 QVFrameBuilder& QVFrameBuilder::signature(std::string_view text) {
   number(static_cast<uint8_t>(text.size()));
-  return raw(text).raw({"", 1});
+  return raw(text).number(uint8_t{0});
 }
 
 QVFrameBuilder& QVFrameBuilder::raw(std::string_view bytes) {

@@ -4,6 +4,8 @@
 #include "tests/e2e/QVEndToEndTest.h"
 #include "tests/e2e/QVFrameBuilder.h"
 
+#include <ostream>
+
 #include <gmock/gmock.h>
 
 namespace {
@@ -40,8 +42,8 @@ struct HostileFrame {
   const char* reason;
 };
 
-void PrintTo(const HostileFrame& frame, std::ostream* out) {
-  *out << frame.name;
+std::ostream& operator<<(std::ostream& out, const HostileFrame& frame) {
+  return out << frame.name;
 }
 
 std::vector<HostileFrame> hostileFrames() {
