@@ -18,7 +18,7 @@ class QVClientInbox {
  public:
   enum class Reading {
     full,     // there may be more to be had at once
-    drained,  // that was all for now
+    drained,  // that was all there was
     ended     // nothing more will come
   };
 
