@@ -22,7 +22,7 @@
 // the budget alive.
 class QVIntakeBudget : public std::enable_shared_from_this<QVIntakeBudget> {
  public:
-  class Account;
+  class Account;  // NOLINT(cppcoreguidelines-virtual-class-destructor): frees itself, see below
   struct AccountCloser {
     void operator()(Account* account) const noexcept;
   };
@@ -58,6 +58,7 @@ class QVIntakeBudget : public std::enable_shared_from_this<QVIntakeBudget> {
 
 // What one connection is charged. Frees itself when the connection has closed and the last byte has
 // been removed.
+// NOLINTNEXTLINE(cppcoreguidelines-virtual-class-destructor): nobody deletes it through its base
 class QVIntakeBudget::Account final : public QVMemoryCharge {
  public:
   explicit Account(std::shared_ptr<QVIntakeBudget> budget) : budget_(std::move(budget)) {}
