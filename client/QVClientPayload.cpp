@@ -134,7 +134,7 @@ char* QVClientPayload::beginValue(Key key, std::string_view signature, std::size
 }
 
 QVClientPayload& QVClientPayload::putBoolean(Key key, bool value) {
-  if (char* at = beginValue(key, "b", 4, 4)) storeNumber(at, uint32_t{value});
+  if (char* at = beginValue(key, "b", 4, 4)) storeNumber(at, value ? 1U : 0U);
   return *this;
 }
 

@@ -101,12 +101,14 @@ void appendMessageArguments(std::string& out, QVBusWriter& writer, const QVClien
 
 }  // namespace
 
+const QVClientPayload QVClientRequest::kNoPayload;
+
 std::size_t QVClientRequest::messageBytes() const noexcept {
   return headerOf(operation).size() + bodyBytes(*this);
 }
 
 QVClientError QVClientRequest::check() const {
-  if (payload != nullptr && !payload->ok()) return payload->error();
+  if (!payload->ok()) return payload->error();
   if (messageBytes() > kBusMaximumMessageBytes) {
     return {QVClientError::Code::messageTooLarge, "the call is larger than 8 MiB"};
   }

@@ -28,9 +28,11 @@ enum class QVClientOperation : uint8_t {
 //
 // Made by QVClient, turned into bytes by QVClientConnection. Threads: one at a time.
 struct QVClientRequest {
+  static const QVClientPayload kNoPayload;
+
   QVClientOperation operation;
   QVClientTargets targets = QVClientTargets(0);  // the one reporter ID of most operations
-  const QVClientPayload* payload = nullptr;
+  const QVClientPayload* payload = &kNoPayload;
   QVClientServiceType serviceType = QVClientServiceType::unknown;
   QVClientCategory category{0U};
   QVClientMessageType messageType = QVClientMessageType::generic;

@@ -99,10 +99,12 @@ std::optional<QVPlayerOptions> QVPlayerOptions::parse(int argc, char** argv, std
   QVPlayerOptions options;
   options.reporterID = getpid();
   opterr = 0;
-  // Before any other thread is there.
-  // NOLINTNEXTLINE(concurrency-mt-unsafe)
-  for (int option = 0;
-       (option = getopt_long(argc, argv, "D:s:h", kOptions.data(), nullptr)) != -1;) {
+  const auto next = [argc, argv] {
+    // Before any other thread is there.
+    // NOLINTNEXTLINE(concurrency-mt-unsafe)
+    return getopt_long(argc, argv, "D:s:h", kOptions.data(), nullptr);
+  };
+  for (int option = next(); option != -1; option = next()) {
     problem = take(options, option, optarg != nullptr ? optarg : "");
     if (!problem.empty()) return std::nullopt;
   }

@@ -8,7 +8,9 @@ namespace {
 // Microseconds of audio in the device's buffer; what a media player asks for.
 constexpr unsigned kLatency = 200'000;
 
-// The library would print its troubles itself; they are in the error numbers as well.
+// The library would print its troubles itself; they are in the error numbers as well. Variadic,
+// because the library calls it so.
+// NOLINTNEXTLINE(cert-dcl50-cpp)
 void ignoreLine(const char* /*file*/, int /*line*/, const char* /*function*/, int /*number*/,
                 const char* /*format*/, ...) {}
 
