@@ -25,9 +25,13 @@ function(qv_library name)
   target_link_libraries(${name} PUBLIC qv_options ${ARGN})
 endfunction()
 
-# Defines a test program of all *Test.cpp (and helper) sources directly in the calling folder.
-function(qv_test_program name)
+# Defines a test program of all *Test.cpp (and helper) sources directly in the calling folder, and
+# its tests, with that label: "unit" for tests that start no processes of the service, else "e2e".
+function(qv_test_program name label)
   file(GLOB sources CONFIGURE_DEPENDS *.cpp *.h)
   add_executable(${name} ${sources})
-  target_link_libraries(${name} PRIVATE qv_options GTest::gmock ${ARGN})
+  target_link_libraries(${name} PRIVATE qv_options GTest::gmock_main ${ARGN})
+  target_precompile_headers(${name} PRIVATE <gmock/gmock.h> <gtest/gtest.h>)
+  # Under a sanitizer, or on a busy machine, listing the tests takes its time too.
+  gtest_discover_tests(${name} PROPERTIES LABELS ${label} TIMEOUT 300 DISCOVERY_TIMEOUT 120)
 endfunction()
