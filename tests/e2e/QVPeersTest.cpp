@@ -15,7 +15,7 @@ TEST_P(QVPeersTest, LiveThroughASession) {
   service();
   // Debian's Python has Debian's packages, whichever other one comes first in PATH.
   const auto output = QVSubprocess::run(
-      {"/usr/bin/python3", std::string(QV_PEER_SCRIPTS) + "/" + GetParam(), address()});
+      {"/usr/bin/python3", QV_PEER_SCRIPTS "/" + std::string(GetParam()), address()});
   EXPECT_EQ(output.status, 0) << output.text;
   EXPECT_EQ(output.text,
             "create True\n"

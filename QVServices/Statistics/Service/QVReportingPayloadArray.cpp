@@ -2,30 +2,34 @@
 
 #include "platform/QVText.h"
 
+std::deque<QVReportingPayloadArray::Entry>& QVReportingPayloadArray::entries() {
+  return entries_ ? *entries_ : entries_.emplace();
+}
+
 QVReportingPayloadArray::Position QVReportingPayloadArray::append(const QVDictionary& payload) {
   const std::lock_guard lock(mutex_);
   const Position position = store_->append(payload);
-  entries_.push_back({position, 0, 0});
+  entries().push_back({position, 0, 0});
   return position;
 }
 
 void QVReportingPayloadArray::append(std::string_view identifierBase, uint32_t count,
                                      Position position) {
   const std::lock_guard lock(mutex_);
-  entries_.push_back({position, store_->intern(identifierBase), count});
+  entries().push_back({position, store_->intern(identifierBase), count});
 }
 
 std::size_t QVReportingPayloadArray::size() const {
   const std::lock_guard lock(mutex_);
-  return entries_.size();
+  return entries_ ? entries_->size() : 0;
 }
 
 void QVReportingPayloadArray::forEach(Visitor visitor) const {
   const std::lock_guard lock(mutex_);
   // By index, and up to what is there now: a visitor holds the lock too and may append.
-  const std::size_t count = entries_.size();
+  const std::size_t count = size();
   for (std::size_t i = 0; i < count; ++i) {
-    const Entry entry = entries_[i];
+    const Entry entry = (*entries_)[i];
     visitor(entry.count == 0 ? std::string()
                              : QVText(store_->interned(entry.identifierBase), '_', entry.count),
             store_->payload(entry.position));

@@ -8,6 +8,7 @@
 #include <deque>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <string>
 #include <string_view>
 
@@ -47,7 +48,11 @@ class QVReportingPayloadArray {
     uint32_t count;  // from 1; 0: no identifier
   };
 
+  std::deque<Entry>& entries();
+
   mutable std::recursive_mutex mutex_;
   const std::shared_ptr<QVReportingPayloadStore> store_;
-  std::deque<Entry> entries_;  // guarded by mutex_
+  // Guarded by mutex_. Made with the first entry: an empty deque takes half a KiB, and there may be
+  // many sessions that never record anything.
+  std::optional<std::deque<Entry>> entries_;
 };

@@ -39,7 +39,10 @@ uint64_t QVReportingPayloadStore::keySetOf(const QVDictionary& payload) {
     latestKeySet_ = known->second;
     return latestKeySet_ + 1;
   }
-  if (keySets_.size() == kMaximumKeySets) return 0;
+  std::size_t bytes = payload.size() * sizeof(std::string);
+  for (const auto& entry : payload) bytes += entry.key.size();
+  if (keySets_.size() == kMaximumKeySets || keySetBytes_ + bytes > kMaximumKeySetBytes) return 0;
+  keySetBytes_ += bytes;
   Keys keys;
   keys.reserve(payload.size());
   for (const auto& entry : payload) keys.emplace_back(entry.key);

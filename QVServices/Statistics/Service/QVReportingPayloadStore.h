@@ -37,6 +37,8 @@ class QVReportingPayloadStore {
   // Sets of keys beyond these are written out with each payload: a client that never sends the
   // same keys twice must not make the table larger than what it describes.
   static constexpr std::size_t kMaximumKeySets = 4096;
+  // Bytes of all sets' keys, for clients whose sets are wide.
+  static constexpr std::size_t kMaximumKeySetBytes = std::size_t{1} << 20;
   // Chunks grow from the first size to the last, so that a session with one message stays small.
   static constexpr std::size_t kFirstChunkBytes = 512;
   static constexpr std::size_t kLargestChunkBytes = 65536;
@@ -55,6 +57,7 @@ class QVReportingPayloadStore {
   mutable std::mutex mutex_;
   // All guarded by mutex_.
   std::vector<Keys> keySets_;
+  std::size_t keySetBytes_ = 0;
   std::multimap<std::size_t, std::size_t> keySetsByHash_;
   std::size_t latestKeySet_ = 0;  // index into keySets_; messages come in runs of one kind
   std::vector<Chunk> chunks_;

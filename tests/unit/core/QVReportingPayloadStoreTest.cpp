@@ -164,7 +164,7 @@ TEST(QVReportingPayloadStore, GivesManyPayloadsOfManyKindsBack) {
 TEST(QVReportingPayloadStore, WritesKeysOutBeyondTheSetsThatItRemembers) {
   constexpr int kRememberedSets = 4096;
   constexpr int kSets = kRememberedSets + 500;
-  constexpr std::size_t kKeyBytes = 1000;
+  constexpr std::size_t kKeyBytes = 100;
   QVReportingPayloadStore store;
   std::vector<QVReportingPayloadStore::Position> positions;
   const auto message = [](int number) {
@@ -177,6 +177,21 @@ TEST(QVReportingPayloadStore, WritesKeysOutBeyondTheSetsThatItRemembers) {
     positions.push_back(store.append(message(number)));
   }
   EXPECT_GT(store.footprint(), (kSets - kRememberedSets) * kKeyBytes) << "keys lie here";
+  for (int number = 0; number < kSets; ++number) {
+    ASSERT_EQ(store.payload(positions[static_cast<std::size_t>(number)]), message(number));
+  }
+}
+
+TEST(QVReportingPayloadStore, RemembersNoMoreThanAMebibyteOfKeys) {
+  constexpr std::size_t kKeyBytes = 100'000;
+  constexpr int kSets = 40;
+  QVReportingPayloadStore store;
+  std::vector<QVReportingPayloadStore::Position> positions;
+  const auto message = [](int number) {
+    return QVDictionary{{QVText(std::string(kKeyBytes, 'k'), number), number}};
+  };
+  for (int number = 0; number < kSets; ++number) positions.push_back(store.append(message(number)));
+  EXPECT_GT(store.footprint(), (kSets - 11) * kKeyBytes) << "ten of them are remembered";
   for (int number = 0; number < kSets; ++number) {
     ASSERT_EQ(store.payload(positions[static_cast<std::size_t>(number)]), message(number));
   }

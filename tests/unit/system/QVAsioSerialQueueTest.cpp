@@ -1,7 +1,9 @@
 #include "platform/fake/QVFakeLog.h"
 #include "platform/linux/QVAsioSerialQueue.h"
+#include "platform/linux/QVStdConditions.h"
 #include "platform/linux/QVWakeUpBatch.h"
 
+#include <chrono>
 #include <deque>
 #include <memory>
 #include <string>
@@ -117,6 +119,40 @@ TEST_F(QVAsioSerialQueueTest, DestroysItemsOfAClosedExecutor) {
   EXPECT_EQ(queue.use_count(), 1);
   queue->async([capture] {});
   EXPECT_EQ(capture.use_count(), 1);
+}
+
+TEST_F(QVAsioSerialQueueTest, WakesAnotherQueueOnceForAllItemsOfABatch) {
+  const auto first = makeQueue();
+  const auto second = makeQueue();
+  int submittedWithin = 0;
+  first->async([&] { second->async(note("a")); });
+  first->async([&] {
+    second->async(note("b"));
+    submittedWithin = executor_.submitCount();
+  });
+  executor_.runOne();
+  EXPECT_EQ(submittedWithin, 1) << "the first queue's own";
+  EXPECT_EQ(executor_.submitCount(), 2);
+  executor_.runOne();
+  EXPECT_THAT(ran_, ElementsAre("a", "b"));
+}
+
+TEST_F(QVAsioSerialQueueTest, WakesAnotherQueueBeforeAnItemWaits) {
+  QVStdConditions conditions;
+  conditions.cutWaitsShort();
+  const auto first = makeQueue();
+  const auto second = makeQueue();
+  int submittedAfterTheWait = 0;
+  first->async([&] {
+    second->async(note("a"));
+    const auto condition = conditions.makeCondition();
+    condition->lock();
+    EXPECT_FALSE(condition->waitForTimeout(std::chrono::seconds(9)));
+    condition->unlock();
+    submittedAfterTheWait = executor_.submitCount();
+  });
+  executor_.runOne();
+  EXPECT_EQ(submittedAfterTheWait, 2) << "what the wait may depend on is under way";
 }
 
 }  // namespace
