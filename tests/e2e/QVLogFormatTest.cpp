@@ -22,6 +22,9 @@ using ::testing::UnorderedElementsAre;
 
 constexpr uint16_t kTelephony = 2;
 
+constexpr const char* kSendingLine =
+    "sendMessage:withCategory:andType:forReportingIDs:reply:]: sending message for reporter [7]";
+
 class QVLogFormatTest : public QVEndToEndTest {
  protected:
   void runSession(QVPeerClient& client) {
@@ -117,9 +120,7 @@ TEST_F(QVLogFormatTest, SaysMoreWhereThePreferencesWantIt) {
        {"createReportingSession:reply:]: creating session for reporter 7",
         "setServiceType:reportingSession:reply:]: setting service type 2 for reporter 7",
         "setConfiguration:forReporterID:reply:]: setting configuration",
-        "startReportingSessionForID:reply:]: starting session for reporter 7",
-        "sendMessage:withCategory:andType:forReportingIDs:reply:]: "
-        "sending message for reporter [7]",
+        "startReportingSessionForID:reply:]: starting session for reporter 7", kSendingLine,
         "stopReportingSessionForID:reply:]: stopping session for reporter 7",
         "destroyReportingSession:reply:]: destroying session for reporter 7",
         "reporterID:valid:]: validating reporter 7"}) {
