@@ -87,12 +87,14 @@ class QVFakeBeacon::Session : public QVBeaconSession {
       backends = state_->backends;
       if (backends == Backends::whenTold) {
         state_->waitingSearches.push_back(std::move(answer));
-      } else if (backends == Backends::never) {
+        return;
+      }
+      if (backends == Backends::never) {
         state_->unansweredSearches.push_back(std::move(answer));
+        return;
       }
     }
-    if (backends == Backends::atOnce) answer(defaultBackends());
-    if (backends == Backends::noList) answer(std::nullopt);
+    answer(backends == Backends::atOnce ? std::optional(defaultBackends()) : std::nullopt);
   }
 
   [[nodiscard]] bool sendMessageWithCategory(uint16_t category, uint16_t type,
@@ -205,7 +207,7 @@ void QVFakeBeacon::setBackends(Backends backends) {
   state_->backends = backends;
 }
 
-void QVFakeBeacon::answerBackends(std::optional<QVArray> backends) {
+void QVFakeBeacon::answerBackends(const std::optional<QVArray>& backends) {
   std::deque<QVBeaconSession::BackendsCompletion> searches;
   {
     const std::lock_guard lock(state_->mutex);

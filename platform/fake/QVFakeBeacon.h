@@ -57,7 +57,7 @@ class QVFakeBeacon : public QVBeacon {
   // How later searches for backends end; atOnce to begin with.
   void setBackends(Backends backends);
   // Ends every open search of kind whenTold, the oldest first; by default with the usual list.
-  void answerBackends(std::optional<QVArray> backends = defaultBackends());
+  void answerBackends(const std::optional<QVArray>& backends = defaultBackends());
   static QVArray defaultBackends();
 
   // From now on messages (single ones too) are refused, with this error or without one.

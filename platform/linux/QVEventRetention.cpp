@@ -15,12 +15,12 @@ constexpr std::array<const char*, QVEventRetention::kTables> kNames{
     "beacon_message", "countwise_event", "joulewell_event"};
 
 // The least limit: some pages for each table, in bytes.
-constexpr int64_t kLeastLimit = 1024 * 1024;
+constexpr int64_t kLeastLimit = int64_t{1024} * 1024;
 // Kept free for inner pages of the trees, sessions and losses, in bytes.
 constexpr int64_t kReserveBytes = 8 * QVEventStoreSchema::kPageBytes;
 // What is removed at a time at least: enough rows for the search of their ends to cost little,
 // few enough for one transaction to fill their pages again.
-constexpr int64_t kRemovalBytes = 256 * 1024;
+constexpr int64_t kRemovalBytes = int64_t{256} * 1024;
 // Sessions looked at with each removal.
 constexpr int64_t kSessionWindow = 64;
 // A row's header, ids and times, in bytes.
@@ -158,7 +158,9 @@ int QVEventRetention::removeOldest(int64_t bytes) {
   const int64_t total = rowCount();
   const int64_t bytesPerRow = std::max<int64_t>(used_ / total, 1);
   const double share = static_cast<double>(leading.count()) / static_cast<double>(total);
-  const auto rowsToGo = static_cast<int64_t>(static_cast<double>(bytes / bytesPerRow) * share) + 1;
+  const auto rowsToGo =
+      static_cast<int64_t>(static_cast<double>(bytes) / static_cast<double>(bytesPerRow) * share) +
+      1;
   const int64_t cut = leading.first + std::min(rowsToGo, leading.count()) - 1;
   int64_t time = 0;
   int result = readTime(leading, cut, time);

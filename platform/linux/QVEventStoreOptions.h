@@ -17,7 +17,7 @@ struct QVEventStoreOptions {
   std::chrono::nanoseconds retryInterval = std::chrono::seconds(1);
   // Bytes of payload and rows held for a store that is out of order. Less than the 64 MiB that the
   // service accepts in all, so that clients go on being read while the oldest rows are given up.
-  std::size_t heldBytes = 48 * 1024 * 1024;
+  std::size_t heldBytes = std::size_t{48} * 1024 * 1024;
   // Bytes of the file where the preference "store_limit_mib" does not say otherwise.
   int64_t fileBytes = int64_t{256} * 1024 * 1024;
 };

@@ -13,7 +13,7 @@ constexpr std::size_t kSpareLaneRows = 1024;
 
 }  // namespace
 
-bool QVEventStoreQueue::search(Search&& search) {
+bool QVEventStoreQueue::search(Search& search) {
   {
     const QVMutexLock lock(mutex_);
     if (stopped_) return false;

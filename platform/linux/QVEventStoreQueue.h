@@ -42,16 +42,16 @@ class QVEventStoreQueue {
   explicit QVEventStoreQueue(std::chrono::nanoseconds commitInterval)
       : commitInterval_(commitInterval) {}
 
-  // False, with the row untouched, once the queue is stopped.
+  // Takes the row's contents; false, with the row untouched, once the queue is stopped.
   template <class Row>
-  bool add(Row&& row, bool urgent) {
+  [[nodiscard]] bool add(Row& row, bool urgent) {
     bool wake = false;
     {
       const QVMutexLock lock(mutex_);
       if (stopped_) return false;
       if (waiting_.empty() || waiting_.back().size() >= kBatchRows) beginBatch();
       if (waitingRows_ == 0) firstRowAt_ = std::chrono::steady_clock::now();
-      waiting_.back().add(std::forward<Row>(row));
+      waiting_.back().add(std::move(row));
       ++waitingRows_;
       wake = waitingRows_ == 1 || waitingRows_ == kCommitRows || (urgent && !urgent_);
       if (urgent) waiting_.back().urgent = urgent_ = true;
@@ -59,7 +59,7 @@ class QVEventStoreQueue {
     if (wake) wake_.notify_one();
     return true;
   }
-  bool search(Search&& search);
+  [[nodiscard]] bool search(Search& search);
   // Everything waiting is handed out once more; nothing is taken in any longer.
   void stop();
 

@@ -6,9 +6,9 @@
 #include <array>
 #include <cerrno>
 #include <cstdio>
-#include <cstring>
 #include <ctime>
 #include <exception>
+#include <system_error>
 #include <type_traits>
 #include <utility>
 
@@ -23,7 +23,7 @@ constexpr const char* kBeaconDomain = "net.quillon.beacon";
 constexpr const char* kLimitKey = "store_limit_mib";
 constexpr const char* kCountwiseDomain = "net.quillon.countwise";
 constexpr const char* kUnwantedKey = "unwanted";
-constexpr int64_t kLargestLimit = 1024 * 1024;
+constexpr int64_t kLargestLimit = int64_t{1024} * 1024;
 
 // A disk that damages each new file must not be filled with them.
 constexpr std::chrono::seconds kSetAsideInterval{60};
@@ -62,7 +62,7 @@ std::string directoryObstacle(const std::string& path) {
   const std::size_t slash = path.rfind('/');
   const std::string directory = slash == std::string::npos ? "." : path.substr(0, slash + 1);
   if (faccessat(AT_FDCWD, directory.c_str(), W_OK | X_OK, AT_EACCESS) == 0) return {};
-  return QVText("its directory: ", std::strerror(errno));
+  return QVText("its directory: ", std::generic_category().message(errno));
 }
 
 // Rows that are events: what is counted when they are lost.
@@ -162,7 +162,7 @@ bool QVEventStoreWriter::setAside(const std::string& reason) {
   for (int i = 2; access(target.c_str(), F_OK) == 0; ++i) target = QVText(wanted, '-', i);
   if (std::rename(options_.path.c_str(), target.c_str()) != 0) {
     log_.error(nullptr, "QVEventStoreWriter::setAside", "the damaged event store ", options_.path,
-               " cannot be set aside: ", std::strerror(errno));
+               " cannot be set aside: ", std::generic_category().message(errno));
     return false;
   }
   // The write-ahead log belongs to the damaged file; what is not there needs no moving.

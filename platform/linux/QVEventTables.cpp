@@ -161,8 +161,8 @@ int QVEventTables::insertSessionRow(const std::shared_ptr<QVEventSession>& sessi
   session_.bind(4, session->token);
   session_.bind(5, session->clientType);
   session_.bind(6, session->clientVersion);
-  session_.bind(7, int64_t{session->batchEvent});
-  session_.bind(8, int64_t{session->containsRealtimeEvents});
+  session_.bind(7, int64_t{session->batchEvent ? 1 : 0});
+  session_.bind(8, int64_t{session->containsRealtimeEvents ? 1 : 0});
   session_.bind(9, userInfo);
   result = session_.run();
   if (result == SQLITE_OK) {

@@ -5,7 +5,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstdint>
-#include <cstring>
+#include <system_error>
 #include <utility>
 #include <vector>
 
@@ -17,6 +17,9 @@
 #include <unistd.h>
 
 namespace {
+
+// Bytes read at a time.
+constexpr std::size_t kReadBytes = std::size_t{16} * 1024;
 
 // Builds values from the reader's events. Answering false ends the parse.
 class Builder {
@@ -98,7 +101,8 @@ std::optional<std::string> contents(const std::string& path, QVJSONFailure& fail
   const File file(path);
   struct stat status {};
   if (file.descriptor() < 0 || fstat(file.descriptor(), &status) != 0) {
-    failure = {.reason = std::strerror(errno), .missing = errno == ENOENT || errno == ENOTDIR};
+    failure = {.reason = std::generic_category().message(errno),
+               .missing = errno == ENOENT || errno == ENOTDIR};
     return std::nullopt;
   }
   if (!S_ISREG(status.st_mode)) {
@@ -108,11 +112,11 @@ std::optional<std::string> contents(const std::string& path, QVJSONFailure& fail
   std::string text;
   std::size_t length = 0;
   while (length <= QVJSONFile::kMaximumBytes) {
-    text.resize(length + 16 * 1024);
+    text.resize(length + kReadBytes);
     const ssize_t count = ::read(file.descriptor(), text.data() + length, text.size() - length);
     if (count < 0 && errno == EINTR) continue;
     if (count < 0) {
-      failure = {.reason = std::strerror(errno)};
+      failure = {.reason = std::generic_category().message(errno)};
       return std::nullopt;
     }
     if (count == 0) break;

@@ -27,7 +27,7 @@ struct QVJSONFailure {
 
 struct QVJSONFile {
   // Bytes of a file, far above any configuration a person writes.
-  static constexpr std::size_t kMaximumBytes = 4 * 1024 * 1024;
+  static constexpr std::size_t kMaximumBytes = std::size_t{4} * 1024 * 1024;
   // Arrays and objects within one another.
   static constexpr std::size_t kMaximumDepth = 64;
 

@@ -15,7 +15,7 @@
 namespace {
 
 // A buffer that one large text has grown beyond this is given back, in bytes.
-constexpr std::size_t kKeptBufferBytes = 256 * 1024;
+constexpr std::size_t kKeptBufferBytes = std::size_t{256} * 1024;
 
 // Below this every whole number is a double of its own.
 constexpr double kWholeNumbers = 0x1p53;

@@ -1,6 +1,6 @@
 #include "platform/linux/QVSQLiteDatabase.h"
 
-#include <cstring>
+#include <system_error>
 
 #include <sqlite3.h>
 
@@ -8,8 +8,7 @@ int QVSQLiteDatabase::open(const std::string& path, const std::string& vfs) {
   close();
   // SQLite's own book-keeping of memory takes a lock at each allocation. Too late once SQLite runs,
   // which does no harm.
-  static const int configured = sqlite3_config(SQLITE_CONFIG_MEMSTATUS, 0);
-  static_cast<void>(configured);
+  [[maybe_unused]] static const int kConfigured = sqlite3_config(SQLITE_CONFIG_MEMSTATUS, 0);
   const int result = sqlite3_open_v2(
       path.c_str(), &handle_, SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE | SQLITE_OPEN_NOMUTEX,
       vfs.empty() ? nullptr : vfs.c_str());
@@ -32,7 +31,7 @@ std::string QVSQLiteDatabase::message() const {
   const int systemError = sqlite3_system_errno(handle_);
   const int result = sqlite3_errcode(handle_) & 0xFF;
   if (systemError != 0 && (result == SQLITE_CANTOPEN || result == SQLITE_IOERR)) {
-    text.append(" (").append(std::strerror(systemError)).append(")");
+    text.append(" (").append(std::generic_category().message(systemError)).append(")");
   }
   return text;
 }

@@ -21,36 +21,39 @@ QVSQLiteEventStore::~QVSQLiteEventStore() {
 
 bool QVSQLiteEventStore::addSession(std::shared_ptr<QVEventSession> session,
                                     const QVDictionary& userInfo) {
-  return add(QVBeaconSessionRow{time(), std::move(session), userInfo}, false);
+  QVBeaconSessionRow row{time(), std::move(session), userInfo};
+  return add(row, false);
 }
 
 bool QVSQLiteEventStore::addMessage(const std::shared_ptr<QVEventSession>& session,
                                     uint16_t category, uint16_t type, const QVDictionary& payload) {
-  return add(QVBeaconMessageRow{time(), session, category, type, payload},
-             session->containsRealtimeEvents);
+  QVBeaconMessageRow row{time(), session, category, type, payload};
+  return add(row, session->containsRealtimeEvents);
 }
 
 bool QVSQLiteEventStore::addCountwiseEvent(std::string name, QVCountwise::PayloadCallback payload) {
-  return add(QVCountwiseRow{time(), std::move(name), std::move(payload)}, false);
+  QVCountwiseRow row{time(), std::move(name), std::move(payload)};
+  return add(row, false);
 }
 
 bool QVSQLiteEventStore::addJoulewellEvent(int32_t agent, std::string name,
                                            const QVDictionary& event) {
-  return add(QVJoulewellRow{time(), agent, std::move(name), event}, false);
+  QVJoulewellRow row{time(), agent, std::move(name), event};
+  return add(row, false);
 }
 
 void QVSQLiteEventStore::findBackends(std::shared_ptr<QVEventSession> session,
                                       QVBeaconSession::BackendsCompletion completion) {
   startWriter();
   QVEventStoreQueue::Search search{std::move(session), std::move(completion)};
-  if (!queue_.search(std::move(search))) search.completion(std::nullopt);
+  if (!queue_.search(search)) search.completion(std::nullopt);
 }
 
 void QVSQLiteEventStore::flush(std::shared_ptr<QVEventSession> session,
                                QVBeaconSession::FlushCompletion completion) {
   QVFlushRow row{time(), std::move(session), std::move(completion)};
-  if (add(std::move(row), true)) return;
-  row.completion(QVMakeEventStoreError(QVEventStoreErrorCode::closed, "the event store is closed"));
+  if (add(row, true)) return;
+  row.completion(QVEventStoreClosedError());
 }
 
 void QVSQLiteEventStore::close() {
@@ -72,7 +75,7 @@ void QVSQLiteEventStore::startWriter() {
 }
 
 template <class Row>
-bool QVSQLiteEventStore::add(Row&& row, bool urgent) {
+bool QVSQLiteEventStore::add(Row& row, bool urgent) {
   startWriter();
-  return queue_.add(std::forward<Row>(row), urgent);
+  return queue_.add(row, urgent);
 }

@@ -56,7 +56,7 @@ class QVSQLiteEventStore {
  private:
   void startWriter();
   template <class Row>
-  bool add(Row&& row, bool urgent);
+  bool add(Row& row, bool urgent);
   int64_t time() const { return QVEventStoreTime(clock_); }
 
   QVLog& log_;

@@ -12,7 +12,7 @@ using ::testing::IsEmpty;
 // A store that has reached the limit of its file.
 class QVEventRetentionTest : public QVStoreFixture {
  protected:
-  static constexpr int64_t kLimit = 1024 * 1024;
+  static constexpr int64_t kLimit = int64_t{1024} * 1024;
 
   QVEventRetentionTest() { preferences_.setValue("net.quillon.beacon", "store_limit_mib", 1); }
 
@@ -85,7 +85,7 @@ TEST_F(QVEventRetentionTest, KeepsToTheLimitWhateverTheRowsSize) {
 TEST_F(QVEventRetentionTest, LeavesOutARowThatIsLargerThanTheStore) {
   const auto session = openSession();
   send(*session, {{"n", 1}});
-  send(*session, {{"text", std::string(kLimit, 'x')}});
+  send(*session, {{"text", std::string(static_cast<std::size_t>(kLimit), 'x')}});
   send(*session, {{"n", 2}});
   EXPECT_EQ(flush(*session), std::nullopt);
   EXPECT_THAT(rows("SELECT payload FROM beacon_message ORDER BY id"),

@@ -82,7 +82,7 @@ TEST_F(QVEventStoreOutageTest, GivesUpTheOldestAndCountsThem) {
   const auto session = openSession();
   ASSERT_EQ(flush(*session), std::nullopt);
   fileSystem_.fail(Fault::diskFull);
-  constexpr int kEvents = 500;
+  constexpr int64_t kEvents = 500;
   for (int i = 0; i < kEvents; ++i) {
     clock_.advance(std::chrono::microseconds(1));
     send(*session, {{"n", i}, {"text", std::string(200, 'm')}});
