@@ -18,15 +18,19 @@
 #include "platform/linux/QVSystemRandom.h"
 #include "platform/linux/bus/QVBusListener.h"
 
-#include <malloc.h>
-
 #include <condition_variable>
+#include <csignal>
+#include <cstdio>
 #include <cstdlib>
+#include <exception>
 #include <memory>
 #include <mutex>
 #include <stop_token>
 #include <string>
 #include <thread>
+
+#include <malloc.h>
+#include <sys/stat.h>
 
 namespace {
 
@@ -38,7 +42,7 @@ constexpr int kMappedAllocationBytes = 64 * 1024;
 
 // When the service ends, sessions that still wait for backends get this long: enough for a store
 // that is being opened, too short for anybody to mind.
-constexpr std::chrono::seconds kLastBackendWait{1};
+constexpr std::chrono::seconds kLastBackendWait{3};
 
 void runDry(QVStdConditions& conditions, QVAsioWorkQueues& queues, QVSQLiteEventStore& store) {
   {
@@ -61,11 +65,21 @@ int giveUp(QVLog& log, const std::string& reason) {
   return EXIT_FAILURE;
 }
 
-}  // namespace
-
-int main() {
+// What the process is like, whoever started it.
+void prepareProcess() {
   ::mallopt(M_MMAP_THRESHOLD, kMappedAllocationBytes);
+  // What applications report is for the service's user and group alone.
+  ::umask(S_IRWXO);
+  // Until the listener handles them: an end that is asked for while the service starts is in good
+  // order, too. Threads inherit it, so the signals come to this one.
+  sigset_t ends;
+  ::sigemptyset(&ends);
+  ::sigaddset(&ends, SIGTERM);
+  ::sigaddset(&ends, SIGINT);
+  ::pthread_sigmask(SIG_BLOCK, &ends, nullptr);
+}
 
+int runService() {
   QVPlatform platform;
   auto ownedLog = std::make_unique<QVSystemLog>(QVSystemLog::standardSink());
   QVSystemLog& log = *ownedLog;
@@ -112,4 +126,18 @@ int main() {
   log.flush();
   QVPlatform::install(nullptr);
   return status;
+}
+
+}  // namespace
+
+int main() {
+  prepareProcess();
+  try {
+    return runService();
+  } catch (const std::exception& failure) {
+    // The log may be what failed.
+    std::fprintf(stderr, "<3>[default] main.cpp:%d:main: cannot run: %s\n", __LINE__,
+                 failure.what());
+    return EXIT_FAILURE;
+  }
 }

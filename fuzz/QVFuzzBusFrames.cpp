@@ -67,7 +67,7 @@ bool survivesTheWayBack(const QVBusMessage& message) {
   auto reader = message.bodyReader();
   const auto dictionary = decoder.readDictionary(reader, nullptr);
   require(reader.ok());
-  if (decoder.refused()) return false;
+  if (decoder.refusal() != nullptr) return false;
 
   std::string bytes;
   QVBusWriter(bytes).writeDictionary(dictionary);

@@ -36,10 +36,12 @@ class QVIPCConnection {
 
 class QVIPCListener;
 
+// Decides on a listener's new connections; the listener holds it weakly. Called on the listener's
+// thread.
 class QVIPCListenerDelegate {
  public:
   virtual ~QVIPCListenerDelegate() = default;
-  // Decides on a new connection, on the listener's thread; false closes it.
+  // Sets up and resumes the connection and answers true; false closes it.
   virtual bool listener(QVIPCListener& listener,
                         const std::shared_ptr<QVIPCConnection>& shouldAcceptNewConnection) = 0;
 };

@@ -41,6 +41,8 @@ class QVLog {
  public:
   // The verbosity at which debug lines are written.
   static constexpr int kVerbose = 5;
+  // Bytes of one line's text; what is longer is cut.
+  static constexpr std::size_t kMaximumTextBytes = std::size_t{16} << 10;
 
   virtual ~QVLog() = default;
 

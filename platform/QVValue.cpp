@@ -385,7 +385,7 @@ QVDictionary QVDictionary::merging(const QVDictionary& other) const {
   };
   std::for_each(begin(), end(), borrow);
   std::for_each(other.begin(), other.end(), borrow);
-  return assemble(entries, charge());
+  return assemble(entries, charge() != nullptr ? charge() : other.charge());
 }
 
 QVMemoryCharge* QVDictionary::charge() const noexcept {

@@ -1,10 +1,7 @@
 #pragma once
 
-#include <compare>
 #include <concepts>
 #include <cstdint>
-#include <initializer_list>
-#include <span>
 #include <string>
 #include <string_view>
 #include <type_traits>
@@ -110,101 +107,6 @@ class QVValue {
   bool counted_ = false;  // holds a reference to counted memory
 };
 
-// Is told of memory that messages of one origin occupy. Any thread. Whoever makes one keeps it
-// alive until everything that was added has been removed.
-class QVMemoryCharge {
- public:
-  virtual void add(std::size_t bytes) noexcept = 0;
-  virtual void remove(std::size_t bytes) noexcept = 0;
-
- protected:
-  ~QVMemoryCharge() = default;
-};
-
-struct QVDictionaryEntry {
-  std::string_view key;
-  QVValue value;
-};
-
-// An immutable dictionary with string keys, iterated in ascending byte order of the key. A handle
-// of one pointer; copies share the contents. A handle without contents is an absent dictionary and
-// reads as an empty one.
-class QVDictionary {
- public:
-  QVDictionary() noexcept = default;
-  QVDictionary(std::initializer_list<QVDictionaryEntry> entries);
-
-  // Copies keys, values and characters out of `entries` into one block. `entries` is sorted in
-  // place; of equal keys the later one wins. The block's bytes are charged to `charge` (may be
-  // null) until the last handle goes.
-  static QVDictionary assemble(std::span<QVDictionaryEntry> entries,
-                               QVMemoryCharge* charge = nullptr);
-
-  QVDictionary(const QVDictionary& other) noexcept;
-  QVDictionary(QVDictionary&& other) noexcept : storage_(other.storage_) {
-    other.storage_ = nullptr;
-  }
-  QVDictionary& operator=(QVDictionary other) noexcept {
-    std::swap(storage_, other.storage_);
-    return *this;
-  }
-  ~QVDictionary();
-
-  bool isAbsent() const noexcept { return storage_ == nullptr; }
-  std::size_t size() const noexcept;
-  bool empty() const noexcept { return size() == 0; }
-  const QVDictionaryEntry* begin() const noexcept;
-  const QVDictionaryEntry* end() const noexcept;
-
-  // Null where there is no such key. Valid as long as a handle to this dictionary exists.
-  const QVValue* find(std::string_view key) const noexcept;
-  bool contains(std::string_view key) const noexcept { return find(key) != nullptr; }
-
-  // A dictionary with these entries and, over them, those of `other`, charged as this one is.
-  QVDictionary merging(const QVDictionary& other) const;
-
-  // What the memory of this dictionary is charged to; null where to nothing.
-  QVMemoryCharge* charge() const noexcept;
-  // Bytes of memory that the contents take, nested arrays and dictionaries included.
-  std::size_t footprint() const noexcept;
-
-  bool sharesContentsWith(const QVDictionary& other) const noexcept {
-    return storage_ == other.storage_;
-  }
-  // Equal contents; an absent dictionary equals an empty one.
-  bool operator==(const QVDictionary& other) const noexcept;
-
- private:
-  friend class QVValue;
-  explicit QVDictionary(const QVDictionaryStorage* storage) noexcept : storage_(storage) {}
-  const QVDictionaryStorage* storage_ = nullptr;
-};
-
-// An immutable array of values; as a handle like QVDictionary.
-class QVArray {
- public:
-  QVArray() noexcept = default;
-  QVArray(std::initializer_list<QVValue> items);
-  static QVArray assemble(std::span<const QVValue> items);
-
-  QVArray(const QVArray& other) noexcept;
-  QVArray(QVArray&& other) noexcept : storage_(other.storage_) { other.storage_ = nullptr; }
-  QVArray& operator=(QVArray other) noexcept {
-    std::swap(storage_, other.storage_);
-    return *this;
-  }
-  ~QVArray();
-
-  std::size_t size() const noexcept;
-  bool empty() const noexcept { return size() == 0; }
-  const QVValue* begin() const noexcept;
-  const QVValue* end() const noexcept;
-  const QVValue& operator[](std::size_t index) const noexcept { return begin()[index]; }
-
-  bool operator==(const QVArray& other) const noexcept;
-
- private:
-  friend class QVValue;
-  explicit QVArray(const QVArrayStorage* storage) noexcept : storage_(storage) {}
-  const QVArrayStorage* storage_ = nullptr;
-};
+// A value is of little use without what it may hold; they need its definition in turn.
+#include "platform/QVArray.h"
+#include "platform/QVDictionary.h"

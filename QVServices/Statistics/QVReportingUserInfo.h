@@ -2,7 +2,9 @@
 
 #include "platform/QVValue.h"
 
+#include <cstddef>
 #include <mutex>
+#include <utility>
 
 // A session's user information: its client's configuration and the service's defaults, merged.
 // Shared between the session and the set-up of its framework session, which reads the contents
@@ -17,11 +19,20 @@ class QVReportingUserInfo {
     return contents_;
   }
 
-  // Adds all entries; those of keys that are there already are replaced.
-  void addEntries(const QVDictionary& entries) {
-    if (entries.empty()) return;
+  // Bytes: a configuration is names and numbers. It goes into every analytics event's making and
+  // into each start's row, so it must not be what fills the memory.
+  static constexpr std::size_t kMaximumBytes = std::size_t{64} << 10;
+
+  // Adds all entries; those of keys that are there already are replaced. False, with nothing
+  // added, where the contents would become larger than kMaximumBytes.
+  [[nodiscard]] bool addEntries(const QVDictionary& entries) {
+    if (entries.empty()) return true;
+    if (entries.footprint() > kMaximumBytes) return false;
     const std::lock_guard lock(mutex_);
-    contents_ = contents_.merging(entries);
+    QVDictionary merged = contents_.merging(entries);
+    if (merged.footprint() > kMaximumBytes) return false;
+    contents_ = std::move(merged);
+    return true;
   }
 
  private:

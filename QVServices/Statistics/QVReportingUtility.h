@@ -5,7 +5,7 @@
 
 #include <string_view>
 
-// Two helpers that sessions need.
+// Two functions that sessions need.
 
 // Waits until `flag` is set: true once it is, false when a wait period of `timeout` seconds passes
 // without a signal. Each signal that comes without the flag starts a fresh period, so the total may

@@ -5,6 +5,14 @@
 
 #include <utility>
 
+namespace {
+
+// Items of a batch between two wake-ups: what they answer and enqueue does not wait for the end of
+// a long batch.
+constexpr std::size_t kItemsPerWakeUp = 64;
+
+}  // namespace
+
 QVAsioSerialQueue::QVAsioSerialQueue(std::string_view label, QVWorkExecutor& executor,
                                      QVAsioTimers& timers, QVLog& log, std::size_t keptItems)
     : label_(label), executor_(executor), timers_(timers), log_(log), keptItems_(keptItems) {}
@@ -43,7 +51,13 @@ void QVAsioSerialQueue::runBatch() {
   }
   {
     const QVWakeUpBatch wakeUps;
-    for (QVWorkItem& item : batch_) QVRunWorkItem(item, label_, log_);
+    std::size_t untilWakeUp = kItemsPerWakeUp;
+    for (QVWorkItem& item : batch_) {
+      QVRunWorkItem(item, label_, log_);
+      if (--untilWakeUp != 0) continue;
+      untilWakeUp = kItemsPerWakeUp;
+      QVWakeUpBatch::wakeNow();
+    }
     batch_.clear();
   }
   {

@@ -55,6 +55,11 @@ QVEventStoreQueue::Work QVEventStoreQueue::take(std::optional<SteadyTime> retryA
   }
 }
 
+std::vector<QVEventStoreQueue::Search> QVEventStoreQueue::takeSearches() {
+  const QVMutexLock lock(mutex_);
+  return std::exchange(searches_, {});
+}
+
 bool QVEventStoreQueue::takeWaiting(std::deque<QVEventRows>& batches) {
   const QVMutexLock lock(mutex_);
   if (waitingRows_ == 0) return false;

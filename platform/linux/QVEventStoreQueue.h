@@ -65,6 +65,8 @@ class QVEventStoreQueue {
 
   // Sleeps until there is something to do: a search, rows that are due, `retryAt`, the stop.
   Work take(std::optional<SteadyTime> retryAt);
+  // The searches that came since, without sleeping.
+  std::vector<Search> takeSearches();
   // Appends what waits to `batches`, due or not; false where nothing does.
   bool takeWaiting(std::deque<QVEventRows>& batches);
   // Gives a batch's memory back for later ones.

@@ -109,7 +109,7 @@ void QVEventStoreWriter::run() {
 
 void QVEventStoreWriter::answer(QVEventStoreQueue::Search& search) {
   if (tables_.isOpen() && tables_.hasMoved()) {
-    log_.error(nullptr, "QVEventStoreWriter::answer", "the event store ", options_.path,
+    log_.error(nullptr, "-[QVEventStoreWriter answer]", "the event store ", options_.path,
                " was moved or removed; opening it anew");
     tables_.close();
   }
@@ -130,7 +130,7 @@ bool QVEventStoreWriter::openStore() {
   if (opening == QVEventTables::Opening::damaged && setAside(reason)) opening = openFile(reason);
   if (opening == QVEventTables::Opening::opened) {
     if (!openFailure_.empty()) {
-      log_.standard(nullptr, "QVEventStoreWriter::openStore", "the event store ", options_.path,
+      log_.standard(nullptr, "-[QVEventStoreWriter openStore]", "the event store ", options_.path,
                     " is open again");
     }
     openFailure_.clear();
@@ -140,7 +140,7 @@ bool QVEventStoreWriter::openStore() {
     reason = std::move(obstacle);
   }
   if (reason != openFailure_) {
-    log_.error(nullptr, "QVEventStoreWriter::openStore", "the event store ", options_.path,
+    log_.error(nullptr, "-[QVEventStoreWriter openStore]", "the event store ", options_.path,
                " cannot be opened: ", reason);
     openFailure_ = reason;
   }
@@ -161,14 +161,14 @@ bool QVEventStoreWriter::setAside(const std::string& reason) {
   std::string target = wanted;
   for (int i = 2; access(target.c_str(), F_OK) == 0; ++i) target = QVText(wanted, '-', i);
   if (std::rename(options_.path.c_str(), target.c_str()) != 0) {
-    log_.error(nullptr, "QVEventStoreWriter::setAside", "the damaged event store ", options_.path,
+    log_.error(nullptr, "-[QVEventStoreWriter setAside]", "the damaged event store ", options_.path,
                " cannot be set aside: ", std::generic_category().message(errno));
     return false;
   }
   // The write-ahead log belongs to the damaged file; what is not there needs no moving.
   std::rename((options_.path + "-wal").c_str(), (target + "-wal").c_str());
   unlink((options_.path + "-shm").c_str());
-  log_.error(nullptr, "QVEventStoreWriter::setAside", "the event store ", options_.path,
+  log_.error(nullptr, "-[QVEventStoreWriter setAside]", "the event store ", options_.path,
              " is damaged (", reason, "), set aside as ", target);
   return true;
 }
@@ -213,6 +213,8 @@ void QVEventStoreWriter::store() {
     if (result == SQLITE_OK) {
       finishBatches(batches);
       endOutage();
+      // Rows may come as fast as they are stored; who waits for the store is not to wait for a gap.
+      for (QVEventStoreQueue::Search& search : queue_.takeSearches()) answer(search);
     } else if (QVSQLiteDatabase::isDamage(result) && setAside(failure_) && openStore()) {
       continue;
     } else if (tables_.isOpen()) {
@@ -242,7 +244,9 @@ int QVEventStoreWriter::writeTransaction(std::size_t& batches) {
   if (result == SQLITE_OK) {
     if (tooLarge_ > 0) losses_[kLossTooLarge] += tooLarge_;
     result = tables_.commit(losses_, now());
-    if (result != SQLITE_OK && tooLarge_ > 0) losses_[kLossTooLarge] -= tooLarge_;
+    if (result != SQLITE_OK && tooLarge_ > 0 && (losses_[kLossTooLarge] -= tooLarge_) == 0) {
+      losses_.erase(kLossTooLarge);
+    }
   }
   if (result != SQLITE_OK) {
     failure_ = tables_.message();
@@ -292,7 +296,7 @@ void QVEventStoreWriter::beginOutage(int result) {
   retryAt_ = std::chrono::steady_clock::now() + options_.retryInterval;
   if (outageCause_.empty()) {
     lostInOutage_ = 0;
-    log_.error(nullptr, "QVEventStoreWriter::store", "the event store ", options_.path,
+    log_.error(nullptr, "-[QVEventStoreWriter store]", "the event store ", options_.path,
                " cannot be written: ", failure_);
   }
   outageCause_ = causeOf(result);
@@ -302,7 +306,7 @@ void QVEventStoreWriter::beginOutage(int result) {
 void QVEventStoreWriter::endOutage() {
   if (outageCause_.empty()) return;
   outageCause_.clear();
-  log_.standard(nullptr, "QVEventStoreWriter::store", "the event store ", options_.path,
+  log_.standard(nullptr, "-[QVEventStoreWriter store]", "the event store ", options_.path,
                 " can be written again; events lost meanwhile: ", lostInOutage_);
 }
 
@@ -391,7 +395,7 @@ void QVEventStoreWriter::closeStore() {
   int64_t lost = 0;
   for (const auto& [cause, count] : losses_) lost += count;
   if (lost > 0) {
-    log_.error(nullptr, "QVEventStoreWriter::closeStore", "the event store ", options_.path,
+    log_.error(nullptr, "-[QVEventStoreWriter closeStore]", "the event store ", options_.path,
                " was out of order to the end; events lost and not counted in it: ", lost);
   }
   tables_.close();
@@ -402,9 +406,9 @@ void QVEventStoreWriter::guarded(Callable&& callable) {
   try {
     callable();
   } catch (const std::exception& exception) {
-    log_.error(nullptr, "QVEventStoreWriter::run", "a callback failed: ", exception.what());
+    log_.error(nullptr, "-[QVEventStoreWriter run]", "a callback failed: ", exception.what());
   } catch (...) {
-    log_.error(nullptr, "QVEventStoreWriter::run", "a callback failed");
+    log_.error(nullptr, "-[QVEventStoreWriter run]", "a callback failed");
   }
 }
 

@@ -21,6 +21,7 @@
 #define QV_RELEASE(...) QV_ATTRIBUTE(release_capability(__VA_ARGS__))
 #define QV_NO_THREAD_SAFETY_ANALYSIS QV_ATTRIBUTE(no_thread_safety_analysis)
 
+// A mutex, not recursive, that the annotations know of. Any thread; held with a QVMutexLock.
 class QV_CAPABILITY("mutex") QVMutex {
  public:
   void lock() QV_ACQUIRE() { mutex_.lock(); }

@@ -81,7 +81,8 @@ TEST_F(QVLogFormatTest, TellsASessionsLife) {
       connection,
       ElementsAre(
           AllOf(StartsWith(delegate + "newConnection: "), HasSubstr(pid)),
-          delegate + "InvalidationHandler: connection exited process=qv_e2e_tests uptime_sec=0"));
+          StartsWith(delegate +
+                     "InvalidationHandler: connection exited process=qv_e2e_tests uptime_sec=")));
   const std::string instance = "<5>[qvrs] -[QVReportingServerInstance ";
   EXPECT_THAT(
       server,

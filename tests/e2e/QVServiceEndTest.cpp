@@ -32,8 +32,10 @@ TEST_P(QVOrderlyEndTest, StoresEverythingThatWasSent) {
     call.flags = kBusNoReplyExpected;
     batch += call.bytes(1000);
   }
-  ASSERT_TRUE(first.send(batch));
   first.awaitOperations();
+  second.awaitOperations();
+  // Some of it the service has not read yet when it is told to end.
+  ASSERT_TRUE(first.send(batch));
   service().signal(GetParam());
   EXPECT_EQ(service().wait(), 0) << service().log();
 

@@ -52,7 +52,7 @@ TEST_F(QVStartReplyTest, GoesToTheClientThatStartedAnothersSession) {
   EXPECT_TRUE(other.awaitReply(start).boolean());
 }
 
-TEST_F(QVStartReplyTest, ComesWhenASessionIsStartedAnewAfterItsClientsEnd) {
+TEST_F(QVStartReplyTest, ComesForEachStartWhoeverStartedTheSession) {
   auto owner = connectClient();
   auto other = connectClient();
   owner.create(7, kTelephony);

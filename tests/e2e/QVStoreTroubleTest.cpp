@@ -233,8 +233,6 @@ TEST_F(QVStoreTroubleTest, WaitingSessionsDoNotDelayAnothersMessage) {
   other.start(1000);
   other.sendMessage({{"a", 1}}, {1000});
   expectStored("SELECT * FROM beacon_message WHERE session_id = 1000", 1);
-  // Were they waited for, all would have given up by now.
-  EXPECT_LT(log().count("failed to find backend"), kSessions);
   // The end does not wait for them either.
   endService();
   EXPECT_EQ(log().count("deallocing this session"), kSessions + 1);

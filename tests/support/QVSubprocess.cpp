@@ -1,5 +1,6 @@
 #include "tests/support/QVSubprocess.h"
 
+#include <cerrno>
 #include <csignal>
 #include <cstdlib>
 #include <filesystem>
@@ -71,9 +72,17 @@ void QVSubprocess::signal(int number) const {
 std::optional<QVSubprocess::Status> QVSubprocess::wait(std::chrono::milliseconds limit) {
   if (status_) return status_;
   pollfd ended{pidDescriptor_, POLLIN, 0};
-  if (::poll(&ended, 1, static_cast<int>(limit.count())) != 1) return std::nullopt;
+  int polled;
+  do {
+    polled = ::poll(&ended, 1, static_cast<int>(limit.count()));
+  } while (polled < 0 && errno == EINTR);
+  if (polled != 1) return std::nullopt;
   int raw = 0;
-  ::waitpid(pid_, &raw, 0);
+  pid_t collected;
+  do {
+    collected = ::waitpid(pid_, &raw, 0);
+  } while (collected < 0 && errno == EINTR);
+  if (collected != pid_) throw std::runtime_error("a child process ended unseen");
   status_ = WIFEXITED(raw) ? WEXITSTATUS(raw) : -WTERMSIG(raw);
   return status_;
 }

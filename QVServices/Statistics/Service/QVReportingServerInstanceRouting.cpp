@@ -39,9 +39,11 @@ std::string textOf(const QVReportingServiceProtocol::ReporterIDs& reporterIDs) {
   return text += ']';
 }
 
+// No longer than the log takes: this is made for every broadcast message.
 std::string textOf(const Sessions& sessions) {
   std::string text = "[";
   for (const auto& session : sessions) {
+    if (text.size() > QVLog::kMaximumTextBytes) break;
     if (text.size() > 1) text += ',';
     text += session->description();
   }

@@ -87,11 +87,17 @@ void QVReportingSession::setServiceType(uint16_t serviceType) {
 }
 
 void QVReportingSession::setConfiguration(const QVDictionary& configuration) {
-  userInfo_->addEntries(configuration);
+  addUserInformation(configuration, "-[QVReportingSession setConfiguration:]");
 }
 
 void QVReportingSession::updateDefaults(const QVDictionary& defaults) {
-  userInfo_->addEntries(defaults);
+  addUserInformation(defaults, "-[QVReportingSession updateDefaults:]");
+}
+
+void QVReportingSession::addUserInformation(const QVDictionary& entries, const QVLogSite& site) {
+  if (userInfo_->addEntries(entries)) return;
+  log().error(scope(), site, "user information of ", reporterID_, " would be larger than ",
+              QVReportingUserInfo::kMaximumBytes, " bytes, nothing added");
 }
 
 void QVReportingSession::start() {

@@ -5,6 +5,7 @@
 #include "QVServices/Statistics/Service/QVReportingPayloadArray.h"
 #include "platform/QVBeacon.h"
 #include "platform/QVDate.h"
+#include "platform/QVLog.h"
 #include "platform/QVReportingServiceProtocol.h"
 #include "platform/QVWorkQueue.h"
 
@@ -110,6 +111,7 @@ class QVReportingSession final : public QVReportingSessionInformation,
 
   QVReportingSession(int64_t reporterID, std::vector<int32_t> processIdentifiers);
 
+  void addUserInformation(const QVDictionary& entries, const QVLogSite& site);
   void setUpBeaconSession(const std::optional<std::string_view>& serviceName, uint16_t serviceType,
                           bool startFlag);
   void sendOnBeaconQueue(const Message& message);

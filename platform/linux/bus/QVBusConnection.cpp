@@ -5,6 +5,7 @@
 #include "platform/linux/bus/QVBusLoop.h"
 #include "platform/linux/bus/QVBusServer.h"
 
+#include <new>
 #include <utility>
 
 namespace {
@@ -12,6 +13,10 @@ namespace {
 // Bytes that may wait for a peer before its calls are no longer read. Enough for the largest reply
 // and a batch of small ones.
 constexpr std::size_t kMostUnwritten = std::size_t{1} << 20;
+
+// Reads from a connection when the service ends: more than the kernel's buffer of a socket holds,
+// so that what was sent before is taken in; not endless, for a peer that goes on sending.
+constexpr int kMostLastReads = 16;
 
 // Bytes of buffer that an idle connection may keep; there may be thousands of them.
 constexpr std::size_t kIdleBuffer = 4096;
@@ -84,10 +89,11 @@ bool QVBusConnection::isAdmitted() {
   if (!waitsForHangUp_) {
     waitsForHangUp_ = true;
     socket_.waitHangUp([weak = weak_from_this()] {
-      if (const auto self = weak.lock()) {
-        self->hungUp_ = true;
-        self->continueReading();
-      }
+      const auto self = weak.lock();
+      // The wait ends on urgent data, too, which a peer that is there can send at will.
+      if (self == nullptr || !self->socket_.hasHungUp()) return;
+      self->hungUp_ = true;
+      self->continueReading();
     });
   }
   return false;
@@ -104,7 +110,7 @@ void QVBusConnection::onReadable() {
     const auto received = socket_.receive(buffer);
     switch (received.status) {
       case QVBusSocket::Status::done:
-        takeBytes({buffer.data(), received.bytes});
+        takeBytesSafely({buffer.data(), received.bytes});
         break;
       case QVBusSocket::Status::wouldBlock:
         break;
@@ -116,6 +122,15 @@ void QVBusConnection::onReadable() {
     flush();
   }
   continueReading();
+}
+
+void QVBusConnection::takeBytesSafely(std::string_view bytes) {
+  try {
+    takeBytes(bytes);
+  } catch (const std::bad_alloc&) {
+    // The peer whose message does not fit loses its connection, nobody else theirs.
+    violated("out of memory for its message");
+  }
 }
 
 void QVBusConnection::takeBytes(std::string_view bytes) {
@@ -177,9 +192,23 @@ void QVBusConnection::chargeHeldBytes() {
   charged_ = held;
 }
 
+void QVBusConnection::readToTheEnd() {
+  if (state_ != State::open && state_ != State::authenticating) return;
+  for (int read = 0; read < kMostLastReads && state_ != State::closed; ++read) {
+    const auto buffer = server_.readBuffer();
+    const auto received = socket_.receive(buffer);
+    if (received.status != QVBusSocket::Status::done) return;
+    takeBytesSafely({buffer.data(), received.bytes});
+  }
+}
+
 // ---- Writing
 
 void QVBusConnection::onWake() {
+  if (state_ != State::closed && outbox_->hasOverflowed()) {
+    violated("more than 16 MiB of answers wait for a peer that does not read them");
+    return;
+  }
   flush();
   continueReading();
 }

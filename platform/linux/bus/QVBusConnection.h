@@ -48,6 +48,8 @@ class QVBusConnection final : public QVIPCConnection,
 
   // The rest is for the server.
 
+  // Takes in what the peer has sent so far, before the service ends.
+  void readToTheEnd();
   // Closes, runs the invalidation handler, lets go of the exported object. May be called again.
   void invalidate();
   // Reads on where nothing is in the way; called again whenever something no longer is.
@@ -60,6 +62,7 @@ class QVBusConnection final : public QVIPCConnection,
   bool isAdmitted();
   void onReadable();
   void onWake();
+  void takeBytesSafely(std::string_view bytes);
   void takeBytes(std::string_view bytes);
   void takeMessages(std::string_view bytes);
   const char* takeMessage(std::string_view bytes);

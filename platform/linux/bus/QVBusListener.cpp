@@ -76,6 +76,12 @@ void QVBusListener::resume() {
     if (!error) inside_->loop.stop();
   });
   inside_->server.setClosedHandler([this] { acceptWhenReadable(); });
+  // From here on they end the service in good order; before, the composition root holds them back.
+  sigset_t ends;
+  ::sigemptyset(&ends);
+  ::sigaddset(&ends, SIGTERM);
+  ::sigaddset(&ends, SIGINT);
+  ::pthread_sigmask(SIG_UNBLOCK, &ends, nullptr);
   acceptWhenReadable();
   ::sd_notify(0, "READY=1");
   inside_->loop.run();
@@ -87,6 +93,7 @@ void QVBusListener::endService() {
   inside_->listening.close();
   inside_->place->unlink();
   ::sd_notify(0, "STOPPING=1");
+  inside_->server.readToTheEnd();
   inside_->server.invalidateAll();
   if (inside_->options.drain) inside_->options.drain();
 }

@@ -18,11 +18,12 @@ struct QVBusListenerOptions {
 // The listener of the on-demand service, over a unix socket: accepts, serves, and ends in good
 // order on SIGTERM and SIGINT.
 //
-// The end: accept no more, tell the service manager, invalidate every connection, drain; then
-// resume() returns.
+// The end: accept no more, tell the service manager, take in what clients have sent so far,
+// invalidate every connection, drain; then resume() returns.
 //
 // Threads: create(), setDelegate() and resume() on one thread, which resume() makes the IPC thread.
-// Process-wide effects of resume(): SIGPIPE is ignored, SIGTERM and SIGINT are caught; readiness
+// Process-wide effects of resume(): SIGPIPE is ignored, SIGTERM and SIGINT are caught
+// and, where they were blocked, unblocked; readiness
 // and end are told to the service manager.
 // Limits: as many connections as the process may have descriptors; when they run out, one line is
 // logged and the next clients wait until a connection closes.

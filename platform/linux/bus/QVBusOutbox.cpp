@@ -41,6 +41,11 @@ std::size_t QVBusOutbox::size() {
   return bytes_.size();
 }
 
+bool QVBusOutbox::hasOverflowed() {
+  const QVMutexLock lock(mutex_);
+  return overflowed_;
+}
+
 void QVBusOutbox::close() {
   const QVMutexLock lock(mutex_);
   closed_ = true;

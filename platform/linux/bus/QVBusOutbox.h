@@ -19,6 +19,10 @@
 // Threads: any.
 class QVBusOutbox : public std::enable_shared_from_this<QVBusOutbox> {
  public:
+  // Bytes. Calls that were taken in before their peer stopped reading may still be answered at
+  // length; a peer for which more than this waits is given up.
+  static constexpr std::size_t kMostBytes = std::size_t{16} << 20;
+
   // `wake` is called when there is something to take, once until it has been taken; under the lock
   // and on any thread, so it only posts. Within a QVWakeUpBatch it is called at the batch's end.
   explicit QVBusOutbox(QVFunction<void()> wake) : wake_(std::move(wake)) {}
@@ -28,12 +32,19 @@ class QVBusOutbox : public std::enable_shared_from_this<QVBusOutbox> {
   template <class Body>
   void put(QVBusHeader header, Body&& body) QV_EXCLUDES(mutex_) {
     const QVMutexLock lock(mutex_);
-    if (closed_) return;
+    if (closed_ || overflowed_) return;
     header.serial = nextSerial();
-    QVBusWriter writer(bytes_);
-    writer.beginMessage(header);
-    body(writer);
-    writer.endMessage();
+    const std::size_t before = bytes_.size();
+    try {
+      QVBusWriter writer(bytes_);
+      writer.beginMessage(header);
+      body(writer);
+      writer.endMessage();
+    } catch (...) {
+      bytes_.resize(before);  // half a message would spoil all that follow
+      throw;
+    }
+    if (bytes_.size() > kMostBytes) overflowed_ = true;
     wakeOnce();
   }
   // Bytes as they are: the lines of authentication.
@@ -46,6 +57,8 @@ class QVBusOutbox : public std::enable_shared_from_this<QVBusOutbox> {
   // Hands out all bytes, in exchange for an empty buffer.
   void take(std::string& empty) QV_EXCLUDES(mutex_);
   std::size_t size() QV_EXCLUDES(mutex_);
+  // More came than may wait; what came after it is not here.
+  bool hasOverflowed() QV_EXCLUDES(mutex_);
   void close() QV_EXCLUDES(mutex_);
 
  private:
@@ -62,4 +75,5 @@ class QVBusOutbox : public std::enable_shared_from_this<QVBusOutbox> {
   uint32_t serial_ QV_GUARDED_BY(mutex_) = 0;
   bool woken_ QV_GUARDED_BY(mutex_) = false;
   bool closed_ QV_GUARDED_BY(mutex_) = false;
+  bool overflowed_ QV_GUARDED_BY(mutex_) = false;
 };

@@ -1,5 +1,6 @@
 #include "platform/linux/bus/QVBusServer.h"
 
+#include "platform/linux/QVWakeUpBatch.h"
 #include "platform/linux/bus/QVBusConnection.h"
 #include "platform/linux/bus/QVBusHexadecimal.h"
 #include "platform/linux/bus/QVBusLoop.h"
@@ -39,6 +40,12 @@ std::shared_ptr<QVBusConnection> QVBusServer::adopt(int descriptor) {
   auto connection = std::make_shared<QVBusConnection>(*this, descriptor, number);
   connections_.emplace(number, connection);
   return connection;
+}
+
+void QVBusServer::readToTheEnd() {
+  const QVWakeUpBatch wakeUps;
+  const auto connections = connections_;
+  for (const auto& [number, connection] : connections) connection->readToTheEnd();
 }
 
 void QVBusServer::invalidateAll() {

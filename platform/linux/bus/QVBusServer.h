@@ -30,6 +30,8 @@ class QVBusServer {
 
   // A new connection over a connected socket, which is taken over.
   std::shared_ptr<QVBusConnection> adopt(int descriptor);
+  // Every connection takes in what its peer has sent so far.
+  void readToTheEnd();
   // Invalidates every connection.
   void invalidateAll();
   std::size_t connections() const noexcept { return connections_.size(); }

@@ -84,6 +84,11 @@ void QVBusSocket::waitHangUp(QVFunction<void()> handler) {
   wait(asio::posix::stream_descriptor::wait_error, std::move(handler));
 }
 
+bool QVBusSocket::hasHungUp() const {
+  pollfd state{descriptor(), 0, 0};
+  return ::poll(&state, 1, 0) == 1 && (state.revents & (POLLHUP | POLLERR)) != 0;
+}
+
 void QVBusSocket::close() {
   asio::error_code ignored;
   descriptor_->waiter.close(ignored);

@@ -41,6 +41,8 @@ class QVBusSocket {
   void waitWritable(QVFunction<void()> handler);
   // The same when the peer has gone; what it sent before may still be there.
   void waitHangUp(QVFunction<void()> handler);
+  // Has the peer gone, whatever is still there to be read?
+  bool hasHungUp() const;
 
   // Closes the descriptor; the waits' handlers go unrun. May be called again.
   void close();

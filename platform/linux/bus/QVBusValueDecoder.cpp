@@ -10,15 +10,20 @@ namespace {
 // Values and entries; scratch of that size is kept, which is some hundred KiB at the most.
 constexpr std::size_t kScratchKept = 4096;
 
+// Values of one dictionary. A value takes 16 bytes and more however few it took on the wire, so an
+// array of bytes would grow twentyfold; this many stay below 16 MiB.
+constexpr std::size_t kMostValues = std::size_t{512} << 10;
+
 }  // namespace
 
 QVDictionary QVBusValueDecoder::readDictionary(QVBusReader& reader, QVMemoryCharge* charge) {
-  refused_ = false;
+  refusal_ = nullptr;
+  values_ = 0;
   const std::size_t end = reader.enterArray(8);
   while (reader.position() < end) {
     reader.enterStruct();
     const auto key = reader.readString();
-    entries_.push_back({key, readVariant(reader)});
+    addEntry(key, readVariant(reader));
     reader.leaveStruct();
   }
   reader.leaveArray(end);
@@ -100,7 +105,7 @@ QVValue QVBusValueDecoder::readBasic(QVBusReader& reader, char type) {
     default:
       // A file descriptor.
       reader.skipBasic(type);
-      refused_ = true;
+      refusal_ = "file descriptors are not taken";
       return {};
   }
 }
@@ -109,7 +114,7 @@ QVValue QVBusValueDecoder::readArray(QVBusReader& reader, const QVBusSignature& 
                                      std::size_t element) {
   const std::size_t base = items_.size();
   const std::size_t end = reader.enterArray(QVBusSignature::alignmentOf(signature.typeAt(element)));
-  while (reader.position() < end) items_.push_back(readValue(reader, signature, element));
+  while (reader.position() < end) addItem(readValue(reader, signature, element));
   reader.leaveArray(end);
   return takeItems(base);
 }
@@ -120,10 +125,28 @@ QVValue QVBusValueDecoder::readStruct(QVBusReader& reader, const QVBusSignature&
   reader.enterStruct();
   for (std::size_t end = signature.endOf(index) - 1, member = index + 1; member < end;
        member = signature.endOf(member)) {
-    items_.push_back(readValue(reader, signature, member));
+    addItem(readValue(reader, signature, member));
   }
   reader.leaveStruct();
   return takeItems(base);
+}
+
+// What comes beyond the limit is read, so that the rest is checked, and let go.
+bool QVBusValueDecoder::takesOneMore() {
+  if (values_ < kMostValues) {
+    ++values_;
+    return true;
+  }
+  refusal_ = "no more than 524288 values are taken";
+  return false;
+}
+
+void QVBusValueDecoder::addItem(QVValue item) {
+  if (takesOneMore()) items_.push_back(std::move(item));
+}
+
+void QVBusValueDecoder::addEntry(std::string_view key, QVValue value) {
+  if (takesOneMore()) entries_.push_back({key, std::move(value)});
 }
 
 QVValue QVBusValueDecoder::takeItems(std::size_t base) {
@@ -140,7 +163,7 @@ QVValue QVBusValueDecoder::readEntries(QVBusReader& reader, const QVBusSignature
   while (reader.position() < end) {
     reader.enterStruct();
     const auto key = readKey(reader, signature.typeAt(entry + 1));
-    entries_.push_back({key, readValue(reader, signature, entry + 2)});
+    addEntry(key, readValue(reader, signature, entry + 2));
     reader.leaveStruct();
   }
   reader.leaveArray(end);

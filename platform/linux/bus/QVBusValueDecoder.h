@@ -11,7 +11,8 @@
 // Makes dictionaries of the a{sv} in messages: integers of all widths become integers, strings,
 // object paths and signatures strings, structs arrays, dictionary entries dictionaries (keys of
 // other types than string in their text form; of equal keys the later one wins), variants what they
-// hold. A file descriptor has no counterpart: refused() tells.
+// hold. A file descriptor has no counterpart, and there is a limit to how many
+// values are taken: refusal() tells.
 //
 // Holds scratch memory that lasts from one message to the next, so that a flat dictionary costs one
 // allocation, that of its own block, and its texts are copied once. One serves all connections of a
@@ -24,8 +25,8 @@ class QVBusValueDecoder {
   // Reads one a{sv}. What is broken shows in the reader; the dictionary is then of no use.
   QVDictionary readDictionary(QVBusReader& reader, QVMemoryCharge* charge);
 
-  // Was there a value in the last dictionary that is well-formed and cannot be taken?
-  bool refused() const noexcept { return refused_; }
+  // Why the last dictionary, though well-formed, cannot be taken; null where it can.
+  const char* refusal() const noexcept { return refusal_; }
 
  private:
   QVValue readVariant(QVBusReader& reader);
@@ -36,6 +37,9 @@ class QVBusValueDecoder {
   QVValue readStruct(QVBusReader& reader, const QVBusSignature& signature, std::size_t index);
   QVValue readEntries(QVBusReader& reader, const QVBusSignature& signature, std::size_t entry);
   std::string_view readKey(QVBusReader& reader, char type);
+  bool takesOneMore();
+  void addItem(QVValue item);
+  void addEntry(std::string_view key, QVValue value);
   QVValue takeItems(std::size_t base);
   void tidy();
 
@@ -43,5 +47,6 @@ class QVBusValueDecoder {
   std::vector<QVDictionaryEntry> entries_;
   std::vector<QVValue> items_;
   std::deque<std::string> keys_;  // keys in text form; a deque's elements stay where they are
-  bool refused_ = false;
+  const char* refusal_ = nullptr;
+  std::size_t values_ = 0;  // of the dictionary that is read
 };

@@ -13,13 +13,18 @@ QVIntakeBudget::AccountHandle QVIntakeBudget::open() {
 }
 
 void QVIntakeBudget::AccountCloser::operator()(Account* account) const noexcept {
-  account->budget_->accounts_.fetch_sub(1, std::memory_order_relaxed);
+  const auto budget = account->budget_;
+  budget->accounts_.fetch_sub(1);
   account->state_.fetch_and(~Account::kWaits);
   if (account->state_.fetch_sub(Account::kUnit) == Account::kUnit) delete account;
+  // With fewer connections, those that wait have a larger share.
+  if (budget->someoneWaits_.load()) budget->wakeUp();
 }
 
 bool QVIntakeBudget::isWithin(std::size_t heldByOne) const noexcept {
-  if (total_.load() <= bound_) return true;
+  const std::size_t total = total_.load();
+  if (total <= bound_) return true;
+  if (total > kCeilingFactor * bound_) return false;
   const std::size_t open = std::max<std::size_t>(accounts_.load(std::memory_order_relaxed), 1);
   return heldByOne <= bound_ / open;
 }
@@ -49,7 +54,11 @@ void QVIntakeBudget::Account::add(std::size_t bytes) noexcept {
 
 void QVIntakeBudget::Account::remove(std::size_t bytes) noexcept {
   const std::size_t total = budget_->total_.fetch_sub(bytes) - bytes;
-  if (total <= budget_->bound_ && budget_->someoneWaits_.load()) budget_->wakeUp();
+  const std::size_t ceiling = kCeilingFactor * budget_->bound_;
+  const bool fellBelowCeiling = total <= ceiling && total + bytes > ceiling;
+  if ((total <= budget_->bound_ || fellBelowCeiling) && budget_->someoneWaits_.load()) {
+    budget_->wakeUp();
+  }
 
   // Until here our bytes have kept the account alive; after this another thread may free it.
   std::size_t state = state_.load(std::memory_order_relaxed);

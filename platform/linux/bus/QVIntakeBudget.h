@@ -15,7 +15,9 @@
 // Above the bound a connection that holds more than its fair share (the bound divided by the number
 // of open connections) is not read any further, so the heaviest stop first; one that holds less
 // goes on, so that a peer that fills the bound and lingers starves nobody but itself and its like.
-// The total thus stays below twice the bound, give or take one message each way.
+// What open connections hold thus stays near twice the bound. What connections left behind that
+// have closed belongs to nobody who could be held back: above four times the bound no connection is
+// read, until it has drained.
 //
 // Threads: charges from any thread, a few atomic additions each; the rest on the IPC thread.
 // Lifetime: accounts outlive their connection until everything charged to them is gone, and keep
@@ -43,6 +45,7 @@ class QVIntakeBudget : public std::enable_shared_from_this<QVIntakeBudget> {
 
   // Bytes. Enough for 100,000 messages of usual size, small enough for a small machine.
   static constexpr std::size_t kBound = std::size_t{64} << 20;
+  static constexpr std::size_t kCeilingFactor = 4;
 
  private:
   bool isWithin(std::size_t heldByOne) const noexcept;

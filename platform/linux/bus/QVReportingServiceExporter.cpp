@@ -1,6 +1,7 @@
 #include "platform/linux/bus/QVReportingServiceExporter.h"
 
 #include "platform/QVText.h"
+#include "platform/linux/bus/QVBusPendingReply.h"
 
 #include <algorithm>
 #include <cstdint>
@@ -13,8 +14,12 @@ namespace {
 
 constexpr int64_t kReportingSwitchedOffCode = 1;
 
-Reply<bool> booleanReply(const QVBusReply& reply) {
-  return [reply](bool value) { reply.giveBoolean(value); };
+// Reporter IDs that one message may list: as many as one connection may have sessions. Each is a
+// send of its own, all of them in one turn of the server queue.
+constexpr std::size_t kMostReporterIDs = 65'536;
+
+Reply<bool> booleanReply(const QVBusCall& call) {
+  return [reply = QVBusPendingReply(call)](bool value) { reply->giveBoolean(value); };
 }
 
 // The service type is 16 bits wide by contract, which the value itself does not tell.
@@ -85,17 +90,18 @@ const char* QVReportingServiceExporter::perform(QVReportingServiceOperation oper
       return setServiceType(call);
     case Operation::getAllReporters:
       if (const char* reason = failureOf(call.message.bodyReader())) return reason;
-      call.object->getAllReporters([reply = call.reply](const std::vector<int64_t>& reporterIDs) {
-        reply.give("ax", [&reporterIDs](QVBusWriter& writer) {
-          const auto array = writer.beginArray(8);
-          for (const int64_t reporterID : reporterIDs) writer.writeNumber(reporterID);
-          writer.endArray(array);
-        });
-      });
+      call.object->getAllReporters(
+          [reply = QVBusPendingReply(call)](const std::vector<int64_t>& reporterIDs) {
+            reply->give("ax", [&reporterIDs](QVBusWriter& writer) {
+              const auto array = writer.beginArray(8);
+              for (const int64_t reporterID : reporterIDs) writer.writeNumber(reporterID);
+              writer.endArray(array);
+            });
+          });
       return nullptr;
     case Operation::killService:
       if (const char* reason = failureOf(call.message.bodyReader())) return reason;
-      call.object->killService(booleanReply(call.reply));
+      call.object->killService(booleanReply(call));
       return nullptr;
     default:
       return performOnReporter(operation, call);
@@ -111,26 +117,27 @@ const char* QVReportingServiceExporter::performOnReporter(QVReportingServiceOper
   using Operation = QVReportingServiceOperation;
   switch (operation) {
     case Operation::createReportingSession:
-      call.object->createReportingSession(reporterID, booleanReply(call.reply));
+      call.object->createReportingSession(reporterID, booleanReply(call));
       break;
     case Operation::startReportingSessionForID:
-      call.object->startReportingSessionForID(reporterID, booleanReply(call.reply));
+      call.object->startReportingSessionForID(reporterID, booleanReply(call));
       break;
     case Operation::stopReportingSessionForID:
-      call.object->stopReportingSessionForID(reporterID, booleanReply(call.reply));
+      call.object->stopReportingSessionForID(reporterID, booleanReply(call));
       break;
     case Operation::destroyReportingSession:
-      call.object->destroyReportingSession(reporterID, booleanReply(call.reply));
+      call.object->destroyReportingSession(reporterID, booleanReply(call));
       break;
     case Operation::getServiceNameForReporterID:
-      call.object->getServiceNameForReporterID(reporterID, [reply =
-                                                                call.reply](uint16_t serviceType) {
-        reply.give("q", [serviceType](QVBusWriter& writer) { writer.writeNumber(serviceType); });
+      call.object->getServiceNameForReporterID(reporterID, [reply = QVBusPendingReply(call)](
+                                                               uint16_t serviceType) {
+        reply->give("q", [serviceType](QVBusWriter& writer) { writer.writeNumber(serviceType); });
       });
       break;
     case Operation::reporterIDValid:
-      call.object->reporterID(reporterID, [reply = call.reply](const QVDictionary& validity) {
-        reply.give("a{sv}", [&validity](QVBusWriter& writer) { writeValidity(writer, validity); });
+      call.object->reporterID(reporterID, [reply = QVBusPendingReply(call)](
+                                              const QVDictionary& validity) {
+        reply->give("a{sv}", [&validity](QVBusWriter& writer) { writeValidity(writer, validity); });
       });
       break;
     default:
@@ -144,7 +151,7 @@ const char* QVReportingServiceExporter::setServiceType(const QVBusCall& call) {
   const auto serviceType = reader.readNumber<uint16_t>();
   const auto reporterID = reader.readNumber<int64_t>();
   if (const char* reason = failureOf(reader)) return reason;
-  call.object->setServiceType(serviceType, reporterID, booleanReply(call.reply));
+  call.object->setServiceType(serviceType, reporterID, booleanReply(call));
   return nullptr;
 }
 
@@ -153,11 +160,11 @@ const char* QVReportingServiceExporter::setConfiguration(const QVBusCall& call) 
   auto configuration = decoder_.readDictionary(reader, call.charge);
   const auto reporterID = reader.readNumber<int64_t>();
   if (const char* reason = failureOf(reader)) return reason;
-  if (decoder_.refused()) {
-    call.reply.giveError(kBusErrorInvalidArgs, "a configuration holds no file descriptors");
+  if (const char* refusal = decoder_.refusal()) {
+    call.reply.giveError(kBusErrorInvalidArgs, refusal);
     return nullptr;
   }
-  call.object->setConfiguration(std::move(configuration), reporterID, booleanReply(call.reply));
+  call.object->setConfiguration(std::move(configuration), reporterID, booleanReply(call));
   return nullptr;
 }
 
@@ -179,17 +186,22 @@ const char* QVReportingServiceExporter::sendMessage(const QVBusCall& call) {
                          "SendMessage to every session takes no list of reporter IDs");
     return nullptr;
   }
-  if (decoder_.refused()) {
-    call.reply.giveError(kBusErrorInvalidArgs, "a message holds no file descriptors");
+  if (const char* refusal = decoder_.refusal()) {
+    call.reply.giveError(kBusErrorInvalidArgs, refusal);
     return nullptr;
   }
+  if (reporterIDs->size() > kMostReporterIDs) {
+    call.reply.giveError(kBusErrorInvalidArgs, "SendMessage takes no more than 65536 reporter IDs");
+    return nullptr;
+  }
+  QVBusPendingReply pending(call, reporterIDs->size() * sizeof(int64_t));
   if (everySession) reporterIDs.reset();
   call.object->sendMessage(std::move(message), category, type, std::move(reporterIDs),
-                           [reply = call.reply](const std::optional<QVError>& error) {
+                           [reply = std::move(pending)](const std::optional<QVError>& error) {
                              if (error.has_value()) {
-                               giveErrorObject(reply, *error);
+                               giveErrorObject(*reply, *error);
                              } else {
-                               reply.giveNothing();
+                               reply->giveNothing();
                              }
                            });
   return nullptr;

@@ -377,6 +377,23 @@ TEST_F(QVBusConnectionTest, StopsReadingAPeerThatDoesNotReadItsAnswers) {
   EXPECT_GT(received.size(), std::size_t{1} << 20);
 }
 
+TEST_F(QVBusConnectionTest, GivesUpAPeerForWhichTooManyAnswersWait) {
+  connect();
+  for (int64_t reporterID = 0; reporterID < 65'536; ++reporterID) {
+    service().sessions[reporterID] = {};
+  }
+  // Half a MiB each; all of them are taken in with one read.
+  std::string batch;
+  for (int i = 0; i < 40; ++i) batch += QVTestMessage{.member = "GetAllReporters"}.bytes();
+  peer().send(batch);
+  run();
+  EXPECT_EQ(server_->connections(), 0U);
+  EXPECT_EQ(journal_[journal_.size() - 2], "1 interruption");
+  EXPECT_EQ(journal_.back(), "1 invalidation");
+  ASSERT_EQ(logged().size(), 1U);
+  EXPECT_THAT(logged().front(), testing::HasSubstr("more than 16 MiB of answers wait"));
+}
+
 TEST_F(QVBusConnectionTest, EndsAConnectionThatIsNotReadWhenItsPeerGoes) {
   connect();
   std::string batch;

@@ -28,7 +28,7 @@ QVDictionary decode(char order, Entries&& entries, QVMemoryCharge* charge = null
   const auto dictionary = decoder.readDictionary(reader, charge);
   EXPECT_TRUE(reader.ok()) << reader.failure();
   EXPECT_TRUE(reader.atEnd());
-  if (refused != nullptr) *refused = decoder.refused();
+  if (refused != nullptr) *refused = decoder.refusal() != nullptr;
   return dictionary;
 }
 
@@ -161,9 +161,9 @@ TEST(QVBusValueDecoder, ForgetsARefusalWithTheNextDictionary) {
   good.array(8, [](QVTestWire& wire) { wire.entry("k", "u").u32(0); });
   QVBusReader badReader(bad.bytes, false), goodReader(good.bytes, false);
   decoder.readDictionary(badReader, nullptr);
-  EXPECT_TRUE(decoder.refused());
+  EXPECT_NE(decoder.refusal(), nullptr);
   EXPECT_EQ(decoder.readDictionary(goodReader, nullptr), (QVDictionary{{"k", 0}}));
-  EXPECT_FALSE(decoder.refused());
+  EXPECT_EQ(decoder.refusal(), nullptr);
 }
 
 TEST(QVBusValueDecoder, OwnsWhatItMadeAndChargesIt) {

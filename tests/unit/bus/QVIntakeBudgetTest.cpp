@@ -86,7 +86,7 @@ TEST_F(QVIntakeBudgetTest, WakesWhoWaitsWhenOthersDrain) {
 TEST_F(QVIntakeBudgetTest, WakesWhoIsBackAtItsShareWhileOthersStayHeavy) {
   const auto lingering = budget_->open();
   const auto draining = budget_->open();
-  lingering->add(5000);
+  lingering->add(3000);
   draining->add(600);
   EXPECT_FALSE(budget_->admits(*lingering));
   EXPECT_FALSE(budget_->admits(*draining));
@@ -98,8 +98,37 @@ TEST_F(QVIntakeBudgetTest, WakesWhoIsBackAtItsShareWhileOthersStayHeavy) {
   EXPECT_FALSE(budget_->admits(*lingering));
   draining->remove(500);
   EXPECT_EQ(wakes_, 1) << "it does not wait any more";
-  lingering->remove(5000);
+  lingering->remove(3000);
   EXPECT_EQ(wakes_, 2);
+}
+
+TEST_F(QVIntakeBudgetTest, HoldsEveryoneBackWhileClosedConnectionsLeftTooMuchBehind) {
+  QVMemoryCharge* leftBehind = nullptr;
+  {
+    const auto closing = budget_->open();
+    leftBehind = closing.get();
+    leftBehind->add(QVIntakeBudget::kCeilingFactor * budget_->bound() + 1);
+  }
+  const auto newcomer = budget_->open();
+  EXPECT_FALSE(budget_->admits(*newcomer)) << "though it holds nothing itself";
+  leftBehind->remove(1);
+  EXPECT_EQ(wakes_, 1);
+  EXPECT_TRUE(budget_->admits(*newcomer));
+  leftBehind->remove(QVIntakeBudget::kCeilingFactor * budget_->bound());
+}
+
+TEST_F(QVIntakeBudgetTest, WakesWhoWaitsWhenOthersClose) {
+  const auto lingering = budget_->open();
+  auto idle = budget_->open();
+  const auto waiting = budget_->open();
+  lingering->add(3000);
+  waiting->add(400);
+  EXPECT_FALSE(budget_->admits(*waiting)) << "a third of the bound is its share";
+  idle.reset();
+  EXPECT_EQ(wakes_, 1);
+  EXPECT_TRUE(budget_->admits(*waiting)) << "now it is half";
+  waiting->remove(400);
+  lingering->remove(3000);
 }
 
 TEST_F(QVIntakeBudgetTest, KeepsAnAccountAsLongAsItIsCharged) {

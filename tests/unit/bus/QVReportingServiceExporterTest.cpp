@@ -125,13 +125,43 @@ TEST_F(QVReportingServiceExporterTest, RefusesAListForEverySession) {
 TEST_F(QVReportingServiceExporterTest, RefusesFileDescriptors) {
   const auto answer = call(sendMessage(false, {5}, "h"));
   EXPECT_EQ(answer.error, kInvalidArgs);
-  EXPECT_EQ(answer.text(), "a message holds no file descriptors");
+  EXPECT_EQ(answer.text(), "file descriptors are not taken");
   QVTestWire body;
   body.array(8, [](QVTestWire& wire) { wire.entry("k", "h").u32(0); }).i64(5);
   EXPECT_EQ(call({.member = "SetConfiguration", .signature = "a{sv}x", .body = body.bytes}).error,
             kInvalidArgs);
   EXPECT_TRUE(service().calls.empty());
   EXPECT_EQ(server_->budget().total(), 0U);
+}
+
+TEST_F(QVReportingServiceExporterTest, RefusesMoreReporterIDsThanAConnectionMayHaveSessions) {
+  EXPECT_EQ(call(sendMessage(false, std::vector<int64_t>(65'536, 5))).error, "");
+  EXPECT_EQ(service().calls.size(), 1U);
+  const auto answer = call(sendMessage(false, std::vector<int64_t>(65'537, 5)));
+  EXPECT_EQ(answer.error, kInvalidArgs);
+  EXPECT_EQ(answer.text(), "SendMessage takes no more than 65536 reporter IDs");
+  EXPECT_EQ(service().calls.size(), 1U);
+}
+
+TEST_F(QVReportingServiceExporterTest, RefusesMoreValuesThanMemoryIsToHold) {
+  const auto bytes = [](std::size_t count) {
+    QVTestWire body;
+    body.array(8, [count](QVTestWire& wire) {
+      wire.entry("k", "ay").array(1, [count](QVTestWire& items) {
+        for (std::size_t i = 0; i < count; ++i) items.u8(1);
+      });
+    });
+    return body.i64(5).bytes;
+  };
+  // The entry itself is a value, too.
+  constexpr std::size_t kMost = std::size_t{512} << 10;
+  EXPECT_EQ(
+      call({.member = "SetConfiguration", .signature = "a{sv}x", .body = bytes(kMost - 1)}).error,
+      "");
+  const auto answer =
+      call({.member = "SetConfiguration", .signature = "a{sv}x", .body = bytes(kMost)});
+  EXPECT_EQ(answer.error, kInvalidArgs);
+  EXPECT_EQ(answer.text(), "no more than 524288 values are taken");
 }
 
 TEST_F(QVReportingServiceExporterTest, TurnsAnErrorObjectIntoAnError) {

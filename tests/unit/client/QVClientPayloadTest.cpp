@@ -29,7 +29,7 @@ QVDictionary decoded(const QVClientPayload& payload) {
   QVDictionary dictionary = decoder.readDictionary(reader, nullptr);
   EXPECT_TRUE(reader.ok()) << reader.failure();
   EXPECT_TRUE(reader.atEnd());
-  EXPECT_FALSE(decoder.refused());
+  EXPECT_EQ(decoder.refusal(), nullptr);
   return dictionary;
 }
 

@@ -168,7 +168,7 @@ TEST(QVDictionary, ChargesItsBytesUntilTheLastHandleGoes) {
   EXPECT_EQ(charge.held(), 0u);
 }
 
-TEST(QVDictionary, ChargesAMergeAsItsBase) {
+TEST(QVDictionary, ChargesAMergeAsItsBaseElseAsWhatIsAdded) {
   Charge charge;
   {
     std::vector<QVDictionaryEntry> entries{{"a", "text"}};
@@ -176,7 +176,8 @@ TEST(QVDictionary, ChargesAMergeAsItsBase) {
     const QVDictionary merged = base.merging({{"b", "more"}});
     EXPECT_EQ(merged.charge(), &charge);
     EXPECT_EQ(charge.held(), base.footprint() + merged.footprint());
-    EXPECT_EQ((QVDictionary{{"b", 1}}).merging(base).charge(), nullptr);
+    EXPECT_EQ((QVDictionary{{"b", 1}}).merging(base).charge(), &charge);
+    EXPECT_EQ((QVDictionary{{"b", 1}}).merging({{"c", 1}}).charge(), nullptr);
   }
   EXPECT_EQ(charge.held(), 0u);
 }
