@@ -119,7 +119,7 @@ void QVBusConnection::onReadable() {
         invalidate();
         break;
     }
-    flush();
+    writeAnswers();
   }
   continueReading();
 }
@@ -205,12 +205,16 @@ void QVBusConnection::readToTheEnd() {
 // ---- Writing
 
 void QVBusConnection::onWake() {
+  writeAnswers();
+  continueReading();
+}
+
+void QVBusConnection::writeAnswers() {
   if (state_ != State::closed && outbox_->hasOverflowed()) {
     violated("more than 16 MiB of answers wait for a peer that does not read them");
-    return;
+  } else {
+    flush();
   }
-  flush();
-  continueReading();
 }
 
 void QVBusConnection::flush() {

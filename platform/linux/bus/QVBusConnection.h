@@ -69,6 +69,7 @@ class QVBusConnection final : public QVIPCConnection,
   void violated(const char* reason);
   void close();
   void end();
+  void writeAnswers();
   void flush();
   void chargeHeldBytes();
   std::size_t unwritten() { return outbox_->size() + sending_.size() - sent_; }
