@@ -9,10 +9,9 @@
 struct QVServiceDirectories {
   std::filesystem::path runtime;
   std::filesystem::path state;
-  std::filesystem::path logs;
   std::filesystem::path configuration;
 
-  // From RUNTIME_DIRECTORY, STATE_DIRECTORY, LOGS_DIRECTORY and CONFIGURATION_DIRECTORY. A manager
+  // From RUNTIME_DIRECTORY, STATE_DIRECTORY and CONFIGURATION_DIRECTORY. A manager
   // that was asked for several directories lists them with ":" between; the first is meant.
   static QVServiceDirectories fromEnvironment();
 
