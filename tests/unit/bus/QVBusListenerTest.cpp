@@ -255,6 +255,10 @@ TEST_F(QVBusListenerTest, ClosesWhatTheDelegateDoesNotAccept) {
 }
 
 TEST_F(QVBusListenerTest, LetsClientsWaitWhileDescriptorsAreUsedUp) {
+#if defined(__SANITIZE_ADDRESS__)
+  GTEST_SKIP() << "the sanitizer opens a pipe to look at an object and calls it broken where it "
+                  "gets none";
+#endif
   serve();
   Client first, second;
   ASSERT_TRUE(first.connect(path_));
