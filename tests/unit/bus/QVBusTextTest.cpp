@@ -136,10 +136,10 @@ TEST(QVBusSignature, RefusesWhatBreaksTheGrammar) {
 
 TEST(QVBusSignature, HoldsToTheLimitsOfDepthAndLength) {
   QVBusSignature signature;
-  EXPECT_TRUE(signature.parse(std::string(32, 'a') + "i"));
-  EXPECT_FALSE(signature.parse(std::string(33, 'a') + "i"));
-  EXPECT_TRUE(signature.parse(std::string(32, '(') + "i" + std::string(32, ')')));
-  EXPECT_FALSE(signature.parse(std::string(33, '(') + "i" + std::string(33, ')')));
+  EXPECT_TRUE(signature.parse(std::string(32, 'a').append("i")));
+  EXPECT_FALSE(signature.parse(std::string(33, 'a').append("i")));
+  EXPECT_TRUE(signature.parse(std::string(32, '(').append("i").append(32, ')')));
+  EXPECT_FALSE(signature.parse(std::string(33, '(').append("i").append(33, ')')));
   EXPECT_TRUE(signature.parse(std::string(255, 'i')));
   EXPECT_FALSE(signature.parse(std::string(256, 'i')));
   // One after the other is not one in the other.
