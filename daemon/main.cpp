@@ -67,9 +67,12 @@ int giveUp(QVLog& log, const std::string& reason) {
 
 // What the process is like, whoever started it.
 void prepareProcess() {
+  // There is one thread so far.
+  // NOLINTBEGIN(concurrency-mt-unsafe)
   ::mallopt(M_MMAP_THRESHOLD, kMappedAllocationBytes);
   // What applications report is for the service's user and group alone.
   ::umask(S_IRWXO);
+  // NOLINTEND(concurrency-mt-unsafe)
   // Until the listener handles them: an end that is asked for while the service starts is in good
   // order, too. Threads inherit it, so the signals come to this one.
   sigset_t ends;

@@ -78,7 +78,7 @@ class Store {
   void flush() {
     std::promise<bool> done;
     session_->flushMessagesWithCompletion(
-        [&done](std::optional<QVError> error) { done.set_value(!error.has_value()); });
+        [&done](const std::optional<QVError>& error) { done.set_value(!error.has_value()); });
     if (!done.get_future().get()) std::abort();
   }
   // The writer's thread tells its time in a payload callback.

@@ -4,6 +4,6 @@
 #include <iostream>
 
 void QVFakeAbort(const std::string& message) {
-  std::cerr << message << std::endl;
+  std::cerr << message << '\n' << std::flush;
   std::abort();
 }

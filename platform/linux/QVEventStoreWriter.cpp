@@ -244,8 +244,10 @@ int QVEventStoreWriter::writeTransaction(std::size_t& batches) {
   if (result == SQLITE_OK) {
     if (tooLarge_ > 0) losses_[kLossTooLarge] += tooLarge_;
     result = tables_.commit(losses_, now());
-    if (result != SQLITE_OK && tooLarge_ > 0 && (losses_[kLossTooLarge] -= tooLarge_) == 0) {
-      losses_.erase(kLossTooLarge);
+    if (result != SQLITE_OK && tooLarge_ > 0) {
+      int64_t& counted = losses_[kLossTooLarge];
+      counted -= tooLarge_;
+      if (counted == 0) losses_.erase(kLossTooLarge);
     }
   }
   if (result != SQLITE_OK) {

@@ -14,14 +14,14 @@ namespace {
 // Counts the copies of itself that are alive; `Padding` decides whether it fits in place.
 template <std::size_t Padding>
 struct Counted {
-  explicit Counted(int& alive) : alive_(&alive) { ++alive; }
-  Counted(const Counted& other) : alive_(other.alive_) { ++*alive_; }
-  Counted(Counted&& other) noexcept : alive_(other.alive_) { ++*alive_; }
-  ~Counted() { --*alive_; }
+  explicit Counted(int& alive) : aliveCount(&alive) { ++alive; }
+  Counted(const Counted& other) : aliveCount(other.aliveCount) { ++*aliveCount; }
+  Counted(Counted&& other) noexcept : aliveCount(other.aliveCount) { ++*aliveCount; }
+  ~Counted() { --*aliveCount; }
   Counted& operator=(const Counted&) = delete;
 
-  int* alive_;
-  std::array<char, Padding> padding_{};
+  int* aliveCount;
+  std::array<char, Padding> padding{};
 };
 
 using Small = Counted<1>;
@@ -43,7 +43,7 @@ TYPED_TEST_SUITE(QVFunctionCaptureTest, Captures);
 TYPED_TEST(QVFunctionCaptureTest, DestroysWhatItHoldsOnce) {
   int alive = 0;
   {
-    QVFunction<int()> function = [counted = TypeParam(alive)] { return *counted.alive_; };
+    QVFunction<int()> function = [counted = TypeParam(alive)] { return *counted.aliveCount; };
     EXPECT_EQ(alive, 1);
     EXPECT_EQ(function(), 1);
   }
@@ -52,22 +52,22 @@ TYPED_TEST(QVFunctionCaptureTest, DestroysWhatItHoldsOnce) {
 
 TYPED_TEST(QVFunctionCaptureTest, MovesWithoutLeavingACopy) {
   int alive = 0;
-  QVFunction<int()> first = [counted = TypeParam(alive)] { return *counted.alive_; };
+  QVFunction<int()> first = [counted = TypeParam(alive)] { return *counted.aliveCount; };
   QVFunction<int()> second = std::move(first);
   EXPECT_EQ(alive, 1);
-  EXPECT_FALSE(first);
+  EXPECT_FALSE(first);  // NOLINT(bugprone-use-after-move): what is left is the point
   EXPECT_EQ(second(), 1);
   first = std::move(second);
   EXPECT_EQ(alive, 1);
-  EXPECT_FALSE(second);
+  EXPECT_FALSE(second);  // NOLINT(bugprone-use-after-move)
   EXPECT_EQ(first(), 1);
 }
 
 TYPED_TEST(QVFunctionCaptureTest, DestroysWhatAnAssignmentReplaces) {
   int replaced = 0;
   int kept = 0;
-  QVFunction<int()> function = [counted = TypeParam(replaced)] { return *counted.alive_; };
-  function = [counted = TypeParam(kept)] { return 10 + *counted.alive_; };
+  QVFunction<int()> function = [counted = TypeParam(replaced)] { return *counted.aliveCount; };
+  function = [counted = TypeParam(kept)] { return 10 + *counted.aliveCount; };
   EXPECT_EQ(replaced, 0);
   EXPECT_EQ(kept, 1);
   EXPECT_EQ(function(), 11);
@@ -78,7 +78,7 @@ TYPED_TEST(QVFunctionCaptureTest, DestroysWhatAnAssignmentReplaces) {
 
 TYPED_TEST(QVFunctionCaptureTest, SurvivesAnAssignmentToItself) {
   int alive = 0;
-  QVFunction<int()> function = [counted = TypeParam(alive)] { return *counted.alive_; };
+  QVFunction<int()> function = [counted = TypeParam(alive)] { return *counted.aliveCount; };
   QVFunction<int()>& itself = function;
   function = std::move(itself);
   EXPECT_EQ(alive, 1);
@@ -151,7 +151,7 @@ TEST(QVFunction, ForwardsAnException) {
 
 TEST(QVFunction, HoldsAnotherFunction) {
   int alive = 0;
-  QVFunction<int()> inner = [counted = Small(alive)] { return *counted.alive_; };
+  QVFunction<int()> inner = [counted = Small(alive)] { return *counted.aliveCount; };
   QVFunction<int(), 112> outer = [inner = std::move(inner)]() mutable { return inner(); };
   EXPECT_EQ(outer(), 1);
   outer = nullptr;

@@ -127,7 +127,6 @@ TEST_F(QVElasticWorkerPoolTest, HasNoMoreWorkersThanItsLimit) {
   makePool({.concurrency = 2, .workers = 3, .rest = 5s});
   std::mutex mutex;
   std::set<std::thread::id> threads;
-  std::atomic<bool> maySignal{false};
   std::atomic<int> early{0};
   QVEvent threeWait;
   for (int i = 0; i < kTasks; ++i) {
