@@ -87,10 +87,13 @@ TYPED_TEST(QVConditionsContract, EndsOneWaitPerSignal) {
   this->startWait(1min, end);
   this->startWait(1min, end);
   int endedBeforeSecondSignal = -1;
-  this->whenWaiting(2, [this] { this->condition_->signal(); });
-  this->whenWaiting(1, [&] {
-    endedBeforeSecondSignal = this->signalledCount_;
+  this->whenWaiting(2, [&] {
     this->condition_->signal();
+    // Only now: before both wait, one that waits is not the one that is left.
+    this->whenWaiting(1, [&] {
+      endedBeforeSecondSignal = this->signalledCount_;
+      this->condition_->signal();
+    });
   });
   ASSERT_TRUE(this->harness_.runUntil(end));
   EXPECT_LE(endedBeforeSecondSignal, 1);
