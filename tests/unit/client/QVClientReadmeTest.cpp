@@ -1,5 +1,6 @@
 // The example that people read is the one that is compiled.
 
+#include <filesystem>
 #include <fstream>
 #include <sstream>
 #include <string>
@@ -9,7 +10,7 @@
 namespace {
 
 std::string contentsOf(const std::string& path) {
-  std::ifstream file(std::string(QV_SOURCE_DIRECTORY) + "/" + path);
+  std::ifstream file(std::filesystem::path(QV_SOURCE_DIRECTORY) / path);
   EXPECT_TRUE(file) << path;
   std::ostringstream contents;
   contents << file.rdbuf();
