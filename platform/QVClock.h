@@ -10,4 +10,6 @@ class QVClock {
  public:
   virtual ~QVClock() = default;
   virtual QVDate currentDate() const = 0;
+  // How far local time is ahead of UTC at that moment.
+  virtual std::chrono::seconds offsetFromUTC(QVDate date) const = 0;
 };

@@ -5,12 +5,17 @@
 #include "platform/QVCondition.h"
 #include "platform/QVCountwise.h"
 #include "platform/QVDeviceInformation.h"
+#include "platform/QVFileSystem.h"
 #include "platform/QVIPC.h"
+#include "platform/QVJSONOutput.h"
 #include "platform/QVJoulewell.h"
 #include "platform/QVLog.h"
+#include "platform/QVNotifications.h"
+#include "platform/QVOrientation.h"
 #include "platform/QVPreferences.h"
 #include "platform/QVProcess.h"
 #include "platform/QVRandom.h"
+#include "platform/QVTally.h"
 #include "platform/QVTracePoints.h"
 #include "platform/QVWorkQueue.h"
 
@@ -34,11 +39,16 @@ class QVPlatform {
   std::unique_ptr<QVTracePoints> tracePoints;
   std::unique_ptr<QVPreferences> preferences;
   std::unique_ptr<QVDeviceInformation> deviceInformation;
+  std::unique_ptr<QVFileSystem> fileSystem;
+  std::unique_ptr<QVJSONOutput> jsonOutput;
   std::unique_ptr<QVConditions> conditions;
   std::unique_ptr<QVWorkQueues> queues;
   std::unique_ptr<QVBeacon> beacon;
   std::unique_ptr<QVCountwise> countwise;
   std::unique_ptr<QVJoulewell> joulewell;
+  std::unique_ptr<QVTally> tally;
+  std::unique_ptr<QVOrientation> orientation;
+  std::unique_ptr<QVNotifications> notifications;
   std::unique_ptr<QVIPCListener> listener;
 
   // Makes `platform` the one that shared() answers, in place of an earlier one; null takes it

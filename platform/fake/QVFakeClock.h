@@ -15,6 +15,12 @@ class QVFakeClock final : public QVClock {
 
   QVDate currentDate() const override { return QVDate{QVDate::duration{wall_.load()}}; }
 
+  std::chrono::seconds offsetFromUTC(QVDate) const override {
+    return std::chrono::seconds{offset_.load()};
+  }
+  // The same at all dates; 0 until set.
+  void setOffsetFromUTC(std::chrono::seconds offset) { offset_.store(offset.count()); }
+
   // Changes the date as a user or a time server would; steady time does not notice.
   void setCurrentDate(QVDate date) { wall_.store(date.time_since_epoch().count()); }
 
@@ -35,4 +41,5 @@ class QVFakeClock final : public QVClock {
  private:
   std::atomic<QVDate::rep> wall_{kStart.time_since_epoch().count()};
   std::atomic<QVDuration::rep> steady_{0};
+  std::atomic<std::chrono::seconds::rep> offset_{0};
 };

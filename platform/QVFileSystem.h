@@ -1,0 +1,40 @@
+#pragma once
+
+#include "platform/QVError.h"
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+
+// Writes one file so that readers see the old contents or the new ones, never a part: bytes go to
+// a temporary file in the same directory, which takes the name's place when all is on the disk.
+// Dropped before that, it leaves nothing behind. Extra memory: one buffer of fixed size.
+//
+// Threads: one at a time. Blocks on the disk.
+class QVAtomicFile {
+ public:
+  virtual ~QVAtomicFile() = default;
+  // Appends. After the first failure bytes are dropped, and the failure is kept for commit().
+  virtual void write(std::string_view bytes) = 0;
+  // Syncs, moves into place and ends the writing; answers what went wrong, at any step so far.
+  [[nodiscard]] virtual std::optional<QVError> commit() = 0;
+};
+
+// The part of the file system that the core writes to.
+//
+// Threads: any, at once. Blocks on the disk. Failures are answered, with the path in their
+// description; nothing is logged.
+class QVFileSystem {
+ public:
+  virtual ~QVFileSystem() = default;
+  // The directory under which diagnostic logs lie. Need not exist.
+  virtual std::string diagnosticLogRoot() const = 0;
+  // Makes the directory and those above it that are missing, each with exactly these permissions
+  // (the process's umask does not count); existing ones are left alone.
+  [[nodiscard]] virtual std::optional<QVError> createDirectory(const std::string& path,
+                                                               uint32_t permissions) = 0;
+  // Begins a file; what cannot be opened fails in commit().
+  virtual std::unique_ptr<QVAtomicFile> makeAtomicFile(const std::string& path) = 0;
+};
