@@ -26,13 +26,17 @@ QVFakePlatform::QVFakePlatform()
       beacon_(fill<QVFakeBeacon>(platform_.beacon)),
       countwise_(fill<QVFakeCountwise>(platform_.countwise)),
       joulewell_(fill<QVFakeJoulewell>(platform_.joulewell)),
+      tally_(fill<QVFakeTally>(platform_.tally)),
+      orientation_(fill<QVFakeOrientation>(platform_.orientation)),
+      notifications_(fill<QVFakeNotifications>(platform_.notifications)),
       listener_(fill<QVFakeIPCListener>(platform_.listener)) {
   QVPlatform::install(&platform_);
 }
 
 QVFakePlatform::~QVFakePlatform() {
-  // What connections and items capture may log, enqueue and send on its way out.
+  // What connections, callbacks and items capture may log, enqueue and send on its way out.
   listener_->abandonConnections();
+  orientation_->abandonRegistrations();
   queues_->discard();
   QVPlatform::install(nullptr);
 }

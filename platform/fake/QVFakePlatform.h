@@ -9,15 +9,19 @@
 #include "platform/fake/QVFakeIPCListener.h"
 #include "platform/fake/QVFakeJoulewell.h"
 #include "platform/fake/QVFakeLog.h"
+#include "platform/fake/QVFakeNotifications.h"
+#include "platform/fake/QVFakeOrientation.h"
 #include "platform/fake/QVFakePreferences.h"
 #include "platform/fake/QVFakeProcess.h"
 #include "platform/fake/QVFakeRandom.h"
+#include "platform/fake/QVFakeTally.h"
 #include "platform/fake/QVFakeTracePoints.h"
 #include "platform/fake/QVFakeWorkQueues.h"
 
 // A platform of fakes, installed while it exists. Queues, conditions and clock share one virtual
-// time. A test makes it first and drops it last: work that is still enqueued, and what the open
-// connections hold, is destroyed with it, while the platform can still be asked.
+// time. A test makes it first and drops it last: work that is still enqueued, and what open
+// connections and orientation callbacks hold, is destroyed with it, while the platform can still be
+// asked.
 //
 // Threads: made and destroyed while no other thread uses the core.
 class QVFakePlatform {
@@ -39,6 +43,9 @@ class QVFakePlatform {
   QVFakeBeacon& beacon() { return *beacon_; }
   QVFakeCountwise& countwise() { return *countwise_; }
   QVFakeJoulewell& joulewell() { return *joulewell_; }
+  QVFakeTally& tally() { return *tally_; }
+  QVFakeOrientation& orientation() { return *orientation_; }
+  QVFakeNotifications& notifications() { return *notifications_; }
   QVFakeIPCListener& listener() { return *listener_; }
 
  private:
@@ -56,5 +63,8 @@ class QVFakePlatform {
   QVFakeBeacon* beacon_;
   QVFakeCountwise* countwise_;
   QVFakeJoulewell* joulewell_;
+  QVFakeTally* tally_;
+  QVFakeOrientation* orientation_;
+  QVFakeNotifications* notifications_;
   QVFakeIPCListener* listener_;
 };

@@ -67,6 +67,11 @@ bool QVEventStoreQueue::takeWaiting(std::deque<QVEventRows>& batches) {
   return true;
 }
 
+bool QVEventStoreQueue::isEmpty() {
+  const QVMutexLock lock(mutex_);
+  return waitingRows_ == 0;
+}
+
 void QVEventStoreQueue::recycle(QVEventRows&& batch) {
   bool fits = true;
   batch.clear();

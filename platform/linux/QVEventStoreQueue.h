@@ -69,6 +69,7 @@ class QVEventStoreQueue {
   std::vector<Search> takeSearches();
   // Appends what waits to `batches`, due or not; false where nothing does.
   bool takeWaiting(std::deque<QVEventRows>& batches);
+  bool isEmpty();
   // Gives a batch's memory back for later ones.
   void recycle(QVEventRows&& batch);
 

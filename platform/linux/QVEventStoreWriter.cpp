@@ -13,6 +13,7 @@
 #include <utility>
 
 #include <fcntl.h>
+#include <malloc.h>
 #include <sqlite3.h>
 #include <unistd.h>
 
@@ -29,6 +30,12 @@ constexpr int64_t kLargestLimit = int64_t{1024} * 1024;
 constexpr std::chrono::seconds kSetAsideInterval{60};
 
 constexpr const char* kBackend = "store";
+
+// Payloads in flight, and what a session collected until it stopped, leave holes in the heap that
+// the allocator keeps. After so many bytes of payload text, the next moment without work is used to
+// give the free pages back; after fewer once a session has ended, as nothing may follow.
+constexpr uint64_t kTextBytesBetweenTrims = uint64_t{4} * 1024 * 1024;
+constexpr uint64_t kTextBytesBeforeLastTrim = uint64_t{128} * 1024;
 
 const char* causeOf(int result) {
   switch (result & 0xFF) {
@@ -103,8 +110,17 @@ void QVEventStoreWriter::run() {
     for (QVEventRows& batch : work.batches) pending_.push_back(std::move(batch));
     if (stop) retryAt_ = {};
     store();
+    giveMemoryBack();
   }
   closeStore();
+}
+
+void QVEventStoreWriter::giveMemoryBack() {
+  const uint64_t enough = sessionEnded_ ? kTextBytesBeforeLastTrim : kTextBytesBetweenTrims;
+  if (tables_.textBytes() < enough || !pending_.empty() || !queue_.isEmpty()) return;
+  sessionEnded_ = false;
+  tables_.giveMemoryBack();
+  ::malloc_trim(0);
 }
 
 void QVEventStoreWriter::answer(QVEventStoreQueue::Search& search) {
@@ -287,6 +303,7 @@ void QVEventStoreWriter::finishBatches(std::size_t count) {
   for (std::size_t i = 0; i < count; ++i) {
     QVEventRows batch = std::move(pending_.front());
     pending_.pop_front();
+    sessionEnded_ = sessionEnded_ || !batch.flushes.empty();
     answerFlushes(batch, std::nullopt);
     queue_.recycle(std::move(batch));
   }

@@ -70,6 +70,7 @@ class QVEventStoreWriter {
   void giveUpAll(const char* cause);
   void askForPayload(QVCountwiseRow& row);
   void answerFlushes(QVEventRows& batch, const std::optional<QVError>& error);
+  void giveMemoryBack();
   void closeStore();
   template <class Callable>
   void guarded(Callable&& callable);
@@ -94,6 +95,7 @@ class QVEventStoreWriter {
   int64_t lostInOutage_ = 0;
   std::size_t heldBytes_ = 0;       // of pending_, kept while the store is out of order
   std::size_t countedBatches_ = 0;  // of pending_, those that heldBytes_ includes
+  bool sessionEnded_ = false;       // since memory was given back
   SteadyTime retryAt_{};
   SteadyTime preferencesReadAt_{};
   std::optional<SteadyTime> setAsideAt_;

@@ -221,13 +221,21 @@ int QVEventTables::insertLoss(std::string_view cause, int64_t count, int64_t now
 void QVEventTables::rollback() {
   for (const auto& session : newSessions_) session->database = 0;
   newSessions_.clear();
-  // SQLite has rolled back by itself after some failures. What fails here shows at the next begin.
-  if (database_.inTransaction() && rollback_.run() != SQLITE_OK) return;
   lossRows_.clear();
   retention_.noteRollback();
+  // SQLite has rolled back by itself after some failures. What fails here shows at the next begin.
+  if (database_.inTransaction()) static_cast<void>(rollback_.run());
+}
+
+void QVEventTables::giveMemoryBack() {
+  json_.clear();
+  database_.giveMemoryBack();
+  textBytesGivenBack_ = textBytes_;
 }
 
 std::string_view QVEventTables::text(const QVDictionary& payload) {
   // Never refused: what JSON has no number for is quoted.
-  return json_.write(payload).value_or("{}");
+  const std::string_view written = json_.write(payload).value_or("{}");
+  textBytes_ += written.size();
+  return written;
 }

@@ -35,6 +35,10 @@ class QVEventTables {
   bool hasMoved() const { return database_.hasMoved(); }
   void setLimit(int64_t limit) { retention_.setLimit(limit); }
   std::string message() const { return database_.message(); }
+  // Frees what large payloads left behind. Not within a transaction.
+  void giveMemoryBack();
+  // Bytes of payload text that were written since.
+  uint64_t textBytes() const { return textBytes_ - textBytesGivenBack_; }
 
   [[nodiscard]] int begin();
   [[nodiscard]] int insert(const QVBeaconSessionRow& row);
@@ -63,6 +67,8 @@ class QVEventTables {
   std::string_view text(const QVDictionary& payload);
 
   QVJSONText json_;
+  uint64_t textBytes_ = 0;
+  uint64_t textBytesGivenBack_ = 0;
   QVSQLiteDatabase database_;
   // Which database this is, from 1: sessions written to an earlier one are not in this.
   uint64_t number_ = 0;

@@ -219,11 +219,15 @@ struct QVJSONText::State {
   CompactWriter compact{buffer};
   PrettyWriter pretty{buffer};
 
-  template <class Part>
-  std::optional<std::string_view> write(Part part) {
+  void clear() {
     const bool large = buffer.GetSize() > kKeptBufferBytes;
     buffer.Clear();
     if (large) buffer.ShrinkToFit();
+  }
+
+  template <class Part>
+  std::optional<std::string_view> write(Part part) {
+    clear();
     return layout == Layout::compact ? write(compact, part) : write(pretty, part);
   }
 
@@ -240,6 +244,10 @@ QVJSONText::QVJSONText(Layout layout, NonFinite nonFinite)
     : state_(std::make_unique<State>(layout, nonFinite)) {}
 
 QVJSONText::~QVJSONText() = default;
+
+void QVJSONText::clear() {
+  state_->clear();
+}
 
 std::optional<std::string_view> QVJSONText::write(const QVValue& value) {
   return state_->write([&value](auto& streamer) { return streamer.value(value); });

@@ -35,6 +35,9 @@ class QVJSONText {
   [[nodiscard]] std::optional<std::string_view> write(const QVValue& value);
   [[nodiscard]] std::optional<std::string_view> write(const QVDictionary& value);
 
+  // Drops the last text; the memory of a large one is freed.
+  void clear();
+
  private:
   struct State;
   const std::unique_ptr<State> state_;

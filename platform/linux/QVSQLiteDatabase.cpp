@@ -50,6 +50,10 @@ bool QVSQLiteDatabase::inTransaction() const {
   return sqlite3_get_autocommit(handle_) == 0;
 }
 
+void QVSQLiteDatabase::giveMemoryBack() {
+  if (handle_ != nullptr) sqlite3_db_release_memory(handle_);
+}
+
 int64_t QVSQLiteDatabase::lastRow() const {
   return sqlite3_last_insert_rowid(handle_);
 }

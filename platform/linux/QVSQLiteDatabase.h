@@ -33,6 +33,8 @@ class QVSQLiteDatabase {
   // Has the file been moved or removed since it was opened?
   bool hasMoved() const;
   bool inTransaction() const;
+  // Frees what SQLite keeps only for speed.
+  void giveMemoryBack();
   int64_t lastRow() const;
   int64_t changes() const;
   sqlite3* handle() const { return handle_; }
