@@ -60,10 +60,16 @@ class QVLog {
   virtual void flush() = 0;
 
   // Are lines of this verbosity written for the scope? One relaxed load, to be asked before a
-  // verbose line's arguments are built. The default log (null) is never verbose.
+  // verbose line's arguments are built.
   static bool logEnabled(int verbosity, const QVLogScope* scope) noexcept {
-    return verbosity < kVerbose ||
-           (scope != nullptr && scope->verbose.load(std::memory_order_relaxed));
+    const auto& verbose = scope != nullptr ? scope->verbose : isDefaultVerbose_;
+    return verbosity < kVerbose || verbose.load(std::memory_order_relaxed);
+  }
+
+  // Makes the default log (null) verbose, or not, as at first. It has no scope, and so no switch in
+  // the preferences.
+  static void setDefaultVerbose(bool verbose) noexcept {
+    isDefaultVerbose_.store(verbose, std::memory_order_relaxed);
   }
 
   // One line of the level's name; the text is that of the parts, one after the other.
@@ -84,4 +90,7 @@ class QVLog {
   void verbose(const QVLogScope* scope, const QVLogSite& site, const Parts&... parts) {
     if (logEnabled(kVerbose, scope)) write(scope, QVLogLevel::debug, site, QVText(parts...));
   }
+
+ private:
+  static inline std::atomic<bool> isDefaultVerbose_{false};
 };

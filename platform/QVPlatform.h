@@ -15,6 +15,7 @@
 #include "platform/QVPreferences.h"
 #include "platform/QVProcess.h"
 #include "platform/QVRandom.h"
+#include "platform/QVRunLoopThread.h"
 #include "platform/QVTally.h"
 #include "platform/QVTracePoints.h"
 #include "platform/QVWorkQueue.h"
@@ -49,6 +50,7 @@ class QVPlatform {
   std::unique_ptr<QVTally> tally;
   std::unique_ptr<QVOrientation> orientation;
   std::unique_ptr<QVNotifications> notifications;
+  std::unique_ptr<QVRunLoopThreads> runLoopThreads;
   std::unique_ptr<QVIPCListener> listener;
 
   // Makes `platform` the one that shared() answers, in place of an earlier one; null takes it

@@ -39,6 +39,9 @@ class QVFakeLog final : public QVLog {
     bool operator==(const Registration&) const = default;
   };
 
+  // What a test makes of the default log ends with it.
+  ~QVFakeLog() override { setDefaultVerbose(false); }
+
   QVLogScope* registerScope(bool enabled, uint32_t code, std::string_view name,
                             std::string_view domain, std::string_view verboseKey,
                             int32_t registration) override;
