@@ -24,6 +24,9 @@ TEST(QVFakePlatformTest, IsInstalledAndFilled) {
   EXPECT_EQ(platform.beacon.get(), &fakes.beacon());
   EXPECT_EQ(platform.countwise.get(), &fakes.countwise());
   EXPECT_EQ(platform.joulewell.get(), &fakes.joulewell());
+  EXPECT_EQ(platform.tally.get(), &fakes.tally());
+  EXPECT_EQ(platform.orientation.get(), &fakes.orientation());
+  EXPECT_EQ(platform.notifications.get(), &fakes.notifications());
   EXPECT_EQ(platform.listener.get(), &fakes.listener());
 }
 
@@ -49,6 +52,7 @@ TEST(QVFakePlatformTest, CanBeAskedWhileItDropsWork) {
     const auto mourner = std::make_shared<Mourner>();
     watched = mourner;
     fakes.queues().backgroundQueue()->async([mourner] {});
+    fakes.orientation().QVRegisterUIOrientation("a", [mourner](int32_t) {});
   }
   EXPECT_TRUE(watched.expired());
   EXPECT_EQ(QVPlatform::generation(), generation + 2) << "installed once, taken away once";
