@@ -15,8 +15,7 @@ constexpr int64_t kLossRowLife = 3'600'000'000;
 
 }  // namespace
 
-QVEventTables::QVEventTables(int64_t limit)
-    : json_(QVJSONText::Layout::compact, QVJSONText::NonFinite::quote), retention_(limit) {}
+QVEventTables::QVEventTables(int64_t limit) : retention_(limit) {}
 
 QVEventTables::Opening QVEventTables::open(const std::string& path, const std::string& vfs,
                                            int64_t now, std::string& reason) {
@@ -234,8 +233,7 @@ void QVEventTables::giveMemoryBack() {
 }
 
 std::string_view QVEventTables::text(const QVDictionary& payload) {
-  // Never refused: what JSON has no number for is quoted.
-  const std::string_view written = json_.write(payload).value_or("{}");
+  const std::string_view written = json_.write(payload);
   textBytes_ += written.size();
   return written;
 }

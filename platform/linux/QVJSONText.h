@@ -3,37 +3,26 @@
 #include "platform/QVValue.h"
 
 #include <memory>
-#include <optional>
 #include <string_view>
 
-// Writes values as JSON text, from the value straight into one buffer that is used again for the
-// next text. Used by the event store for its payloads.
+// Writes values as JSON text, one line without blanks, from the value straight into one buffer that
+// is used again for the next text. Used by the event store for its payloads.
 //
-// Doubles are the shortest text that reads back equal and keep their kind (12.0, 1e+300); bytes
-// that are no UTF-8 become U+FFFD; keys come in ascending byte order, as dictionaries iterate.
+// Doubles are the shortest text that reads back equal and keep their kind (12.0, 1e+300); NaN and
+// the infinities, which JSON has no word for, are the strings "nan", "inf" and "-inf"; bytes that
+// are no UTF-8 become U+FFFD; keys come in ascending byte order, as dictionaries iterate.
 //
 // Threads: one at a time. A text is valid until the next one is written.
 class QVJSONText {
  public:
-  enum class Layout {
-    compact,  // one line without blanks
-    pretty    // indented by two blanks
-  };
-  // JSON has no word for NaN and the infinities.
-  enum class NonFinite {
-    refuse,  // such a value has no text
-    quote    // they are written as the strings "nan", "inf" and "-inf"
-  };
-
-  QVJSONText(Layout layout, NonFinite nonFinite);
+  QVJSONText();
   ~QVJSONText();
   QVJSONText(const QVJSONText&) = delete;
   QVJSONText& operator=(const QVJSONText&) = delete;
 
-  // The value's text; nothing where it was refused. An absent value is null, an absent dictionary
-  // an empty one.
-  [[nodiscard]] std::optional<std::string_view> write(const QVValue& value);
-  [[nodiscard]] std::optional<std::string_view> write(const QVDictionary& value);
+  // The value's text. An absent value is null, an absent dictionary an empty one.
+  [[nodiscard]] std::string_view write(const QVValue& value);
+  [[nodiscard]] std::string_view write(const QVDictionary& value);
 
   // Drops the last text; the memory of a large one is freed.
   void clear();
