@@ -17,6 +17,7 @@
 #include "platform/linux/QVSystemLog.h"
 #include "platform/linux/QVSystemRandom.h"
 #include "platform/linux/bus/QVBusListener.h"
+#include "platform/linux/tally/QVPublishedTally.h"
 
 #include <condition_variable>
 #include <csignal>
@@ -115,6 +116,8 @@ int runService() {
   platform.beacon = std::make_unique<QVStoreBeacon>(store);
   platform.countwise = std::make_unique<QVStoreCountwise>(store);
   platform.joulewell = std::make_unique<QVStoreJoulewell>(store);
+  platform.tally = std::make_unique<QVPublishedTally>(log, directories.channels(),
+                                                      directories.channelConfiguration());
 
   QVPlatform::install(&platform);
 

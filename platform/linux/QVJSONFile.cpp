@@ -1,25 +1,19 @@
 #include "platform/linux/QVJSONFile.h"
 
 #include "platform/QVText.h"
+#include "platform/linux/QVRegularFile.h"
 
 #include <algorithm>
 #include <cerrno>
 #include <cstdint>
-#include <system_error>
 #include <utility>
 #include <vector>
 
-#include <fcntl.h>
 #include <rapidjson/error/en.h>
 #include <rapidjson/memorystream.h>
 #include <rapidjson/reader.h>
-#include <sys/stat.h>
-#include <unistd.h>
 
 namespace {
-
-// Bytes read at a time.
-constexpr std::size_t kReadBytes = std::size_t{16} * 1024;
 
 // Builds values from the reader's events. Answering false ends the parse.
 class Builder {
@@ -81,53 +75,15 @@ class Builder {
   bool tooDeep_ = false;
 };
 
-class File {
- public:
-  // Without waiting for the writer of a pipe that somebody put in the file's place.
-  explicit File(const std::string& path)
-      : descriptor_(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK)) {}
-  ~File() {
-    if (descriptor_ >= 0) close(descriptor_);
-  }
-  File(const File&) = delete;
-  File& operator=(const File&) = delete;
-  int descriptor() const { return descriptor_; }
-
- private:
-  const int descriptor_;
-};
-
 std::optional<std::string> contents(const std::string& path, QVJSONFailure& failure) {
-  const File file(path);
-  struct stat status {};
-  if (file.descriptor() < 0 || fstat(file.descriptor(), &status) != 0) {
-    failure = {.reason = std::generic_category().message(errno),
-               .missing = errno == ENOENT || errno == ENOTDIR};
-    return std::nullopt;
-  }
-  if (!S_ISREG(status.st_mode)) {
-    failure = {.reason = "not a regular file"};
-    return std::nullopt;
-  }
+  const QVRegularFile file(path, QVRegularFile::Links::follow);
   std::string text;
-  std::size_t length = 0;
-  while (length <= QVJSONFile::kMaximumBytes) {
-    text.resize(length + kReadBytes);
-    const ssize_t count = ::read(file.descriptor(), text.data() + length, text.size() - length);
-    if (count < 0 && errno == EINTR) continue;
-    if (count < 0) {
-      failure = {.reason = std::generic_category().message(errno)};
-      return std::nullopt;
-    }
-    if (count == 0) break;
-    length += static_cast<std::size_t>(count);
-  }
-  if (length > QVJSONFile::kMaximumBytes) {
-    failure = {.reason = QVText("larger than ", QVJSONFile::kMaximumBytes, " bytes")};
-    return std::nullopt;
-  }
-  text.resize(length);
-  return text;
+  int error = file.error();
+  if (error == 0) error = file.read(QVJSONFile::kMaximumBytes, text);
+  if (error == 0) return text;
+  failure = {.reason = QVRegularFile::reason(error, QVJSONFile::kMaximumBytes),
+             .missing = error == ENOENT || error == ENOTDIR};
+  return std::nullopt;
 }
 
 }  // namespace

@@ -19,6 +19,9 @@ struct QVServiceDirectories {
   std::filesystem::path store() const { return state / "reporting.db"; }
   std::filesystem::path preferences() const { return configuration / "preferences"; }
   std::filesystem::path deviceInformation() const { return configuration / "device.json"; }
+  // Where drivers publish, and which of the kernel's files publish.
+  std::filesystem::path channels() const { return runtime / "channels"; }
+  std::filesystem::path channelConfiguration() const { return configuration / "channels.json"; }
 
   // Why the service could not write into `directory`; nothing where it can.
   static std::optional<std::string> obstacle(const std::filesystem::path& directory);
