@@ -29,22 +29,15 @@ bool QVElasticWorkerPool::submit(QVWorkItem& task) {
   const QVMutexLock lock(mutex_);
   if (closed_) return false;
   ledger_.enter();
-  if (!resting_.empty()) {
-    Worker& worker = *resting_.back();
-    resting_.pop_back();
-    worker.task = std::move(task);
-    worker.wake.notify_one();
-  } else {
-    ready_.push_back(std::move(task));
-    addWorkerIfUseful();
-  }
+  ready_.push_back(std::move(task));
+  sendForWorker();
   return true;
 }
 
 void QVElasticWorkerPool::willBlock() {
   const QVMutexLock lock(mutex_);
   ++blockedCount_;
-  if (!ready_.empty()) addWorkerIfUseful();
+  if (!ready_.empty()) sendForWorker();
 }
 
 void QVElasticWorkerPool::didBlock() {
@@ -52,12 +45,27 @@ void QVElasticWorkerPool::didBlock() {
   --blockedCount_;
 }
 
-void QVElasticWorkerPool::addWorkerIfUseful() {
+// Wakes or makes one more worker, where one may run and none is on its way already.
+void QVElasticWorkerPool::sendForWorker() {
+  if (workerIsComing_) return;
+  if (workerCount_ - blockedCount_ - resting_.size() >= limits_.concurrency) return;
+  if (resting_.empty()) {
+    addWorker();
+    return;
+  }
+  Worker& worker = *resting_.back();
+  resting_.pop_back();
+  worker.isWanted = true;
+  workerIsComing_ = true;
+  worker.wake.notify_one();
+}
+
+void QVElasticWorkerPool::addWorker() {
   if (workerCount_ >= limits_.workers) return;
-  if (workerCount_ - blockedCount_ >= limits_.concurrency) return;
   try {
     threads_.emplace_back([this] { work(); });
     ++workerCount_;
+    workerIsComing_ = true;
     lacksThreads_ = false;
   } catch (const std::system_error& error) {
     // The log takes no lock of ours and never waits.
@@ -70,40 +78,39 @@ void QVElasticWorkerPool::work() {
   poolOfThisThread = this;
   QVPrepareThread("qv-" + name_, niceness_);
   QVMutexLock lock(mutex_);
-  QVWorkItem task;
-  for (;;) {
-    if (!ready_.empty()) {
-      task = std::move(ready_.front());
+  workerIsComing_ = false;
+  do {
+    while (!ready_.empty()) {
+      QVWorkItem task = std::move(ready_.front());
       ready_.pop_front();
-    } else if (!rest(lock, task)) {
-      break;
+      if (!ready_.empty()) sendForWorker();
+      lock.unlock();
+      QVRunWorkItem(task, name_, log_);
+      ledger_.leave();
+      lock.lock();
     }
-    lock.unlock();
-    QVRunWorkItem(task, name_, log_);
-    ledger_.leave();
-    lock.lock();
-  }
+  } while (rest(lock));
   std::thread previous = retire();
   lock.unlock();
   if (previous.joinable()) previous.join();
 }
 
-// Waits for a task; false where the worker is not needed any more.
-bool QVElasticWorkerPool::rest(QVMutexLock& lock, QVWorkItem& task) {
+// Waits to be wanted; false where the worker is not needed any more.
+bool QVElasticWorkerPool::rest(QVMutexLock& lock) {
   if (closed_) return false;
   Worker self;
   resting_.push_back(&self);
   auto deadline = std::chrono::steady_clock::now() + limits_.rest;
-  while (!self.task && !closed_) {
+  while (!self.isWanted && !closed_) {
     if (workerCount_ == 1) {
       lock.wait(self.wake);
-    } else if (lock.waitUntil(self.wake, deadline) == std::cv_status::timeout && !self.task) {
+    } else if (lock.waitUntil(self.wake, deadline) == std::cv_status::timeout && !self.isWanted) {
       if (workerCount_ > 1) break;
       deadline = std::chrono::steady_clock::now() + limits_.rest;
     }
   }
-  if (self.task) {
-    task = std::move(self.task);
+  if (self.isWanted) {
+    workerIsComing_ = false;
     return true;
   }
   std::erase(resting_, &self);

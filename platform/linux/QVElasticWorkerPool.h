@@ -15,9 +15,10 @@
 
 // An executor whose number of threads follows the work: as many run as there are processors, and
 // one more for each that is blocked in a wait (QVWorkerBlocking tells), so that work that can run
-// does run. Threads are made when a task finds none free. The worker that rested last is the first
-// to be used again, so those in excess stay idle and retire; the last one stays, asleep without a
-// time limit. (Asio's own io_context cannot serve here: it wakes its idle threads in turn, so that
+// does run. Threads are made when a task finds none free. One worker is on its way at a time: when
+// it has come and finds more than it can do at once, it sends for the next, so a burst of short
+// tasks costs few wake-ups. The worker that rested last is the first to be used again, so those in
+// excess stay idle and retire; the last one stays, asleep without a time limit. (Asio's own io_context cannot serve here: it wakes its idle threads in turn, so that
 // none would ever retire, and those that may retire once a second.)
 //
 // Used by QVAsioWorkQueues, one pool per quality of service. Threads: as QVWorkExecutor.
@@ -57,12 +58,13 @@ class QVElasticWorkerPool final : public QVWorkExecutor {
   // A resting worker, on its own stack.
   struct Worker {
     std::condition_variable wake;
-    QVWorkItem task;  // handed over together with the wake-up
+    bool isWanted = false;
   };
 
-  void addWorkerIfUseful() QV_REQUIRES(mutex_);
+  void sendForWorker() QV_REQUIRES(mutex_);
+  void addWorker() QV_REQUIRES(mutex_);
   void work();
-  bool rest(QVMutexLock& lock, QVWorkItem& task) QV_REQUIRES(mutex_);
+  bool rest(QVMutexLock& lock) QV_REQUIRES(mutex_);
   std::thread retire() QV_REQUIRES(mutex_);
 
   const std::string name_;
@@ -72,10 +74,11 @@ class QVElasticWorkerPool final : public QVWorkExecutor {
   const Limits limits_;
 
   QVMutex mutex_;
-  std::deque<QVWorkItem> ready_ QV_GUARDED_BY(mutex_);  // tasks that found no worker
+  std::deque<QVWorkItem> ready_ QV_GUARDED_BY(mutex_);
   std::vector<Worker*> resting_ QV_GUARDED_BY(mutex_);  // the last to rest is the last
   std::size_t workerCount_ QV_GUARDED_BY(mutex_) = 0;
   std::size_t blockedCount_ QV_GUARDED_BY(mutex_) = 0;
+  bool workerIsComing_ QV_GUARDED_BY(mutex_) = false;  // woken or made, and has not looked yet
   bool closed_ QV_GUARDED_BY(mutex_) = false;
   bool lacksThreads_ QV_GUARDED_BY(mutex_) = false;
   std::vector<std::thread> threads_ QV_GUARDED_BY(mutex_);
