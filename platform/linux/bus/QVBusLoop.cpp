@@ -1,10 +1,20 @@
 #include "platform/linux/bus/QVBusLoop.h"
 
+#include "platform/linux/QVWakeUpBatch.h"
+
+#include <cstddef>
 #include <utility>
 
 #include <asio/executor_work_guard.hpp>
 #include <asio/io_context.hpp>
 #include <asio/post.hpp>
+
+namespace {
+
+// More would keep the other threads waiting for what they could do meanwhile.
+constexpr std::size_t kHandlersPerWakeUp = 8;
+
+}  // namespace
 
 // A concurrency hint of 1: one thread runs the loop, others only post.
 QVBusLoop::QVBusLoop() : context_(std::make_unique<asio::io_context>(1)) {}
@@ -17,7 +27,16 @@ void QVBusLoop::post(QVFunction<void()> work) {
 
 void QVBusLoop::run() {
   const auto guard = asio::make_work_guard(*context_);
-  context_->run();
+  while (!context_->stopped()) {
+    // Connections that are readable together wake whoever works for them once. Nothing is held back
+    // while the loop sleeps: the batch is empty then.
+    const QVWakeUpBatch wakeUps;
+    std::size_t handlers = context_->run_one();
+    while (handlers > 0 && handlers < kHandlersPerWakeUp) {
+      if (context_->poll_one() == 0) break;
+      ++handlers;
+    }
+  }
 }
 
 void QVBusLoop::stop() {
