@@ -2,6 +2,7 @@
 
 #include "platform/QVDate.h"
 
+#include <chrono>
 #include <memory>
 
 // A timer that fires once, on the thread of the run loop that it is attached to. Made by
@@ -18,6 +19,9 @@
 // destroys it on the loop's thread once it has run, or in invalidate(), or with itself.
 class QVRunLoopTimer {
  public:
+  // Longer delays are cut to this, which keeps every fire date within a clock's range.
+  static constexpr QVDuration kLongestDelay = std::chrono::hours{24 * 365};
+
   virtual ~QVRunLoopTimer() = default;
   // Moves the fire date to `delay` from now; one that is not positive is now.
   virtual void fireAfter(QVDuration delay) = 0;

@@ -22,7 +22,7 @@ class QVRunLoopThread {
 //
 // Threads: any.
 // Ownership: outlives its threads: its end waits for them, so whoever starts one sees to it that
-// its body returns. Timers may outlive it.
+// its body returns. A timer may outlive it, but only to be destroyed.
 class QVRunLoopThreads {
  public:
   using Body = QVFunction<void(QVRunLoop& runLoop)>;

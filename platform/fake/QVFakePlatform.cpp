@@ -29,6 +29,8 @@ QVFakePlatform::QVFakePlatform()
       tally_(fill<QVFakeTally>(platform_.tally)),
       orientation_(fill<QVFakeOrientation>(platform_.orientation)),
       notifications_(fill<QVFakeNotifications>(platform_.notifications)),
+      runLoopThreads_(
+          fill<QVFakeRunLoopThreads>(platform_.runLoopThreads, *queues_, *clock_, *log_)),
       listener_(fill<QVFakeIPCListener>(platform_.listener)) {
   QVPlatform::install(&platform_);
 }
@@ -37,6 +39,7 @@ QVFakePlatform::~QVFakePlatform() {
   // What connections, callbacks and items capture may log, enqueue and send on its way out.
   listener_->abandonConnections();
   orientation_->abandonRegistrations();
+  runLoopThreads_->discard();
   queues_->discard();
   QVPlatform::install(nullptr);
 }

@@ -14,12 +14,13 @@
 #include "platform/fake/QVFakePreferences.h"
 #include "platform/fake/QVFakeProcess.h"
 #include "platform/fake/QVFakeRandom.h"
+#include "platform/fake/QVFakeRunLoopThreads.h"
 #include "platform/fake/QVFakeTally.h"
 #include "platform/fake/QVFakeTracePoints.h"
 #include "platform/fake/QVFakeWorkQueues.h"
 
-// A platform of fakes, installed while it exists. Queues, conditions and clock share one virtual
-// time. A test makes it first and drops it last: work that is still enqueued, and what open
+// A platform of fakes, installed while it exists. Queues, conditions, threads and clock share one
+// virtual time. A test makes it first and drops it last: work that is still enqueued, and what open
 // connections and orientation callbacks hold, is destroyed with it, while the platform can still be
 // asked.
 //
@@ -46,6 +47,7 @@ class QVFakePlatform {
   QVFakeTally& tally() { return *tally_; }
   QVFakeOrientation& orientation() { return *orientation_; }
   QVFakeNotifications& notifications() { return *notifications_; }
+  QVFakeRunLoopThreads& runLoopThreads() { return *runLoopThreads_; }
   QVFakeIPCListener& listener() { return *listener_; }
 
  private:
@@ -66,5 +68,6 @@ class QVFakePlatform {
   QVFakeTally* tally_;
   QVFakeOrientation* orientation_;
   QVFakeNotifications* notifications_;
+  QVFakeRunLoopThreads* runLoopThreads_;
   QVFakeIPCListener* listener_;
 };

@@ -27,6 +27,7 @@ TEST(QVFakePlatformTest, IsInstalledAndFilled) {
   EXPECT_EQ(platform.tally.get(), &fakes.tally());
   EXPECT_EQ(platform.orientation.get(), &fakes.orientation());
   EXPECT_EQ(platform.notifications.get(), &fakes.notifications());
+  EXPECT_EQ(platform.runLoopThreads.get(), &fakes.runLoopThreads());
   EXPECT_EQ(platform.listener.get(), &fakes.listener());
 }
 
