@@ -6,6 +6,7 @@
 
 #include <memory>
 #include <optional>
+#include <span>
 #include <string_view>
 
 // One JSON array that is written element by element, pretty-printed: two blanks of indentation, one
@@ -19,12 +20,14 @@
 class QVJSONArrayStream {
  public:
   virtual ~QVJSONArrayStream() = default;
-  // Appends an element; answers why it cannot be written. After that nothing more reaches the sink,
+  // Appends an object of these members, which are those of a dictionary: in ascending order of the
+  // keys, each once. Answers why it cannot be written; after that nothing more reaches the sink,
   // and the array is no valid text.
-  [[nodiscard]] virtual std::optional<QVError> append(const QVDictionary& element) = 0;
-  // The same for an object of one member, without making it first.
-  [[nodiscard]] virtual std::optional<QVError> append(std::string_view name,
-                                                      const QVDictionary& value) = 0;
+  [[nodiscard]] virtual std::optional<QVError> append(
+      std::span<const QVDictionaryEntry> members) = 0;
+  // Appends an object whose one member is such an object.
+  [[nodiscard]] virtual std::optional<QVError> append(
+      std::string_view name, std::span<const QVDictionaryEntry> members) = 0;
   // Ends the array. Not after a failure.
   virtual void end() = 0;
 };

@@ -21,6 +21,8 @@ QVFakePlatform::QVFakePlatform()
       tracePoints_(fill<QVFakeTracePoints>(platform_.tracePoints)),
       preferences_(fill<QVFakePreferences>(platform_.preferences)),
       deviceInformation_(fill<QVFakeDeviceInformation>(platform_.deviceInformation)),
+      fileSystem_(fill<QVFakeFileSystem>(platform_.fileSystem)),
+      jsonOutput_(fill<QVFakeJSONOutput>(platform_.jsonOutput)),
       queues_(fill<QVFakeWorkQueues>(platform_.queues, *clock_, *log_)),
       conditions_(fill<QVFakeConditions>(platform_.conditions, *queues_, *clock_)),
       beacon_(fill<QVFakeBeacon>(platform_.beacon)),

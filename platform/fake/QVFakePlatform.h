@@ -6,7 +6,9 @@
 #include "platform/fake/QVFakeConditions.h"
 #include "platform/fake/QVFakeCountwise.h"
 #include "platform/fake/QVFakeDeviceInformation.h"
+#include "platform/fake/QVFakeFileSystem.h"
 #include "platform/fake/QVFakeIPCListener.h"
+#include "platform/fake/QVFakeJSONOutput.h"
 #include "platform/fake/QVFakeJoulewell.h"
 #include "platform/fake/QVFakeLog.h"
 #include "platform/fake/QVFakeNotifications.h"
@@ -39,6 +41,8 @@ class QVFakePlatform {
   QVFakeTracePoints& tracePoints() { return *tracePoints_; }
   QVFakePreferences& preferences() { return *preferences_; }
   QVFakeDeviceInformation& deviceInformation() { return *deviceInformation_; }
+  QVFakeFileSystem& fileSystem() { return *fileSystem_; }
+  QVFakeJSONOutput& jsonOutput() { return *jsonOutput_; }
   QVFakeConditions& conditions() { return *conditions_; }
   QVFakeWorkQueues& queues() { return *queues_; }
   QVFakeBeacon& beacon() { return *beacon_; }
@@ -60,6 +64,8 @@ class QVFakePlatform {
   QVFakeTracePoints* tracePoints_;
   QVFakePreferences* preferences_;
   QVFakeDeviceInformation* deviceInformation_;
+  QVFakeFileSystem* fileSystem_;
+  QVFakeJSONOutput* jsonOutput_;
   QVFakeWorkQueues* queues_;
   QVFakeConditions* conditions_;
   QVFakeBeacon* beacon_;

@@ -1,0 +1,128 @@
+#include "platform/linux/QVPosixAtomicFile.h"
+
+#include "platform/linux/QVPosixError.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <utility>
+
+#include <fcntl.h>
+#include <sys/random.h>
+#include <unistd.h>
+
+namespace {
+
+// What a new file may be at the most; the process's umask takes from it.
+constexpr mode_t kMode = S_IRUSR | S_IWUSR | S_IRGRP | S_IROTH;
+
+// Names that are tried: each is one of 2^64, so a second one is needed hardly ever.
+constexpr int kNames = 16;
+
+// The kernel begins to write so many bytes while more are made, in bytes: else the syncing at the
+// end has all of it to wait for.
+constexpr uint64_t kWritebackBytes = uint64_t{8} << 20;
+
+std::string arbitraryName() {
+  uint64_t number = 0;
+  if (::getrandom(&number, sizeof number, 0) != sizeof number) return {};
+  char name[48];
+  std::snprintf(name, sizeof name, ".quietvox-%016llx.tmp",
+                static_cast<unsigned long long>(number));
+  return name;
+}
+
+bool sync(int descriptor) {
+  int result = 0;
+  do {
+    result = ::fsync(descriptor);
+  } while (result != 0 && errno == EINTR);
+  return result == 0;
+}
+
+}  // namespace
+
+QVPosixAtomicFile::QVPosixAtomicFile(std::string path) : path_(std::move(path)) {
+  open();
+}
+
+QVPosixAtomicFile::~QVPosixAtomicFile() {
+  abandon();
+}
+
+void QVPosixAtomicFile::open() {
+  const std::size_t slash = path_.rfind('/');
+  const std::string directory =
+      slash == std::string::npos ? std::string(".") : path_.substr(0, slash + 1);
+  name_ = slash == std::string::npos ? path_ : path_.substr(slash + 1);
+  directory_ = ::open(directory.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+  if (!check(directory_ >= 0)) return;
+  for (int i = 0; i < kNames && file_ < 0; ++i) {
+    temporaryName_ = arbitraryName();
+    file_ = ::openat(directory_, temporaryName_.c_str(),
+                     O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kMode);
+    if (file_ < 0 && errno != EEXIST) break;
+  }
+  if (file_ < 0) temporaryName_.clear();
+  if (check(file_ >= 0)) buffer_ = std::make_unique_for_overwrite<char[]>(kBufferBytes);
+}
+
+void QVPosixAtomicFile::write(std::string_view bytes) {
+  while (!failure_ && !bytes.empty()) {
+    if (used_ == 0 && bytes.size() >= kBufferBytes) {
+      writeOut(bytes);
+      return;
+    }
+    const std::string_view part = bytes.substr(0, kBufferBytes - used_);
+    std::copy(part.begin(), part.end(), buffer_.get() + used_);
+    used_ += part.size();
+    bytes.remove_prefix(part.size());
+    if (used_ == kBufferBytes) writeOut({buffer_.get(), std::exchange(used_, 0)});
+  }
+}
+
+void QVPosixAtomicFile::writeOut(std::string_view bytes) {
+  while (!bytes.empty()) {
+    const ssize_t count = ::write(file_, bytes.data(), bytes.size());
+    if (count < 0 && errno == EINTR) continue;
+    if (!check(count >= 0)) return;
+    bytes.remove_prefix(static_cast<std::size_t>(count));
+    written_ += static_cast<uint64_t>(count);
+  }
+  startWriteback();
+}
+
+void QVPosixAtomicFile::startWriteback() {
+  const uint64_t waiting = written_ - handedToDisk_;
+  if (waiting < kWritebackBytes) return;
+  // Advice: what it does not get done, or fails at, the syncing meets again.
+  static_cast<void>(::sync_file_range(file_, static_cast<off_t>(handedToDisk_),
+                                      static_cast<off_t>(waiting), SYNC_FILE_RANGE_WRITE));
+  handedToDisk_ = written_;
+}
+
+std::optional<QVError> QVPosixAtomicFile::commit() {
+  if (!failure_) writeOut({buffer_.get(), std::exchange(used_, 0)});
+  if (!failure_) check(sync(file_));
+  if (!failure_) check(::close(std::exchange(file_, -1)) == 0);
+  if (!failure_ &&
+      check(::renameat(directory_, temporaryName_.c_str(), directory_, name_.c_str()) == 0)) {
+    temporaryName_.clear();
+    check(sync(directory_));
+  }
+  abandon();
+  return failure_;
+}
+
+bool QVPosixAtomicFile::check(bool succeeded) {
+  if (!succeeded && !failure_) failure_ = QVMakePosixError(path_);
+  return succeeded;
+}
+
+void QVPosixAtomicFile::abandon() {
+  if (!temporaryName_.empty()) {
+    ::unlinkat(directory_, std::exchange(temporaryName_, {}).c_str(), 0);
+  }
+  if (file_ >= 0) ::close(std::exchange(file_, -1));
+  if (directory_ >= 0) ::close(std::exchange(directory_, -1));
+  buffer_.reset();
+}

@@ -1,0 +1,51 @@
+#pragma once
+
+#include "platform/QVFileSystem.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <string_view>
+
+// A file that is written beside the place that it shall take: into a hidden file of an arbitrary
+// name in the same directory, which is synced and renamed. Whatever goes wrong before the renaming,
+// and when the object is dropped, that file is removed; only a service that is killed meanwhile
+// leaves it behind.
+//
+// The file is readable by the service's group and, where the process's umask lets them, by others.
+// A link that somebody laid under the name is replaced, not followed.
+//
+// Threads: one at a time.
+class QVPosixAtomicFile final : public QVAtomicFile {
+ public:
+  // What is held back to be written at once, in bytes.
+  static constexpr std::size_t kBufferBytes = std::size_t{64} * 1024;
+
+  explicit QVPosixAtomicFile(std::string path);
+  ~QVPosixAtomicFile() override;
+  QVPosixAtomicFile(const QVPosixAtomicFile&) = delete;
+  QVPosixAtomicFile& operator=(const QVPosixAtomicFile&) = delete;
+
+  void write(std::string_view bytes) override;
+  [[nodiscard]] std::optional<QVError> commit() override;
+
+ private:
+  void open();
+  void writeOut(std::string_view bytes);
+  void startWriteback();
+  // Keeps the first failure; answers whether there is none.
+  bool check(bool succeeded);
+  void abandon();
+
+  const std::string path_;
+  std::string name_;  // the path's last part
+  int directory_ = -1;
+  int file_ = -1;
+  std::string temporaryName_;  // empty once there is no such file
+  std::unique_ptr<char[]> buffer_;
+  std::size_t used_ = 0;
+  uint64_t written_ = 0;
+  uint64_t handedToDisk_ = 0;
+  std::optional<QVError> failure_;
+};
