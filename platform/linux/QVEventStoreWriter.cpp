@@ -106,7 +106,7 @@ void QVEventStoreWriter::run() {
     QVEventStoreQueue::Work work =
         queue_.take(outageCause_.empty() ? std::nullopt : std::optional(retryAt_));
     stop = work.stop;
-    for (QVEventStoreQueue::Search& search : work.searches) answer(search);
+    answer(std::move(work.searches));
     for (QVEventRows& batch : work.batches) pending_.push_back(std::move(batch));
     if (stop) retryAt_ = {};
     store();
@@ -123,7 +123,8 @@ void QVEventStoreWriter::giveMemoryBack() {
   ::malloc_trim(0);
 }
 
-void QVEventStoreWriter::answer(QVEventStoreQueue::Search& search) {
+void QVEventStoreWriter::answer(std::vector<QVEventStoreQueue::Search> searches) {
+  if (searches.empty()) return;
   if (tables_.isOpen() && tables_.hasMoved()) {
     log_.error(nullptr, "-[QVEventStoreWriter answer]", "the event store ", options_.path,
                " was moved or removed; opening it anew");
@@ -134,9 +135,11 @@ void QVEventStoreWriter::answer(QVEventStoreQueue::Search& search) {
   } else {
     openStore();
   }
-  std::optional<QVArray> backends;
-  if (tables_.isOpen()) backends = QVArray{QVValue(kBackend)};
-  guarded([&] { search.completion(std::move(backends)); });
+  for (QVEventStoreQueue::Search& search : searches) {
+    std::optional<QVArray> backends;
+    if (tables_.isOpen()) backends = QVArray{QVValue(kBackend)};
+    guarded([&] { search.completion(std::move(backends)); });
+  }
 }
 
 bool QVEventStoreWriter::openStore() {
@@ -230,7 +233,7 @@ void QVEventStoreWriter::store() {
       finishBatches(batches);
       endOutage();
       // Rows may come as fast as they are stored; who waits for the store is not to wait for a gap.
-      for (QVEventStoreQueue::Search& search : queue_.takeSearches()) answer(search);
+      answer(queue_.takeSearches());
     } else if (QVSQLiteDatabase::isDamage(result) && setAside(failure_) && openStore()) {
       continue;
     } else if (tables_.isOpen()) {

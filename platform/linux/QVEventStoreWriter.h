@@ -14,6 +14,7 @@
 #include <optional>
 #include <set>
 #include <string>
+#include <vector>
 
 // The event store's writer: takes rows from the queue and stores them, until the queue is stopped.
 //
@@ -50,7 +51,8 @@ class QVEventStoreWriter {
  private:
   using SteadyTime = QVEventStoreQueue::SteadyTime;
 
-  void answer(QVEventStoreQueue::Search& search);
+  // Looks for the store once for all of them.
+  void answer(std::vector<QVEventStoreQueue::Search> searches);
   bool openStore();
   QVEventTables::Opening openFile(std::string& reason);
   bool setAside(const std::string& reason);

@@ -1,14 +1,13 @@
 #include "platform/linux/QVJSONDeviceInformation.h"
 
 #include "platform/QVPreferences.h"
-#include "platform/linux/QVJSONFile.h"
 
 #include <algorithm>
 #include <limits>
 #include <utility>
 
 QVJSONDeviceInformation::QVJSONDeviceInformation(QVLog& log, std::string path)
-    : log_(log), path_(std::move(path)) {}
+    : file_(log, "device information"), path_(std::move(path)) {}
 
 std::optional<bool> QVJSONDeviceInformation::booleanAnswer(std::string_view key) {
   const QVDictionary known = answers();
@@ -27,12 +26,5 @@ std::optional<int32_t> QVJSONDeviceInformation::integerAnswer(std::string_view k
 }
 
 QVDictionary QVJSONDeviceInformation::answers() {
-  QVJSONFailure failure;
-  const std::optional<QVDictionary> known = QVJSONFile::readDictionary(path_, failure);
-  if (known) return *known;
-  if (!failure.missing) {
-    log_.error(nullptr, "-[QVJSONDeviceInformation answers]", "cannot read device information ",
-               path_, ": ", failure.description());
-  }
-  return {};
+  return file_.read(path_, "-[QVJSONDeviceInformation answers]");
 }

@@ -3,12 +3,12 @@
 #include "platform/QVDeviceInformation.h"
 #include "platform/QVLog.h"
 #include "platform/QVValue.h"
+#include "platform/linux/QVJSONConfiguration.h"
 
 #include <string>
 
 // Device information in a file: one JSON object, read afresh at each question. A file that is not
-// there answers nothing; one that cannot be read or is no object neither, and an error line on the
-// default log names file, line and column.
+// there, or cannot be read, answers nothing.
 //
 // Threads: any. The log outlives it.
 class QVJSONDeviceInformation : public QVDeviceInformation {
@@ -24,6 +24,6 @@ class QVJSONDeviceInformation : public QVDeviceInformation {
  private:
   QVDictionary answers();
 
-  QVLog& log_;
+  QVJSONConfiguration file_;
   const std::string path_;
 };

@@ -93,12 +93,13 @@ TYPED_TEST(QVDeviceInformationContract, ShowsAChangeAtTheNextQuestion) {
   EXPECT_EQ(this->harness_.information().integerAnswer(kDeviceClass), std::nullopt);
 }
 
-TEST(QVJSONDeviceInformationTest, SaysWhereItsFileIsNoJSON) {
+TEST(QVJSONDeviceInformationTest, SaysOnceWhereItsFileIsNoJSON) {
   JSONDeviceInformationHarness harness;
   EXPECT_EQ(harness.information().booleanAnswer(kInternalBuild), std::nullopt);
   EXPECT_THAT(harness.lines(), IsEmpty()) << "no file is no fault";
   harness.setAnswers("{\"InternalBuild\": true,}");
   EXPECT_EQ(harness.information().booleanAnswer(kInternalBuild), std::nullopt);
+  EXPECT_EQ(harness.information().integerAnswer(kDeviceClass), std::nullopt);
   EXPECT_THAT(
       harness.lines(),
       ElementsAre("3[default] -[QVJSONDeviceInformation answers]: cannot read device"
