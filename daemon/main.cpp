@@ -3,8 +3,11 @@
 #include "QVServices/Statistics/Service/QVReportingServiceMain.h"
 #include "platform/QVPlatform.h"
 #include "platform/linux/QVAsioWorkQueues.h"
+#include "platform/linux/QVDirectoryWatcher.h"
+#include "platform/linux/QVInotifyNotifications.h"
 #include "platform/linux/QVJSONDeviceInformation.h"
 #include "platform/linux/QVJSONPreferences.h"
+#include "platform/linux/QVLinuxOrientation.h"
 #include "platform/linux/QVLinuxProcess.h"
 #include "platform/linux/QVSDTTracePoints.h"
 #include "platform/linux/QVSQLiteEventStore.h"
@@ -118,6 +121,12 @@ int runService() {
   platform.joulewell = std::make_unique<QVStoreJoulewell>(store);
   platform.tally = std::make_unique<QVPublishedTally>(log, directories.channels(),
                                                       directories.channelConfiguration());
+  const auto watcher = std::make_shared<QVDirectoryWatcher>(log);
+  platform.orientation = std::make_unique<QVLinuxOrientation>(
+      log, watcher, directories.uiOrientation(),
+      QVSensorProxyOptions{.busAddress = QVSensorProxyOrientation::systemBusAddress()});
+  platform.notifications =
+      std::make_unique<QVInotifyNotifications>(log, watcher, directories.notifications());
 
   QVPlatform::install(&platform);
 
@@ -129,6 +138,10 @@ int runService() {
   if (platform.listener == nullptr) return giveUp(log, error);
 
   const int status = QVReportingServiceMain();
+  // While the core can still be called: what comes from outside ends, and lets go of the sessions
+  // that are registered for it.
+  platform.notifications = nullptr;
+  platform.orientation = nullptr;
   log.flush();
   QVPlatform::install(nullptr);
   return status;

@@ -22,6 +22,9 @@ struct QVServiceDirectories {
   // Where drivers publish, and which of the kernel's files publish.
   std::filesystem::path channels() const { return runtime / "channels"; }
   std::filesystem::path channelConfiguration() const { return configuration / "channels.json"; }
+  // Where notifications are posted, and the file that says how the user interface is turned.
+  std::filesystem::path notifications() const { return runtime / "notify"; }
+  std::filesystem::path uiOrientation() const { return runtime / "ui-orientation"; }
 
   // Why the service could not write into `directory`; nothing where it can.
   static std::optional<std::string> obstacle(const std::filesystem::path& directory);

@@ -1,0 +1,42 @@
+#pragma once
+
+#include "platform/QVOrientation.h"
+#include "platform/linux/QVThreadAnnotations.h"
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+// Who wants to be told of one orientation (the device's or the user interface's), and the last
+// value known of it.
+//
+// There is demand while anybody is registered; each time it begins, the period has a number of its
+// own. The first value reported in a period is what is known from then on: nobody is told of it.
+//
+// Used by QVLinuxOrientation. Threads: any; report() on the orientation's thread alone. Callbacks
+// are called and destroyed without a lock.
+class QVOrientationRegistrations {
+ public:
+  using Period = uint64_t;
+  static constexpr Period kNoDemand = 0;
+
+  void add(std::string_view callbackID, QVOrientation::Callback callback);
+  // The oldest of the ID.
+  void remove(std::string_view callbackID);
+
+  Period period() const;
+  // The value as the source knows it; a change is told to all who are registered, in the order of
+  // registration. Ignored where the period is over.
+  void report(Period period, int32_t orientation);
+
+ private:
+  struct Registration;
+
+  mutable QVMutex mutex_;
+  std::vector<std::shared_ptr<Registration>> registrations_ QV_GUARDED_BY(mutex_);
+  Period lastPeriod_ QV_GUARDED_BY(mutex_) = kNoDemand;
+  std::optional<int32_t> known_ QV_GUARDED_BY(mutex_);
+};

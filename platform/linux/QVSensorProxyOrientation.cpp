@@ -1,0 +1,311 @@
+#include "platform/linux/QVSensorProxyOrientation.h"
+
+#include "platform/QVText.h"
+
+#include <algorithm>
+#include <cstdint>
+#include <cstdlib>
+#include <string_view>
+#include <system_error>
+#include <utility>
+
+#include <systemd/sd-bus.h>
+
+namespace {
+
+using Clock = std::chrono::steady_clock;
+
+constexpr const char* kService = "net.hadess.SensorProxy";
+constexpr const char* kPath = "/net/hadess/SensorProxy";
+constexpr const char* kInterface = "net.hadess.SensorProxy";
+constexpr const char* kPropertiesInterface = "org.freedesktop.DBus.Properties";
+constexpr const char* kProperty = "AccelerometerOrientation";
+constexpr const char* kUsualBus = "unix:path=/run/dbus/system_bus_socket";
+
+constexpr const char* kOwnerMatch =
+    "type='signal',sender='org.freedesktop.DBus',interface='org.freedesktop.DBus',"
+    "member='NameOwnerChanged',arg0='net.hadess.SensorProxy'";
+// Whoever sends it: what matters is who the owner is.
+constexpr const char* kChangeMatch =
+    "type='signal',path='/net/hadess/SensorProxy',interface='org.freedesktop.DBus.Properties',"
+    "member='PropertiesChanged',arg0='net.hadess.SensorProxy'";
+
+// Messages taken in one go: whoever floods the connection does not keep the thread from ending.
+constexpr int kMostMessages = 64;
+
+// The orientation that a variant names; undefined where it holds no string.
+int32_t orientationIn(sd_bus_message* message) {
+  const char* contents = nullptr;
+  const char* word = nullptr;
+  if (sd_bus_message_peek_type(message, nullptr, &contents) <= 0 || contents == nullptr ||
+      std::string_view(contents) != "s" || sd_bus_message_read(message, "v", "s", &word) < 0) {
+    return QVOrientation::kUndefined;
+  }
+  return QVOrientation::orientationNamed(word);
+}
+
+// Why a call failed; nothing where it did not.
+std::optional<std::string> failureOf(sd_bus_message* reply) {
+  if (sd_bus_message_is_method_error(reply, nullptr) <= 0) return std::nullopt;
+  const sd_bus_error* const error = sd_bus_message_get_error(reply);
+  return error->message == nullptr ? std::string(error->name)
+                                   : QVText(error->name, ": ", error->message);
+}
+
+}  // namespace
+
+struct QVSensorProxyOrientation::Dispatch {
+  using Handler = void (QVSensorProxyOrientation::*)(sd_bus_message*);
+
+  template <Handler handler>
+  static int to(sd_bus_message* message, void* self, sd_bus_error*) {
+    (static_cast<QVSensorProxyOrientation*>(self)->*handler)(message);
+    return 0;
+  }
+
+  // Makes a call of the daemon in place of the one under way.
+  template <Handler handler, class... Arguments>
+  static int call(QVSensorProxyOrientation& self, const char* interface, const char* member,
+                  bool mayStart, const char* types, Arguments... arguments) {
+    self.forgetCall();
+    sd_bus_message* call = nullptr;
+    int result =
+        sd_bus_message_new_method_call(self.bus_, &call, kService, kPath, interface, member);
+    if (result >= 0) result = sd_bus_message_set_auto_start(call, mayStart ? 1 : 0);
+    if (result >= 0 && sizeof...(arguments) > 0) {
+      result = sd_bus_message_append(call, types, arguments...);
+    }
+    if (result >= 0) {
+      result =
+          sd_bus_call_async(self.bus_, &self.call_, call, to<handler>, &self,
+                            static_cast<uint64_t>(std::chrono::microseconds(kAnswerLimit).count()));
+    }
+    sd_bus_message_unref(call);
+    return result;
+  }
+};
+
+std::string QVSensorProxyOrientation::systemBusAddress() {
+  const char* const address = secure_getenv("DBUS_SYSTEM_BUS_ADDRESS");
+  return address == nullptr || *address == '\0' ? kUsualBus : address;
+}
+
+QVSensorProxyOrientation::QVSensorProxyOrientation(QVLog& log, QVSensorProxyOptions options,
+                                                   QVOrientationRegistrations& registrations)
+    : log_(log),
+      options_(std::move(options)),
+      registrations_(registrations),
+      retry_(options_.firstRetry) {}
+
+// The daemon takes a lost connection for a release as well: so the answer is not waited for.
+QVSensorProxyOrientation::~QVSensorProxyOrientation() {
+  release();
+  close();
+}
+
+QVSensorProxyOrientation::Sleep QVSensorProxyOrientation::sleep() const {
+  Sleep sleep;
+  if (bus_ == nullptr) {
+    if (period_ != QVOrientationRegistrations::kNoDemand) sleep.end = retryAt_;
+    return sleep;
+  }
+  const int events = sd_bus_get_events(bus_);
+  uint64_t limit = 0;
+  if (events < 0 || sd_bus_get_timeout(bus_, &limit) < 0) {
+    sleep.end = Clock::now();
+    return sleep;
+  }
+  sleep.descriptor = sd_bus_get_fd(bus_);
+  sleep.events = static_cast<short>(events);
+  // Both count the kernel's monotonic time.
+  if (limit != UINT64_MAX) sleep.end = Clock::time_point(std::chrono::microseconds(limit));
+  return sleep;
+}
+
+void QVSensorProxyOrientation::work() {
+  followDemand();
+  if (bus_ != nullptr) process();
+  if (bus_ == nullptr && period_ != QVOrientationRegistrations::kNoDemand &&
+      Clock::now() >= retryAt_) {
+    connect();
+  }
+}
+
+void QVSensorProxyOrientation::followDemand() {
+  const auto period = registrations_.period();
+  if (period == period_) return;
+  const bool begins = period_ == QVOrientationRegistrations::kNoDemand;
+  period_ = period;
+  if (period == QVOrientationRegistrations::kNoDemand) {
+    value_.reset();
+    release();
+  } else if (begins) {
+    retry_ = options_.firstRetry;
+    retryAt_ = Clock::now();
+    // The daemon takes calls in their order: so the release is over before.
+    if (state_ == State::releasing) {
+      if (const int result = claim(); result < 0) lose(result);
+    }
+  } else {
+    tell();
+  }
+}
+
+void QVSensorProxyOrientation::connect() {
+  if (const int result = open(); result < 0) lose(result);
+}
+
+int QVSensorProxyOrientation::open() {
+  int result = sd_bus_new(&bus_);
+  if (result >= 0) result = sd_bus_set_address(bus_, options_.busAddress.c_str());
+  if (result >= 0) result = sd_bus_set_bus_client(bus_, 1);
+  if (result >= 0) result = sd_bus_start(bus_);
+  if (result >= 0) {
+    result =
+        sd_bus_add_match_async(bus_, nullptr, kOwnerMatch,
+                               Dispatch::to<&QVSensorProxyOrientation::handleOwner>, nullptr, this);
+  }
+  if (result >= 0) {
+    result = sd_bus_add_match_async(bus_, nullptr, kChangeMatch,
+                                    Dispatch::to<&QVSensorProxyOrientation::handleChange>, nullptr,
+                                    this);
+  }
+  return result < 0 ? result : claim();
+}
+
+// Callbacks run here, between messages: nothing of the bus is at work then.
+void QVSensorProxyOrientation::process() {
+  int result = 1;
+  for (int taken = 0; taken < kMostMessages && result > 0; ++taken) {
+    result = sd_bus_process(bus_, nullptr);
+    tell();
+  }
+  if (result < 0) {
+    lose(result);
+  } else if (period_ == QVOrientationRegistrations::kNoDemand && call_ == nullptr) {
+    close();
+  }
+}
+
+void QVSensorProxyOrientation::close() {
+  forgetCall();
+  bus_ = sd_bus_close_unref(bus_);
+  state_ = State::disconnected;
+  owner_.clear();
+}
+
+void QVSensorProxyOrientation::lose(int error) {
+  close();
+  if (period_ == QVOrientationRegistrations::kNoDemand) return;
+  note("the system bus: " + std::generic_category().message(-error));
+  retryAt_ = Clock::now() + retry_;
+  retry_ = std::min<std::chrono::milliseconds>(2 * retry_, kLongestRetry);
+  value_ = QVOrientation::kUndefined;
+  tell();
+}
+
+int QVSensorProxyOrientation::claim() {
+  state_ = State::claiming;
+  return Dispatch::call<&QVSensorProxyOrientation::finishClaim>(*this, kInterface,
+                                                                "ClaimAccelerometer", true, "");
+}
+
+void QVSensorProxyOrientation::release() {
+  switch (state_) {
+    case State::claiming:
+    case State::claimed:
+      state_ = State::releasing;
+      if (Dispatch::call<&QVSensorProxyOrientation::finishRelease>(
+              *this, kInterface, "ReleaseAccelerometer", false, "") < 0) {
+        close();
+      }
+      break;
+    case State::unclaimed:
+      close();
+      break;
+    case State::disconnected:
+    case State::releasing:
+      break;
+  }
+}
+
+void QVSensorProxyOrientation::finishClaim(sd_bus_message* reply) {
+  forgetCall();
+  retry_ = options_.firstRetry;
+  if (const auto failure = failureOf(reply)) {
+    state_ = State::unclaimed;
+    value_ = QVOrientation::kUndefined;
+    note(*failure);
+    return;
+  }
+  state_ = State::claimed;
+  trouble_.clear();
+  const char* const sender = sd_bus_message_get_sender(reply);
+  owner_ = sender == nullptr ? "" : sender;
+  // A connection that takes no more messages shows in the next step.
+  static_cast<void>(Dispatch::call<&QVSensorProxyOrientation::finishReading>(
+      *this, kPropertiesInterface, "Get", false, "ss", kInterface, kProperty));
+}
+
+void QVSensorProxyOrientation::finishReading(sd_bus_message* reply) {
+  forgetCall();
+  value_ = QVOrientation::kUndefined;
+  if (const auto failure = failureOf(reply)) {
+    note(*failure);
+  } else {
+    value_ = orientationIn(reply);
+  }
+}
+
+void QVSensorProxyOrientation::finishRelease(sd_bus_message*) {
+  forgetCall();
+}
+
+void QVSensorProxyOrientation::handleOwner(sd_bus_message* signal) {
+  const char* name = nullptr;
+  const char* before = nullptr;
+  const char* now = nullptr;
+  if (state_ == State::releasing || sd_bus_message_read(signal, "sss", &name, &before, &now) < 0) {
+    return;
+  }
+  if (*before != '\0') {
+    forgetCall();
+    owner_.clear();
+    state_ = State::unclaimed;
+    value_ = QVOrientation::kUndefined;
+  }
+  // A claim under way is that which made the bus start the daemon.
+  if (*now != '\0' && state_ == State::unclaimed && claim() < 0) state_ = State::unclaimed;
+}
+
+void QVSensorProxyOrientation::handleChange(sd_bus_message* signal) {
+  const char* const sender = sd_bus_message_get_sender(signal);
+  if (state_ != State::claimed || sender == nullptr || owner_ != sender) return;
+  const char* name = nullptr;
+  if (sd_bus_message_skip(signal, "s") < 0 ||
+      sd_bus_message_enter_container(signal, SD_BUS_TYPE_ARRAY, "{sv}") < 0) {
+    return;
+  }
+  while (sd_bus_message_enter_container(signal, SD_BUS_TYPE_DICT_ENTRY, "sv") > 0 &&
+         sd_bus_message_read(signal, "s", &name) > 0) {
+    if (std::string_view(name) == kProperty) {
+      value_ = orientationIn(signal);
+      return;
+    }
+    if (sd_bus_message_skip(signal, "v") < 0 || sd_bus_message_exit_container(signal) < 0) return;
+  }
+}
+
+void QVSensorProxyOrientation::forgetCall() {
+  call_ = sd_bus_slot_unref(call_);
+}
+
+void QVSensorProxyOrientation::tell() {
+  if (value_) registrations_.report(period_, *value_);
+}
+
+void QVSensorProxyOrientation::note(const std::string& trouble) {
+  if (std::exchange(trouble_, trouble) == trouble) return;
+  log_.info(nullptr, "-[QVSensorProxyOrientation note:]", "the device's orientation is undefined, ",
+            trouble);
+}
