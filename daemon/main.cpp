@@ -9,6 +9,8 @@
 #include "platform/linux/QVJSONPreferences.h"
 #include "platform/linux/QVLinuxOrientation.h"
 #include "platform/linux/QVLinuxProcess.h"
+#include "platform/linux/QVPosixFileSystem.h"
+#include "platform/linux/QVRapidJSONOutput.h"
 #include "platform/linux/QVSDTTracePoints.h"
 #include "platform/linux/QVSQLiteEventStore.h"
 #include "platform/linux/QVServiceDirectories.h"
@@ -104,6 +106,8 @@ int runService() {
   platform.preferences = std::make_unique<QVJSONPreferences>(log, directories.preferences());
   platform.deviceInformation =
       std::make_unique<QVJSONDeviceInformation>(log, directories.deviceInformation());
+  platform.fileSystem = std::make_unique<QVPosixFileSystem>(directories.logs);
+  platform.jsonOutput = std::make_unique<QVRapidJSONOutput>();
   log.readSwitchesFrom(platform.preferences.get());
 
   auto ownedConditions = std::make_unique<QVStdConditions>();

@@ -21,7 +21,8 @@ std::filesystem::path directory(const char* variable, const char* usual) {
 QVServiceDirectories QVServiceDirectories::fromEnvironment() {
   return {.runtime = directory("RUNTIME_DIRECTORY", "/run/quietvox"),
           .state = directory("STATE_DIRECTORY", "/var/lib/quietvox"),
-          .configuration = directory("CONFIGURATION_DIRECTORY", "/etc/quietvox")};
+          .configuration = directory("CONFIGURATION_DIRECTORY", "/etc/quietvox"),
+          .logs = directory("LOGS_DIRECTORY", "/var/log/quietvox")};
 }
 
 std::optional<std::string> QVServiceDirectories::obstacle(const std::filesystem::path& directory) {

@@ -10,8 +10,9 @@ struct QVServiceDirectories {
   std::filesystem::path runtime;
   std::filesystem::path state;
   std::filesystem::path configuration;
+  std::filesystem::path logs;
 
-  // From RUNTIME_DIRECTORY, STATE_DIRECTORY and CONFIGURATION_DIRECTORY. A manager
+  // From RUNTIME_DIRECTORY, STATE_DIRECTORY, CONFIGURATION_DIRECTORY and LOGS_DIRECTORY. A manager
   // that was asked for several directories lists them with ":" between; the first is meant.
   static QVServiceDirectories fromEnvironment();
 

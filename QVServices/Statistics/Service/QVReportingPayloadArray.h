@@ -9,7 +9,6 @@
 #include <memory>
 #include <mutex>
 #include <optional>
-#include <string>
 #include <string_view>
 
 // One of a session's two arrays of recorded payloads: the aggregated one, whose entries have no
@@ -22,8 +21,10 @@
 class QVReportingPayloadArray {
  public:
   using Position = QVReportingPayloadStore::Position;
-  // Receives entries in order: the identifier (empty in the aggregated array) and the payload.
-  using Visitor = QVFunction<void(const std::string& identifier, const QVDictionary& payload)>;
+  using Payload = QVReportingPayloadStore::Payload;
+  // Receives entries in order: the identifier, empty for one that has no name, and the payload.
+  // Both last for the call.
+  using Visitor = QVFunction<void(std::string_view identifier, const Payload& payload)>;
 
   explicit QVReportingPayloadArray(std::shared_ptr<QVReportingPayloadStore> store)
       : store_(std::move(store)) {}
@@ -35,6 +36,8 @@ class QVReportingPayloadArray {
   Position append(const QVDictionary& payload);
   // Appends the payload at `position` of the shared store under the identifier BASE_COUNT.
   void append(std::string_view identifierBase, uint32_t count, Position position);
+  // Makes the payload the first entry, without a name.
+  void insertAtFront(const QVDictionary& payload);
 
   std::size_t size() const;
   bool empty() const { return size() == 0; }

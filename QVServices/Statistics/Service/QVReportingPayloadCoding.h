@@ -27,6 +27,8 @@ class QVReportingPayloadDecoder {
   uint64_t number();
   std::string_view text();
   QVValue value();
+  // What comes next, for a decoder that goes on from there.
+  const uint8_t* position() const { return next_; }
 
  private:
   template <class Fixed>

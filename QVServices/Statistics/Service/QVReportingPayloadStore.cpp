@@ -80,19 +80,32 @@ QVReportingPayloadStore::Position QVReportingPayloadStore::append(const QVDictio
   return place(scratch_);
 }
 
-QVDictionary QVReportingPayloadStore::payload(Position position) const {
-  const std::lock_guard lock(mutex_);
-  const Chunk& chunk = chunks_[position >> kOffsetBits];
-  QVReportingPayloadDecoder decoder(chunk.bytes.get() +
-                                    (position & ((Position{1} << kOffsetBits) - 1)));
-  const uint64_t keySet = decoder.number();
-  const Keys* keys = keySet == 0 ? nullptr : &keySets_[keySet - 1];
-  std::vector<QVDictionaryEntry> entries(keys == nullptr ? decoder.number() : keys->size());
-  for (std::size_t i = 0; i < entries.size(); ++i) {
-    entries[i].key = keys == nullptr ? decoder.text() : std::string_view((*keys)[i]);
-    entries[i].value = decoder.value();
+QVReportingPayloadStore::Payload QVReportingPayloadStore::read(
+    Position position, std::vector<QVDictionaryEntry>& room) const {
+  const uint8_t* bytes = nullptr;
+  uint64_t keySet = 0;
+  const std::string* keys = nullptr;
+  {
+    const std::lock_guard lock(mutex_);
+    QVReportingPayloadDecoder decoder(chunks_[position >> kOffsetBits].bytes.get() +
+                                      (position & ((Position{1} << kOffsetBits) - 1)));
+    keySet = decoder.number();
+    if (keySet != 0) {
+      const Keys& set = keySets_[keySet - 1];
+      keys = set.data();
+      room.resize(set.size());
+    } else {
+      room.resize(decoder.number());
+    }
+    bytes = decoder.position();
   }
-  return QVDictionary::assemble(entries);
+  // What has been appended stays as it is and where it is, so nobody need wait for the decoding.
+  QVReportingPayloadDecoder decoder(bytes);
+  for (std::size_t i = 0; i < room.size(); ++i) {
+    room[i].key = keys == nullptr ? decoder.text() : std::string_view(keys[i]);
+    room[i].value = decoder.value();
+  }
+  return {.entries = room, .keySet = keySet};
 }
 
 uint32_t QVReportingPayloadStore::intern(std::string_view text) {
@@ -101,14 +114,13 @@ uint32_t QVReportingPayloadStore::intern(std::string_view text) {
     return known->second;
   }
   const auto number = static_cast<uint32_t>(texts_.size());
-  texts_.emplace_back(text);
-  textNumbers_.emplace(text, number);
+  texts_.push_back(&textNumbers_.emplace(text, number).first->first);
   return number;
 }
 
-std::string QVReportingPayloadStore::interned(uint32_t number) const {
+std::string_view QVReportingPayloadStore::interned(uint32_t number) const {
   const std::lock_guard lock(mutex_);
-  return texts_[number];
+  return *texts_[number];
 }
 
 std::size_t QVReportingPayloadStore::footprint() const {

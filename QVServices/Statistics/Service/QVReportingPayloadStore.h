@@ -6,6 +6,7 @@
 #include <map>
 #include <memory>
 #include <mutex>
+#include <span>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -21,12 +22,22 @@ class QVReportingPayloadStore {
   // Names one payload within its store.
   using Position = uint64_t;
 
+  // A payload while it is looked at: the entries of its dictionary, in ascending order of the keys.
+  // Characters are borrowed from the store, the entries from whoever asked.
+  struct Payload {
+    std::span<const QVDictionaryEntry> entries;
+    // Of one store's payloads, those of the same number other than 0 have the same keys.
+    uint64_t keySet;
+  };
+
   Position append(const QVDictionary& payload);
-  QVDictionary payload(Position position) const;
+  // Decodes the payload into `room`, which is used again and again for one payload after the other.
+  Payload read(Position position, std::vector<QVDictionaryEntry>& room) const;
 
   // A short number for a text that many entries share.
   uint32_t intern(std::string_view text);
-  std::string interned(uint32_t number) const;
+  // Valid as long as the store.
+  std::string_view interned(uint32_t number) const;
 
   // Bytes of memory that the encoded payloads take.
   std::size_t footprint() const;
@@ -61,7 +72,7 @@ class QVReportingPayloadStore {
   std::multimap<std::size_t, std::size_t> keySetsByHash_;
   std::size_t latestKeySet_ = 0;  // index into keySets_; messages come in runs of one kind
   std::vector<Chunk> chunks_;
-  std::vector<std::string> texts_;
   std::map<std::string, uint32_t, std::less<>> textNumbers_;
-  std::string scratch_;  // the payload being encoded, kept for its capacity
+  std::vector<const std::string*> texts_;  // by number: the keys of textNumbers_
+  std::string scratch_;                    // the payload being encoded, kept for its capacity
 };

@@ -169,6 +169,7 @@ void QVReportingSession::stop() {
     log().standard(scope(), kFunction, "sending summary event for reporter ", reporterID_);
     sendMessage(summary, kQVReportingCategorySummary, kQVReportingMessageTypeSummary, true, {});
   }
+  writeSummaryJson();
   beaconQueue_->async([self = shared_from_this()] { self->flushBeaconSession(); });
   replacePayloadArrays(nullptr, nullptr);
   started_ = false;

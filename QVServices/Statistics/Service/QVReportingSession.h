@@ -74,6 +74,9 @@ class QVReportingSession final : public QVReportingSessionInformation,
 
   // The columns of everything recorded; absent where nothing was.
   QVDictionary createSummaryEventForSession() const;
+  // On an internal build, writes what was recorded to a file, behind the user information that it
+  // puts before it. Takes its time; a failure is logged, and nothing else comes of it.
+  void writeSummaryJson();
   bool shouldReportOrientation() const;
 
   bool started() const { return started_; }

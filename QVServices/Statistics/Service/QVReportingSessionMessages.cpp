@@ -1,4 +1,4 @@
-// How a QVReportingSession numbers, records, sends and sums up messages.
+// How a QVReportingSession numbers, records and sends messages.
 
 #include "QVServices/Statistics/QVReportingVocabulary.h"
 #include "QVServices/Statistics/Service/QVReportingBeaconClient.h"
@@ -7,10 +7,8 @@
 #include "QVServices/Statistics/Service/QVReportingSessionLog.h"
 #include "platform/QVPlatform.h"
 
-#include <algorithm>
 #include <chrono>
 #include <utility>
-#include <vector>
 
 namespace {
 
@@ -18,8 +16,6 @@ constexpr uint32_t kTraceMessageSent = 0x21042838;
 
 // Alarms go off at the same moment on every device; their messages are spread over a minute.
 constexpr uint32_t kAlarmsDelayBoundSeconds = 60;
-
-constexpr std::string_view kSummaryEventKey = "QV_Session_Summary_Event";
 
 constexpr const char* kSendFunction = "-[QVReportingSession sendMessage:category:type:sync:reply:]";
 constexpr const char* kSendSingleFunction =
@@ -163,27 +159,4 @@ QVReportingSession::MessageIdentifier QVReportingSession::nextIdentifier(uint32_
 std::string QVReportingSession::messageIdForCategory(uint32_t category, uint16_t type) {
   const MessageIdentifier identifier = nextIdentifier(category, type);
   return QVText(identifier.base, '_', identifier.count);
-}
-
-QVDictionary QVReportingSession::createSummaryEventForSession() const {
-  const auto recorded = aggregatedPayloadData();
-  if (recorded == nullptr || recorded->empty()) return {};
-
-  std::map<std::string, std::string, std::less<>> columns;
-  columns.emplace(kSummaryEventKey, QVText(serviceType()));
-  recorded->forEach([&columns](const std::string&, const QVDictionary& payload) {
-    for (const auto& [key, value] : payload) {
-      const auto column = columns.find(key);
-      if (column == columns.end()) {
-        columns.emplace(key, QVText(value));
-      } else {
-        column->second += ',';
-        QVAppendText(column->second, value);
-      }
-    }
-  });
-  std::vector<QVDictionaryEntry> entries;
-  entries.reserve(columns.size());
-  for (const auto& [key, column] : columns) entries.push_back({key, QVValue::borrowing(column)});
-  return QVDictionary::assemble(entries);
 }

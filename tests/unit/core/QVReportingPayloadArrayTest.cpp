@@ -1,6 +1,7 @@
 #include "QVServices/Statistics/Service/QVReportingPayloadArray.h"
 #include "QVServices/Statistics/Service/QVReportingSession.h"
 #include "platform/fake/QVFakePlatform.h"
+#include "tests/unit/core/QVPayloadReading.h"
 
 #include <atomic>
 #include <memory>
@@ -16,18 +17,14 @@ namespace {
 
 using testing::ElementsAre;
 
+using Payload = QVReportingPayloadArray::Payload;
+
+int64_t integerOf(const Payload& payload, std::string_view key) {
+  return dictionaryOf(payload).find(key)->integer();
+}
+
 class QVReportingPayloadArrayTest : public testing::Test {
  protected:
-  using Entries = std::vector<std::pair<std::string, QVDictionary>>;
-
-  static Entries entriesOf(const QVReportingPayloadArray& array) {
-    Entries entries;
-    array.forEach([&entries](const std::string& identifier, const QVDictionary& payload) {
-      entries.emplace_back(identifier, payload);
-    });
-    return entries;
-  }
-
   std::shared_ptr<QVReportingPayloadStore> store_ = std::make_shared<QVReportingPayloadStore>();
   QVReportingPayloadArray aggregated_{store_};
   QVReportingPayloadArray nested_{store_};
@@ -58,6 +55,21 @@ TEST_F(QVReportingPayloadArrayTest, NamesEntriesThatShareAPayload) {
   EXPECT_EQ(aggregated_.size(), 2u);
 }
 
+TEST_F(QVReportingPayloadArrayTest, TakesAPayloadWithoutANameAtItsFront) {
+  nested_.append("Playback_Start", 1, aggregated_.append({{"n", 1}}));
+  nested_.insertAtFront({{"HostApplicationDisplayID", "net.quillon.player"}});
+  EXPECT_THAT(
+      entriesOf(nested_),
+      ElementsAre(std::pair("", QVDictionary{{"HostApplicationDisplayID", "net.quillon.player"}}),
+                  std::pair("Playback_Start_1", QVDictionary{{"n", 1}})));
+  EXPECT_EQ(aggregated_.size(), 1u);
+}
+
+TEST_F(QVReportingPayloadArrayTest, TakesAPayloadAtItsFrontWhereItIsEmpty) {
+  nested_.insertAtFront({});
+  EXPECT_THAT(entriesOf(nested_), ElementsAre(std::pair("", QVDictionary())));
+}
+
 TEST_F(QVReportingPayloadArrayTest, KeepsTheStoreThatItsEntriesLieIn) {
   aggregated_.append({{"n", 1}});
   store_.reset();
@@ -76,8 +88,8 @@ TEST_F(QVReportingPayloadArrayTest, MayBeAppendedToWhileItIsVisited) {
   constexpr int kEntries = 100;
   for (int i = 0; i < kEntries; ++i) aggregated_.append({{"n", i}});
   int64_t visited = 0;
-  aggregated_.forEach([&](const std::string&, const QVDictionary& payload) {
-    ASSERT_EQ(payload.find("n")->integer(), visited++);
+  aggregated_.forEach([&](std::string_view, const Payload& payload) {
+    ASSERT_EQ(integerOf(payload, "n"), visited++);
     for (int i = 0; i < kEntries; ++i) aggregated_.append({{"n", -1}});
   });
   EXPECT_EQ(visited, kEntries) << "what is there when the visit begins";
@@ -121,12 +133,12 @@ TEST_F(QVReportingPayloadArrayTest, TakesAppendsOfSeveralThreadsWhileItIsIterate
   // Whenever it is visited, each thread's payloads are whole and in their order.
   do {
     std::vector<int64_t> next(kThreads, 0);
-    aggregated_.forEach([&next](const std::string&, const QVDictionary& payload) {
-      const auto thread = static_cast<std::size_t>(payload.find("thread")->integer());
-      ASSERT_EQ(payload.find("n")->integer(), next[thread]++);
+    aggregated_.forEach([&next](std::string_view, const Payload& payload) {
+      const auto thread = static_cast<std::size_t>(integerOf(payload, "thread"));
+      ASSERT_EQ(integerOf(payload, "n"), next[thread]++);
     });
-    nested_.forEach([](const std::string& identifier, const QVDictionary& payload) {
-      ASSERT_EQ(identifier, QVText("of thread_", payload.find("n")->integer() + 1));
+    nested_.forEach([](std::string_view identifier, const Payload& payload) {
+      ASSERT_EQ(identifier, QVText("of thread_", integerOf(payload, "n") + 1));
     });
   } while (running > 0);
   threads.clear();
@@ -141,8 +153,9 @@ TEST(QVReportingSessionPayloadArrays, MayBeReadByOthersWhileTheSessionLives) {
   std::jthread reader([&] {
     while (!done) {
       if (const auto array = session->aggregatedPayloadData()) {
-        array->forEach([](const std::string&, const QVDictionary& payload) {
-          ASSERT_TRUE(payload.contains("n") || payload.contains("QV_Session_Summary_Event"));
+        array->forEach([](std::string_view, const Payload& payload) {
+          const QVDictionary entries = dictionaryOf(payload);
+          ASSERT_TRUE(entries.contains("n") || entries.contains("QV_Session_Summary_Event"));
         });
         // As a callback of another service appends.
         const std::lock_guard lock(*array);

@@ -1,6 +1,7 @@
 #include "QVServices/Statistics/Service/QVReportingPayloadCoding.h"
 #include "QVServices/Statistics/Service/QVReportingPayloadStore.h"
 #include "platform/QVText.h"
+#include "tests/unit/core/QVPayloadReading.h"
 
 #include <bit>
 #include <cmath>
@@ -126,19 +127,55 @@ TEST(QVReportingPayloadStore, GivesPayloadsBack) {
   const auto second = store.append(nested);
   const auto third = store.append({});
   const auto fourth = store.append({{"a", 2}});
-  EXPECT_EQ(store.payload(first), (QVDictionary{{"a", 1}}));
-  EXPECT_EQ(store.payload(second), nested);
-  EXPECT_TRUE(store.payload(third).empty());
-  EXPECT_EQ(store.payload(fourth), (QVDictionary{{"a", 2}}));
+  EXPECT_EQ(payloadAt(store, first), (QVDictionary{{"a", 1}}));
+  EXPECT_EQ(payloadAt(store, second), nested);
+  EXPECT_TRUE(payloadAt(store, third).empty());
+  EXPECT_EQ(payloadAt(store, fourth), (QVDictionary{{"a", 2}}));
 }
 
-TEST(QVReportingPayloadStore, GivesPayloadsThatOutliveIt) {
+TEST(QVReportingPayloadStore, GivesPayloadsWhoseCopiesOutliveIt) {
   QVDictionary payload;
   {
     QVReportingPayloadStore store;
-    payload = store.payload(store.append({{"key", "characters in the store"}}));
+    payload = payloadAt(store, store.append({{"key", "characters in the store"}}));
   }
   EXPECT_EQ(payload, (QVDictionary{{"key", "characters in the store"}}));
+}
+
+TEST(QVReportingPayloadStore, NumbersSetsOfKeys) {
+  QVReportingPayloadStore store;
+  std::vector<QVDictionaryEntry> room;
+  const auto keySetOf = [&](const QVDictionary& payload) {
+    return store.read(store.append(payload), room).keySet;
+  };
+  const uint64_t one = keySetOf({{"a", 1}});
+  const uint64_t two = keySetOf({{"a", 1}, {"b", 2}});
+  EXPECT_NE(one, 0u);
+  EXPECT_NE(two, one);
+  EXPECT_EQ(keySetOf({{"a", "another value"}}), one);
+  EXPECT_EQ(keySetOf({{"a", 3}, {"b", 4}}), two);
+}
+
+TEST(QVReportingPayloadStore, ReadsOnePayloadAfterTheOtherIntoTheSameRoom) {
+  QVReportingPayloadStore store;
+  const auto large = store.append({{"a", QVArray{1}}, {"b", "two"}, {"c", 3}});
+  const auto small = store.append({{"z", 26}});
+  const auto empty = store.append({});
+  std::vector<QVDictionaryEntry> room;
+  EXPECT_EQ(store.read(large, room).entries.size(), 3u);
+  EXPECT_EQ(dictionaryOf(store.read(small, room)), (QVDictionary{{"z", 26}}));
+  EXPECT_TRUE(store.read(empty, room).entries.empty());
+  EXPECT_EQ(dictionaryOf(store.read(large, room)),
+            (QVDictionary{{"a", QVArray{1}}, {"b", "two"}, {"c", 3}}));
+}
+
+TEST(QVReportingPayloadStore, KeepsInternedTextsInTheirPlaces) {
+  QVReportingPayloadStore store;
+  const std::string_view first = store.interned(store.intern("first"));
+  for (int i = 0; i < 1000; ++i) store.intern(QVText("text ", i));
+  EXPECT_EQ(first, "first");
+  EXPECT_EQ(store.interned(store.intern("first")).data(), first.data());
+  EXPECT_EQ(store.interned(store.intern("text 999")), "text 999");
 }
 
 TEST(QVReportingPayloadStore, GivesManyPayloadsOfManyKindsBack) {
@@ -156,7 +193,7 @@ TEST(QVReportingPayloadStore, GivesManyPayloadsOfManyKindsBack) {
   };
   for (int number = 0; number < 3000; ++number) positions.push_back(store.append(message(number)));
   for (int number = 0; number < 3000; ++number) {
-    ASSERT_EQ(store.payload(positions[static_cast<std::size_t>(number)]), message(number))
+    ASSERT_EQ(payloadAt(store, positions[static_cast<std::size_t>(number)]), message(number))
         << number;
   }
 }
@@ -178,7 +215,7 @@ TEST(QVReportingPayloadStore, WritesKeysOutBeyondTheSetsThatItRemembers) {
   }
   EXPECT_GT(store.footprint(), (kSets - kRememberedSets) * kKeyBytes) << "keys lie here";
   for (int number = 0; number < kSets; ++number) {
-    ASSERT_EQ(store.payload(positions[static_cast<std::size_t>(number)]), message(number));
+    ASSERT_EQ(payloadAt(store, positions[static_cast<std::size_t>(number)]), message(number));
   }
 }
 
@@ -193,7 +230,7 @@ TEST(QVReportingPayloadStore, RemembersNoMoreThanAMebibyteOfKeys) {
   for (int number = 0; number < kSets; ++number) positions.push_back(store.append(message(number)));
   EXPECT_GT(store.footprint(), (kSets - 11) * kKeyBytes) << "ten of them are remembered";
   for (int number = 0; number < kSets; ++number) {
-    ASSERT_EQ(store.payload(positions[static_cast<std::size_t>(number)]), message(number));
+    ASSERT_EQ(payloadAt(store, positions[static_cast<std::size_t>(number)]), message(number));
   }
 }
 

@@ -2,6 +2,7 @@
 
 #include "QVServices/Statistics/Service/QVReportingSession.h"
 #include "tests/support/QVServiceFixture.h"
+#include "tests/unit/core/QVPayloadReading.h"
 
 #include <optional>
 
@@ -39,9 +40,9 @@ class QVReportingSessionMessagesTest : public QVServiceFixture {
   }
   static std::vector<std::string> recorded(const QVReportingPayloadArray& array) {
     std::vector<std::string> texts;
-    array.forEach([&texts](const std::string& identifier, const QVDictionary& payload) {
+    for (const auto& [identifier, payload] : entriesOf(array)) {
       texts.push_back(QVText(identifier, '=', payload));
-    });
+    }
     return texts;
   }
 };

@@ -2,6 +2,7 @@
 
 #include "QVServices/Statistics/Service/QVReportingSession.h"
 #include "tests/support/QVServiceFixture.h"
+#include "tests/unit/core/QVPayloadReading.h"
 
 #include <cmath>
 
@@ -95,9 +96,7 @@ TEST_F(QVReportingSummaryEventTest, IsRecordedAndNumberedWhenTheSessionStops) {
   const auto nested = session_->nestedAggregatedPayloadData();
   session_->stop();
   std::vector<std::string> identifiers;
-  nested->forEach([&identifiers](const std::string& identifier, const QVDictionary&) {
-    identifiers.push_back(identifier);
-  });
+  for (const auto& [identifier, payload] : entriesOf(*nested)) identifiers.push_back(identifier);
   EXPECT_THAT(identifiers, testing::ElementsAre("Session_Playback_Start_1", "Undefined_Unknown_1"));
   EXPECT_EQ(aggregated->size(), 2u);
 }
