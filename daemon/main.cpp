@@ -2,6 +2,7 @@
 
 #include "QVServices/Statistics/Service/QVReportingServiceMain.h"
 #include "platform/QVPlatform.h"
+#include "platform/linux/QVAsioRunLoopThreads.h"
 #include "platform/linux/QVAsioWorkQueues.h"
 #include "platform/linux/QVDirectoryWatcher.h"
 #include "platform/linux/QVInotifyNotifications.h"
@@ -116,6 +117,7 @@ int runService() {
   QVAsioWorkQueues& queues = *ownedQueues;
   platform.conditions = std::move(ownedConditions);
   platform.queues = std::move(ownedQueues);
+  platform.runLoopThreads = std::make_unique<QVAsioRunLoopThreads>(log);
 
   const auto store = std::make_shared<QVSQLiteEventStore>(
       log, *platform.clock, *platform.preferences,

@@ -2,7 +2,9 @@
 
 #include "platform/fake/QVFakeConditions.h"
 #include "platform/fake/QVFakeLog.h"
+#include "platform/fake/QVFakeRunLoopThreads.h"
 #include "platform/fake/QVFakeWorkQueues.h"
+#include "platform/linux/QVAsioRunLoopThreads.h"
 #include "platform/linux/QVAsioWorkQueues.h"
 #include "platform/linux/QVStdConditions.h"
 
@@ -16,6 +18,10 @@ class QVCountdown {
  public:
   explicit QVCountdown(int count) : count_(count) {}
 
+  void expectMore(int count) {
+    const std::lock_guard lock(mutex_);
+    count_ += count;
+  }
   void hit() {
     const std::lock_guard lock(mutex_);
     --count_;
@@ -36,12 +42,13 @@ class QVCountdown {
   int count_;
 };
 
-// Fake queues and conditions in one virtual time, and how a test lets them work until an event: by
-// running them on its thread. The limit only ends a test that has failed.
+// Fake queues, conditions and threads in one virtual time, and how a test lets them work until an
+// event: by running them on its thread. The limit only ends a test that has failed.
 class QVFakeQueueHarness {
  public:
   QVWorkQueues& queues() { return queues_; }
   QVFakeConditions& conditions() { return conditions_; }
+  QVFakeRunLoopThreads& runLoopThreads() { return runLoopThreads_; }
   QVFakeLog& log() { return log_; }
 
   bool runUntil(QVCountdown& countdown) {
@@ -54,6 +61,7 @@ class QVFakeQueueHarness {
   QVFakeLog log_;
   QVFakeWorkQueues queues_{clock_, log_};
   QVFakeConditions conditions_{queues_, clock_};
+  QVFakeRunLoopThreads runLoopThreads_{queues_, clock_, log_};
 };
 
 // The adapters in the same shape: their threads work by themselves and the test waits.
@@ -61,6 +69,7 @@ class QVRealQueueHarness {
  public:
   QVWorkQueues& queues() { return queues_; }
   QVStdConditions& conditions() { return conditions_; }
+  QVAsioRunLoopThreads& runLoopThreads() { return runLoopThreads_; }
   QVFakeLog& log() { return log_; }
 
   static bool runUntil(QVCountdown& countdown) {
@@ -71,4 +80,5 @@ class QVRealQueueHarness {
   QVFakeLog log_;
   QVStdConditions conditions_;
   QVAsioWorkQueues queues_{log_};
+  QVAsioRunLoopThreads runLoopThreads_{log_};
 };

@@ -1,0 +1,38 @@
+#include "platform/linux/QVAsioRunLoop.h"
+
+#include "platform/linux/QVAsioRunLoopTimer.h"
+#include "platform/linux/QVAsioRunLoopWaits.h"
+
+#include <exception>
+#include <utility>
+
+QVAsioRunLoop::QVAsioRunLoop(std::string threadName, QVLog& log)
+    : threadName_(std::move(threadName)),
+      log_(log),
+      waits_(std::make_shared<QVAsioRunLoopWaits>()) {}
+
+QVAsioRunLoop::~QVAsioRunLoop() {
+  waits_->spendAll();
+}
+
+void QVAsioRunLoop::attach(std::shared_ptr<QVRunLoopTimer> timer) {
+  // Timers come from the same maker as the loop.
+  auto attached = std::static_pointer_cast<QVAsioRunLoopTimer>(std::move(timer));
+  // First, so that a move from now on is noticed.
+  attached->attachTo(waits_);
+  waits_->add(std::move(attached));
+}
+
+void QVAsioRunLoop::run() {
+  waits_->prepareRun();
+  for (;;) {
+    try {
+      waits_->run();
+      return;
+    } catch (const std::exception& exception) {
+      log_.error(nullptr, __func__, "exception in run loop ", threadName_, ": ", exception.what());
+    } catch (...) {
+      log_.error(nullptr, __func__, "exception in run loop ", threadName_, ": of unknown type");
+    }
+  }
+}

@@ -1,0 +1,85 @@
+#include "platform/linux/QVAsioRunLoopThreads.h"
+
+#include "platform/linux/QVAsioRunLoop.h"
+#include "platform/linux/QVAsioRunLoopTimer.h"
+#include "platform/linux/QVThreads.h"
+#include "platform/linux/QVWakeUpBatch.h"
+#include "platform/linux/QVWorkerBlocking.h"
+
+#include <atomic>
+#include <exception>
+#include <string>
+#include <system_error>
+#include <utility>
+
+class QVAsioRunLoopThreads::Handle final : public QVRunLoopThread {
+ public:
+  explicit Handle(std::string_view name) : name_(name) {}
+
+  std::string_view name() const override { return name_; }
+  bool isFinished() const override { return isFinished_; }
+
+  // The thread's whole life.
+  void run(Body body, QVLog& log) {
+    QVPrepareThread(name_, 0);
+    {
+      QVAsioRunLoop loop(name_, log);
+      try {
+        body(loop);
+      } catch (const std::exception& exception) {
+        log.error(nullptr, __func__, "exception in thread ", name_, ": ", exception.what());
+      } catch (...) {
+        log.error(nullptr, __func__, "exception in thread ", name_, ": of unknown type");
+      }
+    }
+    body = nullptr;
+    isFinished_ = true;
+  }
+
+ private:
+  const std::string name_;
+  std::atomic<bool> isFinished_{false};
+};
+
+QVAsioRunLoopThreads::~QVAsioRunLoopThreads() {
+  std::vector<Started> threads;
+  {
+    const QVMutexLock lock(mutex_);
+    threads.swap(threads_);
+  }
+  for (Started& started : threads) started.thread.join();
+}
+
+std::shared_ptr<QVRunLoopThread> QVAsioRunLoopThreads::startThread(std::string_view name,
+                                                                   Body body) {
+  const QVMutexLock lock(mutex_);
+  std::erase_if(threads_, [](Started& started) {
+    if (!started.handle->isFinished()) return false;
+    started.thread.join();
+    return true;
+  });
+  threads_.push_back({std::make_shared<Handle>(name), {}});
+  auto& [handle, thread] = threads_.back();
+  try {
+    thread = std::thread([handle = handle, body = std::move(body), &log = log_]() mutable {
+      handle->run(std::move(body), log);
+    });
+  } catch (const std::system_error& failure) {
+    log_.error(nullptr, __func__, "no thread for ", name, ": ", failure.what());
+    threads_.pop_back();
+    return nullptr;
+  }
+  return handle;
+}
+
+std::shared_ptr<QVRunLoopTimer> QVAsioRunLoopThreads::makeTimer(QVDuration delay,
+                                                                QVFunction<void()> action) {
+  return std::make_shared<QVAsioRunLoopTimer>(delay, std::move(action));
+}
+
+void QVAsioRunLoopThreads::pause(QVDuration duration) {
+  if (duration <= QVDuration::zero()) return;
+  QVWakeUpBatch::wakeNow();
+  const QVWorkerBlocking blocking;
+  std::this_thread::sleep_for(duration);
+}
