@@ -4,10 +4,23 @@
 
 QVReportingServiceDelegate& QVServiceFixture::service() {
   if (service_ == nullptr) {
-    service_ = QVReportingServiceDelegate::init();
-    platform_.listener().setDelegate(service_);
+    startService();
+    journal_.forget();
   }
   return *service_;
+}
+
+void QVServiceFixture::startService() {
+  service_ = QVReportingServiceDelegate::init();
+  platform_.listener().setDelegate(service_);
+}
+
+void QVServiceFixture::switchReporting(bool enabled) {
+  service();
+  platform_.preferences().setValue(kPreferencesDomain, "disable_reporting", !enabled);
+  postDefaultsNotification();
+  runServerQueue();
+  journal_.forget();
 }
 
 QVTestClient& QVServiceFixture::connectClient(int32_t pid) {
@@ -81,6 +94,10 @@ std::string clientLine(QVLogLevel level, std::string_view operation, std::string
 
 std::string sessionLine(QVLogLevel level, std::string_view operation, std::string_view text) {
   return logEntry(level, "qvrr", QVText("-[QVReportingSession ", operation, ']'), text);
+}
+
+std::string driverLine(QVLogLevel level, std::string_view operation, std::string_view text) {
+  return logEntry(level, "qvrd", QVText("-[QVReportingDriverUtility ", operation, ']'), text);
 }
 
 std::string singleLine(QVLogLevel level, std::string_view text, std::string_view scope) {

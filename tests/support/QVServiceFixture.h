@@ -26,6 +26,9 @@ inline constexpr uint32_t kTraceSessionStopped = 0x21042830;
 inline constexpr uint32_t kTraceSessionDestroyed = 0x21042834;
 inline constexpr uint32_t kTraceMessageSent = 0x21042838;
 
+inline constexpr std::string_view kPreferencesDomain = "net.quillon.quietvox";
+inline constexpr std::string_view kDefaultsNotification = "net.quillon.quietvox.reporting";
+
 inline constexpr std::string_view kServerQueue = "net.quillon.quietvox.reporting.server";
 inline constexpr std::string_view kSessionQueue = "net.quillon.quietvox.session.beacon";
 
@@ -33,16 +36,23 @@ inline constexpr std::string_view kSessionQueue = "net.quillon.quietvox.session.
 // runs the queues and moves the time, and reads in the journal what happened in which order.
 //
 // The service starts with the first client, or when service() is first asked for, so that a test
-// can set the verbose switches before: they are read as scopes are registered.
+// can set the verbose switches before: they are read as scopes are registered. The journal starts
+// empty behind that, but for a service that startService() started.
 class QVServiceFixture : public testing::Test {
  protected:
   QVServiceFixture() { journal_.listenTo(QVPlatform::shared()); }
 
   QVReportingServiceDelegate& service();
+  void startService();
   void endService() { service_.reset(); }
   void makeServerVerbose() { platform_.log().setVerbose("reporting_server_verbose", true); }
   void makeSessionsVerbose() { platform_.log().setVerbose("reporting_session_verbose", true); }
   void makeInternalBuild() { platform_.deviceInformation().setAnswer("InternalBuild", true); }
+
+  // What some process does that changed the preferences; the delivery waits on the server queue.
+  void postDefaultsNotification() { platform_.notifications().post(kDefaultsNotification); }
+  // Changes the preference and posts; the delivery has run, the journal starts empty behind it.
+  void switchReporting(bool enabled);
 
   // Connects; the registration waits on the server queue.
   QVTestClient& connectClient(int32_t pid);
@@ -78,6 +88,7 @@ class QVServiceFixture : public testing::Test {
 std::string hostLine(QVLogLevel level, std::string_view operation, std::string_view text);
 std::string clientLine(QVLogLevel level, std::string_view operation, std::string_view text);
 std::string sessionLine(QVLogLevel level, std::string_view operation, std::string_view text);
+std::string driverLine(QVLogLevel level, std::string_view operation, std::string_view text);
 // Of the session's class operation that sends single messages.
 std::string singleLine(QVLogLevel level, std::string_view text, std::string_view scope = "qvrr");
 // Of QVReportingUtilityWait, on the sessions' scope.

@@ -4,7 +4,7 @@
 
 namespace {
 
-std::shared_ptr<QVWorkQueue>& sharedQueue() {
+std::shared_ptr<QVWorkQueue>& serverQueue() {
   static std::shared_ptr<QVWorkQueue> queue;
   return queue;
 }
@@ -14,11 +14,15 @@ const QVLogScope* sharedLogScope = nullptr;
 }  // namespace
 
 void QVReportingServer::setQueue(std::shared_ptr<QVWorkQueue> queue) {
-  sharedQueue() = std::move(queue);
+  serverQueue() = std::move(queue);
 }
 
 QVWorkQueue& QVReportingServer::queue() {
-  return *sharedQueue();
+  return *serverQueue();
+}
+
+const std::shared_ptr<QVWorkQueue>& QVReportingServer::sharedQueue() {
+  return serverQueue();
 }
 
 void QVReportingServer::setLogScope(const QVLogScope* scope) {

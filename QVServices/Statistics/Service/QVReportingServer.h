@@ -12,6 +12,8 @@ class QVReportingServer {
  public:
   static void setQueue(std::shared_ptr<QVWorkQueue> queue);
   static QVWorkQueue& queue();
+  // The same, for whoever keeps it.
+  static const std::shared_ptr<QVWorkQueue>& sharedQueue();
 
   static void setLogScope(const QVLogScope* scope);
   // Null, which is the default log, until it is registered.

@@ -204,7 +204,7 @@ void QVReportingServerInstance::stop(int64_t reporterID, Reply<bool>& reply) {
       session->sendMessage(grown, kQVReportingCategoryTallying, kQVReportingMessageTypeGeneric, {});
       log().standard(scope(), kFunction, "fetching driver logs ", grown);
     }
-    session->setDriverSnapShot({});
+    session->setDriverSnapShot(nullptr);
     session->stop();
     if (auto waiting = std::exchange(session->transactionCompleteBlock(), nullptr)) waiting(true);
   }

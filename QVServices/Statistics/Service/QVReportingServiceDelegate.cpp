@@ -8,12 +8,19 @@
 #include <chrono>
 #include <cmath>
 #include <utility>
+#include <vector>
 
 namespace {
 
 constexpr const char* kConnectionFunction =
     "-[QVReportingServiceDelegate listener:shouldAcceptNewConnection:]";
 constexpr const char* kLookupFunction = "-[QVReportingServiceDelegate findReportingSessionForID:]";
+constexpr const char* kListenFunction =
+    "-[QVReportingServiceDelegate listenForDefaultsNotification]";
+constexpr const char* kPreferencesDomain = "net.quillon.quietvox";
+constexpr const char* kDefaultsNotification = "net.quillon.quietvox.reporting";
+constexpr const char* kDeviceName = "device_name";
+constexpr const char* kDisableReporting = "disable_reporting";
 constexpr const char* kUptimeEvent = "net.quillon.quietvox.qvreportingclientuptime";
 
 using Client = QVReportingServerInstance;
@@ -77,21 +84,56 @@ void handleInvalidation(const std::shared_ptr<Client>& client, int32_t pid) {
 }  // namespace
 
 std::shared_ptr<QVReportingServiceDelegate> QVReportingServiceDelegate::init() {
-  QVReportingServer::setLogScope(log().registerScope(
-      true, 0x71767273, "qvrs", "net.quillon.quietvox", "reporting_server_verbose", 31));
-  return std::shared_ptr<QVReportingServiceDelegate>(new QVReportingServiceDelegate);
-}
-
-QVReportingServiceDelegate::QVReportingServiceDelegate() {
+  QVReportingServer::setLogScope(log().registerScope(true, 0x71767273, "qvrs", kPreferencesDomain,
+                                                     "reporting_server_verbose", 31));
+  std::shared_ptr<QVReportingServiceDelegate> delegate(new QVReportingServiceDelegate);
   QVReportingServer::setQueue(platform().queues->makeSerialQueue(
       "net.quillon.quietvox.reporting.server", QVQualityOfService::userInteractive, 0));
-  driverUtility_ = QVReportingDriverUtility::init();
+  delegate->listenForDefaultsNotification();
+  delegate->driverUtility_ = QVReportingDriverUtility::init();
+  return delegate;
 }
 
 QVReportingServiceDelegate::~QVReportingServiceDelegate() {
+  platform().notifications->cancel(defaultsToken_);
   // Queue and scope belong to the platform, which may end right after.
   QVReportingServer::setQueue(nullptr);
   QVReportingServer::setLogScope(nullptr);
+}
+
+QVDictionary QVReportingServiceDelegate::QVReportingDefaults() {
+  const QVDictionary values = platform().preferences->valuesInDomain(kPreferencesDomain);
+  std::vector<QVDictionaryEntry> defaults;
+  const auto deviceName = QVPreferences::stringReading(values.find(kDeviceName));
+  if (deviceName) defaults.push_back({kDeviceName, *deviceName});
+  const QVValue* disabled = values.find(kDisableReporting);
+  const bool hasValue = disabled != nullptr && !disabled->isAbsent();
+  defaults.push_back({kDisableReporting,
+                      hasValue ? QVValue(QVPreferences::booleanReading(disabled)) : QVValue(0)});
+  return QVDictionary::assemble(defaults);
+}
+
+void QVReportingServiceDelegate::listenForDefaultsNotification() {
+  const uint32_t status = platform().notifications->registerDispatch(
+      kDefaultsNotification, defaultsToken_, QVReportingServer::sharedQueue(),
+      // A delivery that is enqueued when the service ends finds nobody.
+      [delegate = weak_from_this()](int32_t token) {
+        if (const auto self = delegate.lock()) self->handleDefaultsNotification(token);
+      });
+  log().standard(scope(), kListenFunction, "notify setup result ", static_cast<int32_t>(status));
+}
+
+void QVReportingServiceDelegate::handleDefaultsNotification(int32_t token) {
+  if (token != defaultsToken_) return;
+  log().standard(scope(), kListenFunction, "re-reading quietvox defaults");
+  defaults_ = QVReportingDefaults();
+  log().info(scope(), kListenFunction, "defaults ", defaults_);
+  for (const auto& client : clients_) {
+    for (const auto& [reporterID, session] : client->clientReportingSessionMap()) {
+      session->updateDefaults(defaults_);
+    }
+  }
+  reportingEnabled_ = !QVPreferences::booleanReading(defaults_.find(kDisableReporting));
 }
 
 bool QVReportingServiceDelegate::listener(

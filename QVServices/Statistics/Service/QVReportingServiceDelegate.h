@@ -4,12 +4,16 @@
 #include "QVServices/Statistics/Service/QVReportingServiceDelegateProtocol.h"
 #include "platform/QVIPC.h"
 
+#include <cstdint>
 #include <memory>
 #include <mutex>
 
 // The service's one host object: accepts every client, gives each a QVReportingServerInstance,
 // keeps the list of clients and the service-wide state, and tells the analytics event service how
 // long a client was there.
+//
+// Preferences and the reporting switch change when the notification about them is posted, at no
+// other time: until the first one there are no defaults and reporting is enabled.
 //
 // Threads: created before the listener is resumed. New connections come on the listener's thread,
 // the handlers of connections on their IPC threads, everything else on the server queue, which this
@@ -34,26 +38,33 @@ class QVReportingServiceDelegate final
   const Clients& getAllClients() const override { return clients_; }
   bool isReportingEnabled() const override { return reportingEnabled_; }
   std::shared_ptr<QVReportingSession> findReportingSessionForID(int64_t reporterID) const override;
-  QVDictionary getSnapShot() const override { return driverUtility_->getSnapShot(); }
-  QVDictionary getDriverStatisticsRelativeToSnapShot(const QVDictionary& snapShot) const override {
+  SnapShot getSnapShot() const override { return driverUtility_->getSnapShot(); }
+  QVDictionary getDriverStatisticsRelativeToSnapShot(const SnapShot& snapShot) const override {
     return driverUtility_->getDriverStatisticsRelativeToSnapShot(snapShot);
   }
   void removeClient(const QVReportingServerInstance& client) override;
 
-  // The reporting switch and the service-wide preferences. Server queue.
-  void setReportingEnabled(bool enabled) { reportingEnabled_ = enabled; }
-  void setDefaults(QVDictionary defaults) { defaults_ = std::move(defaults); }
+  // The service-wide preferences, read afresh: "disable_reporting" always, "device_name" where it
+  // is set. Any thread.
+  static QVDictionary QVReportingDefaults();
 
  private:
-  QVReportingServiceDelegate();
+  QVReportingServiceDelegate() = default;
 
+  // Reads the preferences, hands them to every session and sets the switch whenever the
+  // notification is posted; never by itself.
+  void listenForDefaultsNotification();
+  void handleDefaultsNotification(int32_t token);
   void registerClient(const std::shared_ptr<QVReportingServerInstance>& client, int32_t pid);
 
   mutable std::recursive_mutex mutex_;
+
+  // Constant after creation.
+  int32_t defaultsToken_ = 0;  // of the registered notification; 0 where there is none
+  std::shared_ptr<QVReportingDriverUtility> driverUtility_;
 
   // Server queue only, but for the time of creation.
   Clients clients_;
   bool reportingEnabled_ = true;
   QVDictionary defaults_;
-  std::shared_ptr<QVReportingDriverUtility> driverUtility_;
 };

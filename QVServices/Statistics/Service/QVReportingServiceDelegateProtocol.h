@@ -1,5 +1,6 @@
 #pragma once
 
+#include "QVServices/Statistics/QVReportingDriverSnapShot.h"
 #include "platform/QVValue.h"
 
 #include <cstdint>
@@ -16,6 +17,7 @@ class QVReportingSession;
 class QVReportingServiceDelegateProtocol {
  public:
   using Clients = std::vector<std::shared_ptr<QVReportingServerInstance>>;
+  using SnapShot = std::shared_ptr<const QVReportingDriverSnapShot>;
 
   virtual ~QVReportingServiceDelegateProtocol() = default;
 
@@ -28,10 +30,10 @@ class QVReportingServiceDelegateProtocol {
   // no client has such a session.
   virtual std::shared_ptr<QVReportingSession> findReportingSessionForID(
       int64_t reporterID) const = 0;
-  // What the drivers count now, and what grew since a snapshot (absent: nothing did).
-  virtual QVDictionary getSnapShot() const = 0;
-  virtual QVDictionary getDriverStatisticsRelativeToSnapShot(
-      const QVDictionary& snapShot) const = 0;
+  // What the drivers count now, never absent; and what grew since a snapshot, or in all where the
+  // snapshot is absent (absent: nothing did).
+  virtual SnapShot getSnapShot() const = 0;
+  virtual QVDictionary getDriverStatisticsRelativeToSnapShot(const SnapShot& snapShot) const = 0;
   // Takes the client off the list; no effect where it is not on it.
   virtual void removeClient(const QVReportingServerInstance& client) = 0;
 };

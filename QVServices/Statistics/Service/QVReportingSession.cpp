@@ -18,9 +18,6 @@ constexpr uint32_t kTraceDestroyed = 0x21042834;
 
 constexpr const char* kBackendWaitSeconds = "9.0";
 
-// Device class on which orientation means nothing.
-constexpr int32_t kDeviceClassWithoutOrientation = 6;
-
 QVPlatform& platform() {
   return QVPlatform::shared();
 }
@@ -110,10 +107,7 @@ void QVReportingSession::start() {
   started_ = true;
   makeEmptyPayloadArrays();
   platform().tracePoints->mark(kTraceStarted);
-  if (shouldReportOrientation()) {
-    orientationCallbackID_ = QVText("QVReportingService ", reporterID_);
-    startDate_ = platform().clock->currentDate();
-  }
+  if (shouldReportOrientation()) registerForOrientation();
   // Name and type are those of now, the user information is read when the set-up runs.
   beaconQueue_->async([self = shared_from_this(), serviceName = serviceName_,
                        serviceType = serviceType(), startFlag = beaconSessionStarted()] {
@@ -158,7 +152,7 @@ void QVReportingSession::setUpBeaconSession(const std::optional<std::string_view
 void QVReportingSession::stop() {
   constexpr const char* kFunction = "-[QVReportingSession stop]";
   log().verbose(scope(), kFunction, "ending session ", reporterID_);
-  if (shouldReportOrientation() && orientationCallbackID_) orientationCallbackID_.reset();
+  if (shouldReportOrientation()) unregisterFromOrientation();
   if (!started_) return;
 
   // Written again for a started session; tools count on two lines.
@@ -185,22 +179,13 @@ void QVReportingSession::flushBeaconSession() {
   beaconSession_ = nullptr;
 }
 
-bool QVReportingSession::shouldReportOrientation() const {
-  const uint16_t type = serviceType();
-  return QVReportingIsInternalBuild() &&
-         (type == kQVReportingServiceTypeLongFormAudio ||
-          type == kQVReportingServiceTypeTelephony) &&
-         platform().deviceInformation->integerAnswer("DeviceClassNumber").value_or(0) !=
-             kDeviceClassWithoutOrientation;
-}
-
 std::shared_ptr<QVReportingPayloadArray> QVReportingSession::aggregatedPayloadData() const {
-  const std::lock_guard lock(payloadArraysMutex_);
+  const std::lock_guard lock(propertiesMutex_);
   return aggregatedPayloadData_;
 }
 
 std::shared_ptr<QVReportingPayloadArray> QVReportingSession::nestedAggregatedPayloadData() const {
-  const std::lock_guard lock(payloadArraysMutex_);
+  const std::lock_guard lock(propertiesMutex_);
   return nestedAggregatedPayloadData_;
 }
 
@@ -218,12 +203,12 @@ void QVReportingSession::replacePayloadArrays(std::shared_ptr<QVReportingPayload
                               std::shared_ptr<QVReportingPayloadArray>& replacement) {
     std::shared_ptr<QVReportingPayloadArray> old;
     {
-      const std::lock_guard lock(payloadArraysMutex_);
+      const std::lock_guard lock(propertiesMutex_);
       old = property;
     }
     std::unique_lock<QVReportingPayloadArray> arrayLock;
     if (old) arrayLock = std::unique_lock(*old);
-    const std::lock_guard lock(payloadArraysMutex_);
+    const std::lock_guard lock(propertiesMutex_);
     property = std::move(replacement);
   };
   replace(aggregatedPayloadData_, aggregated);

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "QVServices/Statistics/QVReportingDriverSnapShot.h"
 #include "QVServices/Statistics/QVReportingSessionInformation.h"
 #include "QVServices/Statistics/QVReportingUserInfo.h"
 #include "QVServices/Statistics/Service/QVReportingPayloadArray.h"
@@ -29,15 +30,18 @@
 //
 // Created and Stopped: messages are counted and go out as single messages. From `start` on they are
 // collected for the summary and sent into the framework session (dropped without backends).
-// Dropping a started session neither stops nor summarises it.
+// Dropping a started session neither stops nor summarises it. One that reports its orientation is
+// kept alive by the orientation service until it is stopped.
 //
 // Threads: the operations run on the server queue; properties that other threads read are atomic or
 // locked as noted. Everything of the framework session happens on `beaconQueue`, in the order in
-// which it was queued; the set-up there waits for backends, so no message overtakes it.
+// which it was queued; the set-up there waits for backends, so no message overtakes it. Changes of
+// the orientation come on the orientation service's thread.
 class QVReportingSession final : public QVReportingSessionInformation,
                                  public std::enable_shared_from_this<QVReportingSession> {
  public:
   using SendReply = Reply<std::optional<QVError>>;
+  using DriverSnapShot = std::shared_ptr<const QVReportingDriverSnapShot>;
 
   static std::shared_ptr<QVReportingSession> initWithID(int64_t reporterID,
                                                         std::vector<int32_t> processIdentifiers);
@@ -92,12 +96,13 @@ class QVReportingSession final : public QVReportingSessionInformation,
   const std::map<std::string, uint32_t, std::less<>>& messageTypeCounts() const {
     return messageTypeCounts_;
   }
-  const std::optional<std::string>& orientationCallbackID() const { return orientationCallbackID_; }
-  const std::optional<QVDate>& startDate() const { return startDate_; }
+  // While orientation callbacks are registered, and after it where they stay registered.
+  std::optional<std::string> orientationCallbackID() const;
+  std::optional<QVDate> startDate() const;
 
   // Kept here for the operations that start and stop the session; absent when cleared.
-  const QVDictionary& driverSnapShot() const { return driverSnapShot_; }
-  void setDriverSnapShot(QVDictionary snapShot) { driverSnapShot_ = std::move(snapShot); }
+  const DriverSnapShot& driverSnapShot() const { return driverSnapShot_; }
+  void setDriverSnapShot(DriverSnapShot snapShot) { driverSnapShot_ = std::move(snapShot); }
   Reply<bool>& transactionCompleteBlock() { return transactionCompleteBlock_; }
   void setTransactionCompleteBlock(Reply<bool> block) {
     transactionCompleteBlock_ = std::move(block);
@@ -120,6 +125,10 @@ class QVReportingSession final : public QVReportingSessionInformation,
   void sendOnBeaconQueue(const Message& message);
   void flushBeaconSession();
 
+  void registerForOrientation();
+  void unregisterFromOrientation();
+  void recordOrientation(std::string_view mode, int32_t orientation) const;
+
   MessageIdentifier nextIdentifier(uint32_t category, uint16_t type);
   void record(const QVDictionary& payload, const MessageIdentifier& identifier);
   void replacePayloadArrays(std::shared_ptr<QVReportingPayloadArray> aggregated,
@@ -136,17 +145,18 @@ class QVReportingSession final : public QVReportingSessionInformation,
   std::atomic<bool> started_{false};
   std::atomic<bool> beaconSessionStarted_{false};
   std::atomic<uint16_t> serviceType_;
-  mutable std::mutex payloadArraysMutex_;  // guards the two pointers, not what they point to
+  mutable std::mutex propertiesMutex_;
+  // Guarded by propertiesMutex_; of the arrays the pointers, not what they point to.
   std::shared_ptr<QVReportingPayloadArray> aggregatedPayloadData_;
   std::shared_ptr<QVReportingPayloadArray> nestedAggregatedPayloadData_;
+  std::optional<std::string> orientationCallbackID_;
+  std::optional<QVDate> startDate_;
 
   // Server queue only.
   std::optional<std::string_view> serviceName_;
-  QVDictionary driverSnapShot_;
+  DriverSnapShot driverSnapShot_;
   Reply<bool> transactionCompleteBlock_;
   std::map<std::string, uint32_t, std::less<>> messageTypeCounts_;
-  std::optional<std::string> orientationCallbackID_;
-  std::optional<QVDate> startDate_;
 
   // beaconQueue only.
   std::shared_ptr<QVBeaconSession> beaconSession_;

@@ -207,8 +207,11 @@ class QVReportingInterleavingTest : public QVServiceFixture,
     connected_.erase(connected_.begin() + static_cast<std::ptrdiff_t>(index));
   }
   void setReportingEnabled(bool enabled) {
-    // In its place among the operations.
-    QVReportingServer::queue().async([this, enabled] { service().setReportingEnabled(enabled); });
+    // In its place among the operations: the preference changes right before it is read.
+    QVReportingServer::queue().async([this, enabled] {
+      platform_.preferences().setValue(kPreferencesDomain, "disable_reporting", !enabled);
+    });
+    postDefaultsNotification();
     model_.enabled = enabled;
   }
 

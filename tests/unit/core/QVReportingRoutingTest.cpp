@@ -193,7 +193,8 @@ TEST_F(QVReportingRoutingTest, SendsAStandAloneMessageWhereNothingIsStarted) {
 }
 
 TEST_F(QVReportingRoutingTest, SendsAStandAloneMessageOfTheStandAloneService) {
-  service().setDefaults({{"device_name", "Kitchen"}});
+  platform_.preferences().setValue(kPreferencesDomain, "device_name", "Kitchen");
+  switchReporting(true);
   QVTestClient& client = registeredClient(42);
   client.sendToAll({{"a b", 1}});
   runUntilIdle();
@@ -242,7 +243,7 @@ TEST_F(QVReportingRoutingTest, DoesNotReachTheSessionsOfARemovedClient) {
 TEST_F(QVReportingRoutingTest, RefusesEveryMessageWhileReportingIsSwitchedOff) {
   QVTestClient& client = clientWithStartedSession(42, 7);
   takeBeaconStory();
-  service().setReportingEnabled(false);
+  switchReporting(false);
   client.send(haptics_, {7});
   client.send(haptics_, {});
   client.sendToAll(haptics_);
@@ -254,7 +255,7 @@ TEST_F(QVReportingRoutingTest, RefusesEveryMessageWhileReportingIsSwitchedOff) {
   EXPECT_THAT(takeBeaconStory(), IsEmpty());
   EXPECT_THAT(client.session(7)->messageTypeCounts(), IsEmpty()) << "not even counted";
 
-  service().setReportingEnabled(true);
+  switchReporting(true);
   client.send(haptics_, {7});
   runUntilIdle();
   EXPECT_THAT(replies(), ElementsAre("reply 42 send: nil"));

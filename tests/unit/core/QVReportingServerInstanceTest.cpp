@@ -74,7 +74,7 @@ TEST_F(QVReportingServerInstanceTest, FindsItsOwnSessionZero) {
 TEST_F(QVReportingServerInstanceTest, FindsItsOwnSessionsWhileReportingIsSwitchedOff) {
   QVTestClient& client = clientWithSession(42, 7);
   QVTestClient& other = clientWithSession(43, 8);
-  service().setReportingEnabled(false);
+  switchReporting(false);
   EXPECT_EQ(client.instance()->findReportingSessionForID(7, true), client.session(7));
   EXPECT_EQ(client.instance()->findReportingSessionForID(8, true), nullptr);
   EXPECT_NE(other.session(8), nullptr);
@@ -120,7 +120,7 @@ TEST_F(QVReportingServerInstanceTest, FetchesNoDriverStatisticsWhenTheConnection
   EXPECT_THAT(takeJournal(),
               Not(Contains(clientLine(standard, "stopReportingSessionForID:reply:",
                                       "nothing interesting to fetch from the drivers"))));
-  EXPECT_FALSE(client.session(7)->driverSnapShot().isAbsent()) << "still the one of the start";
+  EXPECT_NE(client.session(7)->driverSnapShot(), nullptr) << "still the one of the start";
 }
 
 TEST_F(QVReportingServerInstanceTest, HidesTheSessionsOfARemovedClientFromOthers) {

@@ -17,11 +17,13 @@ constexpr std::string_view kLookup = "findReportingSessionForID:";
 
 class QVReportingServiceDelegateTest : public QVServiceFixture {};
 
-TEST_F(QVReportingServiceDelegateTest, RegistersTheServerScope) {
+TEST_F(QVReportingServiceDelegateTest, RegistersTheServerScopeAndThenThatOfTheDrivers) {
   service();
   EXPECT_THAT(platform_.log().registrations(),
               ElementsAre(QVFakeLog::Registration{true, 0x71767273, "qvrs", "net.quillon.quietvox",
-                                                  "reporting_server_verbose", 31}));
+                                                  "reporting_server_verbose", 31},
+                          QVFakeLog::Registration{true, 0x71767264, "qvrd", "net.quillon.quietvox",
+                                                  "reporting_driver_verbose", 31}));
 }
 
 TEST_F(QVReportingServiceDelegateTest, MakesTheServerQueue) {
@@ -34,22 +36,27 @@ TEST_F(QVReportingServiceDelegateTest, MakesTheServerQueue) {
 }
 
 TEST_F(QVReportingServiceDelegateTest, StartsEnabledWithoutReadingPreferences) {
-  platform_.preferences().setValue("net.quillon.quietvox", "disable_reporting", true);
-  platform_.preferences().setValue("net.quillon.quietvox", "device_name", "Kitchen");
+  platform_.preferences().setValue(kPreferencesDomain, "disable_reporting", true);
+  platform_.preferences().setValue(kPreferencesDomain, "device_name", "Kitchen");
   EXPECT_TRUE(service().isReportingEnabled());
   EXPECT_TRUE(service().getDefaults().isAbsent());
   EXPECT_THAT(service().getAllClients(), IsEmpty());
-  EXPECT_EQ(platform_.preferences().readingsOfDomain("net.quillon.quietvox"), 0u);
+  EXPECT_EQ(platform_.preferences().readingsOfDomain(kPreferencesDomain), 0u);
 }
 
-TEST_F(QVReportingServiceDelegateTest, WritesNothingWhenItStarts) {
-  service();
-  EXPECT_THAT(takeJournal(), IsEmpty());
+TEST_F(QVReportingServiceDelegateTest, ListensForDefaultsBeforeItSubscribesToTheDrivers) {
+  platform_.tally().publish({"Speaker", std::nullopt}, {{"frames", 1}});
+  startService();
+  EXPECT_THAT(
+      takeJournal(),
+      ElementsAre(hostLine(standard, "listenForDefaultsNotification", "notify setup result 0"),
+                  driverLine(info, "init", "creating tallying driver utility"),
+                  driverLine(standard, "init", "subscribed to group group Speaker-(null)")));
 }
 
 TEST_F(QVReportingServiceDelegateTest, HasAnEmptySnapShotAndNothingThatGrewWithoutDrivers) {
-  EXPECT_FALSE(service().getSnapShot().isAbsent());
-  EXPECT_TRUE(service().getSnapShot().empty());
+  ASSERT_NE(service().getSnapShot(), nullptr);
+  EXPECT_THAT(service().getSnapShot()->sampleSets, IsEmpty());
   EXPECT_TRUE(service().getDriverStatisticsRelativeToSnapShot(service().getSnapShot()).isAbsent());
 }
 
@@ -78,6 +85,8 @@ TEST_F(QVReportingServiceDelegateTest, AcceptsAConnection) {
 }
 
 TEST_F(QVReportingServiceDelegateTest, NamesTheSourceFileOfItsLines) {
+  service();
+  platform_.log().clear();
   connectClient(42);
   const auto lines = platform_.log().lines();
   ASSERT_FALSE(lines.empty());
@@ -210,11 +219,11 @@ TEST_F(QVReportingServiceDelegateTest, NeverFindsSessionZero) {
 
 TEST_F(QVReportingServiceDelegateTest, FindsNothingWhileReportingIsSwitchedOff) {
   QVTestClient& client = clientWithSession(42, 7);
-  service().setReportingEnabled(false);
+  switchReporting(false);
   EXPECT_EQ(service().findReportingSessionForID(7), nullptr);
   EXPECT_EQ(service().findReportingSessionForID(8), nullptr);
   EXPECT_THAT(takeJournal(), IsEmpty());
-  service().setReportingEnabled(true);
+  switchReporting(true);
   EXPECT_EQ(service().findReportingSessionForID(7), client.session(7));
 }
 
@@ -227,14 +236,6 @@ TEST_F(QVReportingServiceDelegateTest, RemovesAClientFromTheListAndTakesNoteOfNo
   EXPECT_THAT(service().getAllClients(), ElementsAre(second.instance()));
   service().removeClient(*removed);
   EXPECT_THAT(service().getAllClients(), ElementsAre(second.instance()));
-}
-
-TEST_F(QVReportingServiceDelegateTest, GivesNewSessionsNoDefaults) {
-  service().setDefaults({{"device_name", "Kitchen"}, {"disable_reporting", 0}});
-  QVTestClient& client = clientWithSession(42, 7);
-  EXPECT_EQ(service().getDefaults(),
-            (QVDictionary{{"device_name", "Kitchen"}, {"disable_reporting", 0}}));
-  EXPECT_TRUE(client.session(7)->userInfo().empty());
 }
 
 }  // namespace

@@ -218,7 +218,7 @@ TEST_F(QVReportingSessionControlTest, StopsASession) {
                   traceEntry(kTraceSessionStopped), "reply 42 start 7: YES",
                   clientLine(standard, kStop, "stopping 7"), "reply 42 stop 7: YES"));
   EXPECT_FALSE(client.session(7)->started());
-  EXPECT_TRUE(client.session(7)->driverSnapShot().isAbsent());
+  EXPECT_EQ(client.session(7)->driverSnapShot(), nullptr);
 }
 
 TEST_F(QVReportingSessionControlTest, StopsASessionThatWasNeverStarted) {
@@ -359,7 +359,7 @@ TEST_F(QVReportingSessionControlTest, ListsTheReportersOfAClientThatIsNotYetRemo
 TEST_F(QVReportingSessionControlTest, FindsOnlyOwnSessionsWhileReportingIsSwitchedOff) {
   QVTestClient& owner = clientWithSession(42, 7, 3);
   QVTestClient& other = clientWithSession(43, 8, 4);
-  service().setReportingEnabled(false);
+  switchReporting(false);
   other.validate(7);
   other.validate(8);
   other.getServiceType(7);

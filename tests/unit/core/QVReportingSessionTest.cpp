@@ -71,7 +71,7 @@ TEST_F(QVReportingSessionTest, IsCreatedWithItsLineAndMark) {
   EXPECT_EQ(session->serviceType(), 65535);
   EXPECT_EQ(session->serviceName(), "unknown");
   EXPECT_TRUE(session->userInfo().empty());
-  EXPECT_TRUE(session->driverSnapShot().isAbsent());
+  EXPECT_EQ(session->driverSnapShot(), nullptr);
   EXPECT_FALSE(session->transactionCompleteBlock());
   EXPECT_THAT(session->messageTypeCounts(), IsEmpty());
   EXPECT_EQ(session->orientationCallbackID(), std::nullopt);
@@ -435,58 +435,6 @@ TEST_F(QVReportingSessionTest, GoesByTheTypeOfTheStartForTheSetUp) {
   EXPECT_THAT(takeJournal(), ElementsAre(traceEntry(kTraceMessageSent),
                                          sessionLine(error, "sendMessage:category:type:sync:reply:",
                                                      "No valid BeaconSession")));
-}
-
-// ---- orientation
-
-TEST_F(QVReportingSessionTest, ReportsOrientationOfTwoServiceTypesOnInternalBuilds) {
-  makeInternalBuild();
-  for (uint16_t type = 0; type < 16; ++type) {
-    EXPECT_EQ(makeSession(7, type)->shouldReportOrientation(), type == 2 || type == 7) << type;
-  }
-  EXPECT_FALSE(makeSession()->shouldReportOrientation());
-}
-
-TEST_F(QVReportingSessionTest, ReportsNoOrientationOnOneDeviceClass) {
-  makeInternalBuild();
-  const auto session = makeSession(7, 2);
-  for (const int deviceClass : {0, 1, 5, 7, -6}) {
-    platform_.deviceInformation().setAnswer("DeviceClassNumber", deviceClass);
-    EXPECT_TRUE(session->shouldReportOrientation()) << deviceClass;
-  }
-  platform_.deviceInformation().setAnswer("DeviceClassNumber", 6);
-  EXPECT_FALSE(session->shouldReportOrientation()) << "asked anew each time";
-}
-
-TEST_F(QVReportingSessionTest, ReportsNoOrientationOnOtherBuilds) {
-  const auto session = makeSession(7, 2);
-  EXPECT_FALSE(session->shouldReportOrientation());
-  session->start();
-  EXPECT_EQ(session->startDate(), std::nullopt);
-  EXPECT_EQ(session->orientationCallbackID(), std::nullopt);
-}
-
-TEST_F(QVReportingSessionTest, NamesItsOrientationCallbacksWhileItIsStarted) {
-  makeInternalBuild();
-  const auto session = makeSession(-7, 7);
-  advance(5s);
-  session->start();
-  EXPECT_EQ(session->orientationCallbackID(), "QVReportingService -7");
-  EXPECT_EQ(session->startDate(), QVFakeClock::kStart + 5s);
-  session->stop();
-  EXPECT_EQ(session->orientationCallbackID(), std::nullopt);
-}
-
-TEST_F(QVReportingSessionTest, KeepsItsOrientationCallbacksWhenItsTypeChangesBeforeTheStop) {
-  makeInternalBuild();
-  const auto session = makeSession(7, 2);
-  session->start();
-  session->setServiceType(1);
-  session->stop();
-  EXPECT_EQ(session->orientationCallbackID(), "QVReportingService 7");
-  session->setServiceType(2);
-  session->stop();
-  EXPECT_EQ(session->orientationCallbackID(), std::nullopt) << "also when it is not started";
 }
 
 }  // namespace

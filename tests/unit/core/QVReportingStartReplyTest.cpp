@@ -34,7 +34,7 @@ TEST_F(QVReportingStartReplyTest, MarksTheStartOnTheServerQueueAndInTheSession) 
   runServerQueue();
   EXPECT_THAT(takeJournal(),
               ElementsAre(traceEntry(kTraceStart), traceEntry(kTraceSessionStarted)));
-  EXPECT_FALSE(client.session(7)->driverSnapShot().isAbsent());
+  EXPECT_NE(client.session(7)->driverSnapShot(), nullptr);
 }
 
 TEST_F(QVReportingStartReplyTest, AnswersAtOnceForASessionThatIsStarted) {
@@ -152,17 +152,17 @@ class DrivingDelegate final : public QVReportingServiceDelegateProtocol {
   std::shared_ptr<QVReportingSession> findReportingSessionForID(int64_t) const override {
     return nullptr;
   }
-  QVDictionary getSnapShot() const override { return snapShot; }
-  QVDictionary getDriverStatisticsRelativeToSnapShot(const QVDictionary& relative) const override {
+  SnapShot getSnapShot() const override { return snapShot; }
+  QVDictionary getDriverStatisticsRelativeToSnapShot(const SnapShot& relative) const override {
     asked.push_back(relative);
     return grown;
   }
   void removeClient(const QVReportingServerInstance&) override {}
 
   Clients clients;
-  QVDictionary snapShot{{"Speaker", 100}};
+  SnapShot snapShot = std::make_shared<QVReportingDriverSnapShot>();
   QVDictionary grown;
-  mutable std::vector<QVDictionary> asked;
+  mutable std::vector<SnapShot> asked;
 };
 
 class QVReportingDriverStatisticsTest : public QVServiceFixture {
@@ -189,13 +189,13 @@ class QVReportingDriverStatisticsTest : public QVServiceFixture {
 };
 
 TEST_F(QVReportingDriverStatisticsTest, KeepsTheSnapShotOfTheStart) {
-  EXPECT_EQ(session()->driverSnapShot(), (QVDictionary{{"Speaker", 100}}));
+  EXPECT_EQ(session()->driverSnapShot(), delegate_->snapShot);
 }
 
 TEST_F(QVReportingDriverStatisticsTest, SendsWhatGrewIntoTheSessionBeforeItStops) {
   delegate_->grown = {{"Speaker frames", 480}};
   stop();
-  EXPECT_THAT(delegate_->asked, ElementsAre(QVDictionary{{"Speaker", 100}}));
+  EXPECT_THAT(delegate_->asked, ElementsAre(delegate_->snapShot));
   EXPECT_THAT(
       takeJournal(),
       ElementsAre(traceEntry(kTraceStop), traceEntry(kTraceMessageSent),
@@ -211,7 +211,7 @@ TEST_F(QVReportingDriverStatisticsTest, SendsWhatGrewIntoTheSessionBeforeItStops
           "flush 1", "end 1"));
   EXPECT_THAT(session()->messageTypeCounts(),
               ElementsAre(std::pair("Tallying_Generic", 1), std::pair("Undefined_Unknown", 1)));
-  EXPECT_TRUE(session()->driverSnapShot().isAbsent());
+  EXPECT_EQ(session()->driverSnapShot(), nullptr);
   EXPECT_THAT(platform_.countwise().sentNames(), IsEmpty()) << "the sinks do not see it";
 }
 
@@ -233,7 +233,7 @@ TEST_F(QVReportingDriverStatisticsTest, SendsASingleMessageWhenTheSessionWasNotS
   takeBeaconStory();
   delegate_->grown = {{"frames", 1}};
   stop();
-  EXPECT_TRUE(delegate_->asked.back().isAbsent()) << "the snapshot is gone since the first stop";
+  EXPECT_EQ(delegate_->asked.back(), nullptr) << "the snapshot is gone since the first stop";
   EXPECT_THAT(takeBeaconStory(), ElementsAre(R"(single: 9/0 {"frames":1})"));
 }
 
