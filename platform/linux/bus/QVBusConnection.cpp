@@ -106,12 +106,15 @@ void QVBusConnection::onReadable() {
     // What a batch of calls is answered on this thread goes out in one write after it.
     outbox_->hold();
     const QVWakeUpBatch wakeUps;
+    const bool answersWait = unwritten() > 0;
     const auto buffer = server_.readBuffer();
     const auto received = socket_.receive(buffer);
     switch (received.status) {
-      case QVBusSocket::Status::done:
-        takeBytesSafely({buffer.data(), received.bytes});
+      case QVBusSocket::Status::done: {
+        const std::size_t messages = takeBytesSafely({buffer.data(), received.bytes});
+        if (messages > 1 || (messages == 1 && answersWait)) server_.loop().noteStream();
         break;
+      }
       case QVBusSocket::Status::wouldBlock:
         break;
       case QVBusSocket::Status::ended:
@@ -124,48 +127,49 @@ void QVBusConnection::onReadable() {
   continueReading();
 }
 
-void QVBusConnection::takeBytesSafely(std::string_view bytes) {
+std::size_t QVBusConnection::takeBytesSafely(std::string_view bytes) {
   try {
-    takeBytes(bytes);
+    return takeBytes(bytes);
   } catch (const std::bad_alloc&) {
     // The peer whose message does not fit loses its connection, nobody else theirs.
     violated("out of memory for its message");
+    return 0;
   }
 }
 
-void QVBusConnection::takeBytes(std::string_view bytes) {
+std::size_t QVBusConnection::takeBytes(std::string_view bytes) {
   if (authentication_ != nullptr) {
     std::string answer;
     bytes.remove_prefix(authentication_->feed(bytes, answer));
     outbox_->putBytes(answer);
     if (authentication_->state() == QVBusAuthServer::State::failed) {
       violated(authentication_->failure());
-      return;
+      return 0;
     }
-    if (authentication_->state() != QVBusAuthServer::State::done) return;
+    if (authentication_->state() != QVBusAuthServer::State::done) return 0;
     authentication_.reset();
     state_ = State::open;
   }
-  takeMessages(bytes);
+  return takeMessages(bytes);
 }
 
-void QVBusConnection::takeMessages(std::string_view bytes) {
+std::size_t QVBusConnection::takeMessages(std::string_view bytes) {
   decoder_.feed(bytes);
   std::string_view message;
-  for (;;) {
+  for (std::size_t taken = 0;; ++taken) {
     switch (decoder_.next(message)) {
       case QVBusFrameDecoder::Result::message:
         if (const char* reason = takeMessage(message)) {
           violated(reason);
-          return;
+          return taken;
         }
         break;
       case QVBusFrameDecoder::Result::needsMore:
         chargeHeldBytes();
-        return;
+        return taken;
       case QVBusFrameDecoder::Result::malformed:
         violated(decoder_.failure());
-        return;
+        return taken;
     }
   }
 }

@@ -62,9 +62,10 @@ class QVBusConnection final : public QVIPCConnection,
   bool isAdmitted();
   void onReadable();
   void onWake();
-  void takeBytesSafely(std::string_view bytes);
-  void takeBytes(std::string_view bytes);
-  void takeMessages(std::string_view bytes);
+  // Answer how many whole messages the bytes completed.
+  std::size_t takeBytesSafely(std::string_view bytes);
+  std::size_t takeBytes(std::string_view bytes);
+  std::size_t takeMessages(std::string_view bytes);
   const char* takeMessage(std::string_view bytes);
   void violated(const char* reason);
   void close();

@@ -3,6 +3,7 @@
 #include "platform/linux/QVWakeUpBatch.h"
 
 #include <cstddef>
+#include <thread>
 #include <utility>
 
 #include <asio/executor_work_guard.hpp>
@@ -13,6 +14,12 @@ namespace {
 
 // More would keep the other threads waiting for what they could do meanwhile.
 constexpr std::size_t kHandlersPerWakeUp = 8;
+
+// Long enough for a peer to send a handful of messages, short against what anybody waits for. The
+// kernel adds up to 50 us of its own.
+constexpr std::chrono::microseconds kStreamPause{30};
+// Wake-ups of a stream that come closer than this are worth a pause.
+constexpr std::chrono::microseconds kStreamGap{500};
 
 }  // namespace
 
@@ -28,15 +35,28 @@ void QVBusLoop::post(QVFunction<void()> work) {
 void QVBusLoop::run() {
   const auto guard = asio::make_work_guard(*context_);
   while (!context_->stopped()) {
-    // Connections that are readable together wake whoever works for them once. Nothing is held back
-    // while the loop sleeps: the batch is empty then.
-    const QVWakeUpBatch wakeUps;
-    std::size_t handlers = context_->run_one();
-    while (handlers > 0 && handlers < kHandlersPerWakeUp) {
-      if (context_->poll_one() == 0) break;
-      ++handlers;
-    }
+    runBatch();
+    if (std::exchange(streamed_, false)) pauseForStream();
   }
+}
+
+void QVBusLoop::runBatch() {
+  // Connections that are readable together wake whoever works for them once. Nothing is held back
+  // while the loop sleeps: the batch is empty then.
+  const QVWakeUpBatch wakeUps;
+  std::size_t handlers = context_->run_one();
+  while (handlers > 0 && handlers < kHandlersPerWakeUp) {
+    if (context_->poll_one() == 0) break;
+    ++handlers;
+  }
+}
+
+void QVBusLoop::pauseForStream() {
+  const auto now = std::chrono::steady_clock::now();
+  // A burst now and then is not worth the timer.
+  const bool isDense = now - streamedAt_ < kStreamGap;
+  streamedAt_ = now;
+  if (isDense) std::this_thread::sleep_for(kStreamPause);
 }
 
 void QVBusLoop::stop() {
