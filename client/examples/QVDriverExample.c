@@ -7,6 +7,7 @@
 #include <limits.h>
 #include <signal.h>
 #include <stdlib.h>
+#include <sys/select.h>
 
 // What a command line may ask for.
 #define MAXIMUM_NAMES 16
@@ -123,22 +124,36 @@ static void count(QuietVoxChannels* channels, const Options* options) {
   }
 }
 
+// Waits for the time to pass, or without a limit for input. Signals come nowhere else, so that none
+// comes too early to end the wait.
+static void await(const struct timespec* limit) {
+  fd_set input;
+  sigset_t none;
+  sigemptyset(&none);
+  FD_ZERO(&input);
+  if (limit == NULL) FD_SET(STDIN_FILENO, &input);
+  pselect(STDIN_FILENO + 1, &input, NULL, NULL, limit, &none);
+}
+
 static void countByTime(QuietVoxChannels* channels, const Options* options) {
   struct timespec pause;
   pause.tv_sec = options->interval / 1000;
   pause.tv_nsec = options->interval % 1000 * 1000000;
   for (long round = 0; round < options->rounds && !interrupted; ++round) {
     count(channels, options);
-    nanosleep(&pause, NULL);
+    await(&pause);
   }
 }
 
 static void countByInput(QuietVoxChannels* channels, const Options* options) {
-  char line[64];
-  for (long round = 1; round <= options->rounds && !interrupted; ++round) {
-    if (fgets(line, sizeof line, stdin) == NULL) return;
+  long round = 0;
+  while (round < options->rounds) {
+    char byte;
+    await(NULL);
+    if (interrupted || read(STDIN_FILENO, &byte, 1) != 1) return;
+    if (byte != '\n') continue;
     count(channels, options);
-    printf("%ld\n", round);
+    printf("%ld\n", ++round);
     fflush(stdout);
   }
 }
@@ -147,6 +162,7 @@ int main(int argumentCount, char** arguments) {
   Options options;
   QuietVoxChannels channels;
   struct sigaction action;
+  sigset_t ends;
   int error = 0;
   memset(&options, 0, sizeof options);
   options.step = 1;
@@ -165,9 +181,13 @@ int main(int argumentCount, char** arguments) {
     fprintf(stderr, "qv-driver: cannot publish %s: %s\n", options.place, strerror(-error));
     return 1;
   }
-  // Ends the rounds, so that the file goes as well.
+  // They end the rounds, so that the file goes as well.
   memset(&action, 0, sizeof action);
   action.sa_handler = interrupt;
+  sigemptyset(&ends);
+  sigaddset(&ends, SIGTERM);
+  sigaddset(&ends, SIGINT);
+  sigprocmask(SIG_BLOCK, &ends, NULL);
   sigaction(SIGTERM, &action, NULL);
   sigaction(SIGINT, &action, NULL);
   puts("published");

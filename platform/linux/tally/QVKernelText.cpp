@@ -58,7 +58,9 @@ std::size_t endOfKey(std::string_view line) {
 std::optional<QVKernelText::Counter> QVKernelText::parseLine(std::string_view line) {
   line = trimmed(line);
   if (const auto counter = divided(line, endOfKey(line))) return counter;
-  if (const auto counter = divided(line, line.find_first_of(kBlanks))) return counter;
+  const std::size_t firstBlank = line.find_first_of(kBlanks);
+  const auto counter = divided(line, firstBlank);
+  if (counter && line[firstBlank - 1] != ':') return counter;  // ": 12" has no key
   return divided(line, line.find(':'));
 }
 

@@ -5,8 +5,8 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <cmath>
 #include <cstring>
-#include <span>
 #include <type_traits>
 #include <utility>
 
@@ -14,7 +14,7 @@ namespace {
 
 constexpr int32_t kVersion = 1;
 constexpr uint32_t kSentinelFlag = 4;
-constexpr uint64_t kSentinel = UINT64_MAX;
+constexpr uint64_t kSentinel = UINT64_MAX;  // of integers; of floating-point numbers NaN
 
 constexpr std::size_t kNameBytes = 64;  // with the NUL that ends it
 
@@ -230,15 +230,12 @@ class Parser {
   // Is the type one that is counted?
   bool readCell(uint64_t cell, int32_t type, std::optional<int64_t>& value) const {
     QVValue number;
-    std::size_t width = sizeof(uint64_t);
     switch (static_cast<Type>(type)) {
       case Type::signed32:
         number = cellAs<int32_t>(cell);
-        width = sizeof(int32_t);
         break;
       case Type::unsigned32:
         number = cellAs<uint32_t>(cell);
-        width = sizeof(uint32_t);
         break;
       case Type::signed64:
       case Type::elapsed:
@@ -249,7 +246,6 @@ class Parser {
         break;
       case Type::real32:
         number = static_cast<double>(cellAs<float>(cell));
-        width = sizeof(float);
         break;
       case Type::real64:
         number = cellAs<double>(cell);
@@ -257,9 +253,9 @@ class Parser {
       default:
         return false;
     }
-    const bool none =
-        (header_.flags & kSentinelFlag) != 0 && std::memcmp(&cell, &kSentinel, width) == 0;
-    if (!none) value = number.integerValue();
+    const bool real = number.kind() == QVValue::Kind::real;
+    const bool sentinel = real ? std::isnan(number.real()) : cell == kSentinel;
+    if (!sentinel || (header_.flags & kSentinelFlag) == 0) value = number.integerValue();
     return true;
   }
 

@@ -19,15 +19,15 @@
 //
 // A metric is a channel and an instance a subgroup; a metric without a domain has no subgroup. The
 // numbers' types are taken, of elapsed times the finished part in microseconds; texts and other
-// types are no channels. In a file with the sentinel flag a cell with all bits set has no value.
-// Whether the publisher still runs does not matter: what it counted is true.
+// types are no channels. In a file with the sentinel flag an integer's cell with all bits set and a
+// NaN are no value. Whether the publisher still runs does not matter: what it counted is true.
 //
 // Threads: any; plain functions.
 struct QVMMVFormat {
   // Bytes of a file; a channel takes 136 and its texts 512, so this is far more than a driver has.
   static constexpr std::size_t kMaximumBytes = std::size_t{1024} * 1024;
-  // Sections of a file; the format knows six kinds.
-  static constexpr int32_t kMaximumSections = 16;
+  // Sections of a file, one of each kind at the most.
+  static constexpr int32_t kMaximumSections = 5;
   static constexpr std::size_t kHeaderBytes = 40;
 
   // Takes the bytes in; the readings' views point into them. Answers 0 or an error number:
