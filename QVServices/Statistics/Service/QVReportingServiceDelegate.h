@@ -46,6 +46,7 @@ class QVReportingServiceDelegate final
 
   // The service-wide preferences, read afresh: "disable_reporting" always, "device_name" where it
   // is set. Any thread.
+  // NOLINTNEXTLINE(readability-identifier-naming): the name of the dictionary is its own.
   static QVDictionary QVReportingDefaults();
 
  private:

@@ -42,6 +42,7 @@ class QVReportingSession final : public QVReportingSessionInformation,
  public:
   using SendReply = Reply<std::optional<QVError>>;
   using DriverSnapShot = std::shared_ptr<const QVReportingDriverSnapShot>;
+  using MessageTypeCounts = std::map<std::string, uint32_t, std::less<>>;
 
   static std::shared_ptr<QVReportingSession> initWithID(int64_t reporterID,
                                                         std::vector<int32_t> processIdentifiers);
@@ -93,9 +94,7 @@ class QVReportingSession final : public QVReportingSessionInformation,
   // Absent after a stop. Take one copy, lock that object.
   std::shared_ptr<QVReportingPayloadArray> aggregatedPayloadData() const;
   std::shared_ptr<QVReportingPayloadArray> nestedAggregatedPayloadData() const;
-  const std::map<std::string, uint32_t, std::less<>>& messageTypeCounts() const {
-    return messageTypeCounts_;
-  }
+  const MessageTypeCounts& messageTypeCounts() const { return messageTypeCounts_; }
   // While orientation callbacks are registered, and after it where they stay registered.
   std::optional<std::string> orientationCallbackID() const;
   std::optional<QVDate> startDate() const;
@@ -112,10 +111,7 @@ class QVReportingSession final : public QVReportingSessionInformation,
 
  private:
   struct Message;
-  struct MessageIdentifier {
-    std::string base;
-    uint32_t count;
-  };
+  struct MessageIdentifier;
 
   QVReportingSession(int64_t reporterID, std::vector<int32_t> processIdentifiers);
 
@@ -127,7 +123,6 @@ class QVReportingSession final : public QVReportingSessionInformation,
 
   void registerForOrientation();
   void unregisterFromOrientation();
-  void recordOrientation(std::string_view mode, int32_t orientation) const;
 
   MessageIdentifier nextIdentifier(uint32_t category, uint16_t type);
   void record(const QVDictionary& payload, const MessageIdentifier& identifier);
@@ -156,7 +151,7 @@ class QVReportingSession final : public QVReportingSessionInformation,
   std::optional<std::string_view> serviceName_;
   DriverSnapShot driverSnapShot_;
   Reply<bool> transactionCompleteBlock_;
-  std::map<std::string, uint32_t, std::less<>> messageTypeCounts_;
+  MessageTypeCounts messageTypeCounts_;
 
   // beaconQueue only.
   std::shared_ptr<QVBeaconSession> beaconSession_;

@@ -68,6 +68,12 @@ void sendSingleMessageNow(const QVDictionary& message, uint32_t category, uint16
 
 }  // namespace
 
+// What a message is called in the session's file: BASE_COUNT.
+struct QVReportingSession::MessageIdentifier {
+  std::string base;  // CATEGORY_TYPE
+  uint32_t count;
+};
+
 // One message on its way to the framework session.
 struct QVReportingSession::Message {
   QVDictionary payload;   // normalised

@@ -32,6 +32,27 @@ double secondsSince(QVDate start, QVDate now) {
   return std::round(std::fabs(elapsed.count()) * 1000) / 1000;
 }
 
+// On the orientation service's thread, maybe while the session is being stopped or started again.
+void recordOrientation(const QVReportingSession& session, std::string_view mode,
+                       int32_t orientation) {
+  const QVDate now = platform().clock->currentDate();
+  const double time = secondsSince(session.startDate().value_or(now), now);
+  const std::string_view text = QVOrientation::textOfOrientation(orientation);
+  if (QVLog::logEnabled(QVLog::kVerbose, QVReportingSessionLog::scope())) {
+    const QVDictionary information = session.userInfo();
+    const QVValue* application = information.find(kQVReportingHostApplicationKey);
+    platform().log->verbose(QVReportingSessionLog::scope(), "-[QVReportingSession start]",
+                            "Orientation handler callback mode=", mode, " orientation=\"", text,
+                            "\" app=\"", application == nullptr ? QVValue() : *application,
+                            "\", time=", time, ", id=\"", callbackIDOf(session.reporterID()), '"');
+  }
+  // Gone once the session is stopped: nothing is recorded any more.
+  if (const auto recorded = session.aggregatedPayloadData()) {
+    const std::string key = QVText(mode, "_orientation");
+    recorded->append({{key, text}, {QVText(key, "_time"), time}});
+  }
+}
+
 }  // namespace
 
 bool QVReportingSession::shouldReportOrientation() const {
@@ -62,7 +83,7 @@ void QVReportingSession::registerForOrientation() {
   }
   // The callbacks hold the session until it is stopped, also when its client has let it go.
   const auto callback = [self = shared_from_this()](std::string_view mode) {
-    return [self, mode](int32_t orientation) { self->recordOrientation(mode, orientation); };
+    return [self, mode](int32_t orientation) { recordOrientation(*self, mode, orientation); };
   };
   platform().orientation->QVRegisterDeviceOrientation(callbackID, callback(kDeviceMode));
   platform().orientation->QVRegisterUIOrientation(callbackID, callback(kUIMode));
@@ -75,24 +96,4 @@ void QVReportingSession::unregisterFromOrientation() {
   platform().orientation->QVUnregisterUIOrientation(*callbackID);
   const std::lock_guard lock(propertiesMutex_);
   orientationCallbackID_.reset();
-}
-
-// On the orientation service's thread, maybe while the session is being stopped or started again.
-void QVReportingSession::recordOrientation(std::string_view mode, int32_t orientation) const {
-  const QVDate now = platform().clock->currentDate();
-  const double time = secondsSince(startDate().value_or(now), now);
-  const std::string_view text = QVOrientation::textOfOrientation(orientation);
-  if (QVLog::logEnabled(QVLog::kVerbose, QVReportingSessionLog::scope())) {
-    const QVDictionary information = userInfo();
-    const QVValue* application = information.find(kQVReportingHostApplicationKey);
-    platform().log->verbose(QVReportingSessionLog::scope(), "-[QVReportingSession start]",
-                            "Orientation handler callback mode=", mode, " orientation=\"", text,
-                            "\" app=\"", application == nullptr ? QVValue() : *application,
-                            "\", time=", time, ", id=\"", callbackIDOf(reporterID_), '"');
-  }
-  // Gone once the session is stopped: nothing is recorded any more.
-  if (const auto recorded = aggregatedPayloadData()) {
-    const std::string key = QVText(mode, "_orientation");
-    recorded->append({{key, text}, {QVText(key, "_time"), time}});
-  }
 }
