@@ -8,15 +8,19 @@
 #include <optional>
 #include <string>
 
-// What Tally hands out, opaque to everyone but the adapter that made it. Immutable once made.
+// What Tally hands out is opaque to everyone but the adapter that made it, and immutable once made.
+
+// Channels that were published together.
 class TallyChannelSet {
  public:
   virtual ~TallyChannelSet() = default;
 };
+// What it takes to sample a set's channels.
 class TallySubscription {
  public:
   virtual ~TallySubscription() = default;
 };
+// Values of channels, at one moment or between two.
 class TallySampleSet {
  public:
   virtual ~TallySampleSet() = default;

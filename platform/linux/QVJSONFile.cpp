@@ -27,11 +27,11 @@ class Builder {
   bool Double(double value) { return add(value); }
   bool RawNumber(const char*, rapidjson::SizeType, bool) { return false; }
   bool String(const char* text, rapidjson::SizeType length, bool) {
-    return add(std::string_view(text, length));
+    return isPaired({text, length}) && add(std::string_view(text, length));
   }
   bool Key(const char* text, rapidjson::SizeType length, bool) {
     open_.back().keys.emplace_back(text, length);
-    return true;
+    return isPaired({text, length});
   }
   bool StartObject() { return begin(); }
   bool StartArray() { return begin(); }
@@ -46,7 +46,8 @@ class Builder {
   }
   bool EndArray(rapidjson::SizeType) { return add(QVArray::assemble(end().values)); }
 
-  bool tooDeep() const { return tooDeep_; }
+  // Why it ended the parse; empty where it did not.
+  const std::string& refusal() const { return refusal_; }
   QVValue takeResult() { return std::move(result_); }
 
  private:
@@ -56,9 +57,22 @@ class Builder {
   };
 
   bool begin() {
-    tooDeep_ = open_.size() >= QVJSONFile::kMaximumDepth;
-    if (!tooDeep_) open_.emplace_back();
-    return !tooDeep_;
+    if (open_.size() >= QVJSONFile::kMaximumDepth) {
+      refusal_ = QVText("nested deeper than ", QVJSONFile::kMaximumDepth);
+      return false;
+    }
+    open_.emplace_back();
+    return true;
+  }
+  // The reader makes a character of a second surrogate's escape that has no first one before it.
+  bool isPaired(std::string_view text) {
+    for (std::size_t at = text.find('\xED'); at != std::string_view::npos;
+         at = text.find('\xED', at + 1)) {
+      if (static_cast<unsigned char>(text[at + 1]) < 0xA0) continue;
+      refusal_ = "The surrogate pair in string is invalid.";
+      return false;
+    }
+    return true;
   }
   Container end() {
     Container container = std::move(open_.back());
@@ -72,7 +86,7 @@ class Builder {
 
   std::vector<Container> open_;
   QVValue result_;
-  bool tooDeep_ = false;
+  std::string refusal_;
 };
 
 std::optional<std::string> contents(const std::string& path, QVJSONFailure& failure) {
@@ -106,8 +120,8 @@ std::optional<QVValue> QVJSONFile::parse(std::string_view text, QVJSONFailure& f
   if (!result.IsError()) return builder.takeResult();
   const std::string_view before = text.substr(0, std::min(result.Offset(), text.size()));
   const std::size_t lineStart = before.rfind('\n') + 1;  // 0 where there is none
-  failure = {.reason = builder.tooDeep() ? QVText("nested deeper than ", kMaximumDepth)
-                                         : rapidjson::GetParseError_En(result.Code()),
+  failure = {.reason = builder.refusal().empty() ? rapidjson::GetParseError_En(result.Code())
+                                                 : builder.refusal(),
              .line = static_cast<std::size_t>(std::ranges::count(before, '\n')) + 1,
              .column = before.size() - lineStart + 1};
   return std::nullopt;

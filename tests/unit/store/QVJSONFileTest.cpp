@@ -71,6 +71,14 @@ TEST(QVJSONFile, RefusesWhatIsNotQuiteJSON) {
   }
 }
 
+TEST(QVJSONFile, RefusesHalvesOfSurrogatePairs) {
+  for (const char* text : {R"("\udfb5")", R"("a\udc00b")", R"("\ud83c")", R"("\ud83cx")",
+                           R"({"\udfb5": 1})", R"(["\udfb5\ud83c"])"}) {
+    EXPECT_EQ(failureOf(text).reason, "The surrogate pair in string is invalid.") << text;
+  }
+  EXPECT_EQ(parsed(R"("\ud7ff\ue000")"), QVValue("\xED\x9F\xBF\xEE\x80\x80"));
+}
+
 TEST(QVJSONFile, RefusesBytesAfterAnEndThatTheyPretend) {
   EXPECT_EQ(failureOf(std::string_view("1\0", 2)).line, 1U);
 }

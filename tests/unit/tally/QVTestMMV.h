@@ -1,10 +1,11 @@
 #pragma once
 
+#include "tests/unit/tally/QVTestBytes.h"
+
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
 #include <string>
-#include <string_view>
 #include <vector>
 
 // Types of metrics, as they are in a file.
@@ -18,19 +19,6 @@ enum QVTestMMVType : int32_t {
   kText = 6,
   kElapsed = 9
 };
-
-// The cell that holds a number.
-template <class Number>
-uint64_t QVTestCell(Number number) {
-  uint64_t cell = 0;
-  std::memcpy(&cell, &number, sizeof number);
-  return cell;
-}
-
-template <class Number>
-void QVPatch(std::string& bytes, std::size_t offset, Number number) {
-  std::memcpy(bytes.data() + offset, &number, sizeof number);
-}
 
 // A file of values put together by hand, field by field: right ones, and wrong ones by patching.
 // The order of the sections is domain, instances, metrics, values, texts; those without elements
