@@ -17,7 +17,7 @@ QVError makeError(const std::string& path, std::errc reason) {
 
 std::string parentOf(const std::string& path) {
   const std::size_t slash = path.rfind('/');
-  return slash == 0 ? "/" : path.substr(0, slash);
+  return slash == 0 || slash == std::string::npos ? "/" : path.substr(0, slash);
 }
 
 bool namesAPlace(const std::string& path) {

@@ -18,9 +18,10 @@ constexpr mode_t kMode = S_IRUSR | S_IWUSR | S_IRGRP | S_IROTH;
 // Names that are tried: each is one of 2^64, so a second one is needed hardly ever.
 constexpr int kNames = 16;
 
-// The kernel begins to write so many bytes while more are made, in bytes: else the syncing at the
-// end has all of it to wait for.
-constexpr uint64_t kWritebackBytes = uint64_t{8} << 20;
+// After so many bytes the kernel writes them while more are made, and forgets those before them:
+// what is kept of a large file is twice this, not all of it, and pages are used again while they
+// are in the processor's cache.
+constexpr uint64_t kHandOnBytes = uint64_t{8} << 20;
 
 std::string arbitraryName() {
   uint64_t number = 0;
@@ -41,7 +42,7 @@ bool sync(int descriptor) {
 
 }  // namespace
 
-QVPosixAtomicFile::QVPosixAtomicFile(std::string path) : path_(std::move(path)) {
+QVPosixAtomicFile::QVPosixAtomicFile(const std::string& path) : path_(path) {
   open();
 }
 
@@ -50,11 +51,7 @@ QVPosixAtomicFile::~QVPosixAtomicFile() {
 }
 
 void QVPosixAtomicFile::open() {
-  const std::size_t slash = path_.rfind('/');
-  const std::string directory =
-      slash == std::string::npos ? std::string(".") : path_.substr(0, slash + 1);
-  name_ = slash == std::string::npos ? path_ : path_.substr(slash + 1);
-  directory_ = ::open(directory.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+  directory_ = ::open(path_.parent_path().c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
   if (!check(directory_ >= 0)) return;
   for (int i = 0; i < kNames && file_ < 0; ++i) {
     temporaryName_ = arbitraryName();
@@ -88,24 +85,36 @@ void QVPosixAtomicFile::writeOut(std::string_view bytes) {
     bytes.remove_prefix(static_cast<std::size_t>(count));
     written_ += static_cast<uint64_t>(count);
   }
-  startWriteback();
+  handOn();
 }
 
-void QVPosixAtomicFile::startWriteback() {
-  const uint64_t waiting = written_ - handedToDisk_;
-  if (waiting < kWritebackBytes) return;
-  // Advice: what it does not get done, or fails at, the syncing meets again.
-  static_cast<void>(::sync_file_range(file_, static_cast<off_t>(handedToDisk_),
-                                      static_cast<off_t>(waiting), SYNC_FILE_RANGE_WRITE));
-  handedToDisk_ = written_;
+void QVPosixAtomicFile::handOn() {
+  if (written_ - handedOn_ < kHandOnBytes) return;
+  const auto sync = [this](uint64_t from, uint64_t to, unsigned flags) {
+    const int result =
+        ::sync_file_range(file_, static_cast<off_t>(from), static_cast<off_t>(to - from), flags);
+    // What failed on its way to the disk is told once, so it may not be overheard here. The call
+    // itself may be refused to a service that is locked in: then the syncing at the end does it
+    // all.
+    check(result == 0 || errno == EPERM || errno == ENOSYS);
+  };
+  sync(handedOn_, written_, SYNC_FILE_RANGE_WRITE);
+  if (handedOn_ > onDisk_) {
+    sync(onDisk_, handedOn_,
+         SYNC_FILE_RANGE_WAIT_BEFORE | SYNC_FILE_RANGE_WRITE | SYNC_FILE_RANGE_WAIT_AFTER);
+    static_cast<void>(::posix_fadvise(file_, static_cast<off_t>(onDisk_),
+                                      static_cast<off_t>(handedOn_ - onDisk_),
+                                      POSIX_FADV_DONTNEED));
+  }
+  onDisk_ = std::exchange(handedOn_, written_);
 }
 
 std::optional<QVError> QVPosixAtomicFile::commit() {
   if (!failure_) writeOut({buffer_.get(), std::exchange(used_, 0)});
   if (!failure_) check(sync(file_));
   if (!failure_) check(::close(std::exchange(file_, -1)) == 0);
-  if (!failure_ &&
-      check(::renameat(directory_, temporaryName_.c_str(), directory_, name_.c_str()) == 0)) {
+  if (!failure_ && check(::renameat(directory_, temporaryName_.c_str(), directory_,
+                                    path_.filename().c_str()) == 0)) {
     temporaryName_.clear();
     check(sync(directory_));
   }
@@ -114,7 +123,7 @@ std::optional<QVError> QVPosixAtomicFile::commit() {
 }
 
 bool QVPosixAtomicFile::check(bool succeeded) {
-  if (!succeeded && !failure_) failure_ = QVMakePosixError(path_);
+  if (!succeeded && !failure_) failure_ = QVMakePosixError(path_.string());
   return succeeded;
 }
 

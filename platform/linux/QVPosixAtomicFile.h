@@ -4,6 +4,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <filesystem>
 #include <memory>
 #include <string>
 #include <string_view>
@@ -22,7 +23,7 @@ class QVPosixAtomicFile final : public QVAtomicFile {
   // What is held back to be written at once, in bytes.
   static constexpr std::size_t kBufferBytes = std::size_t{64} * 1024;
 
-  explicit QVPosixAtomicFile(std::string path);
+  explicit QVPosixAtomicFile(const std::string& path);
   ~QVPosixAtomicFile() override;
   QVPosixAtomicFile(const QVPosixAtomicFile&) = delete;
   QVPosixAtomicFile& operator=(const QVPosixAtomicFile&) = delete;
@@ -33,19 +34,20 @@ class QVPosixAtomicFile final : public QVAtomicFile {
  private:
   void open();
   void writeOut(std::string_view bytes);
-  void startWriteback();
+  // Has the kernel write what it was given so far.
+  void handOn();
   // Keeps the first failure; answers whether there is none.
   bool check(bool succeeded);
   void abandon();
 
-  const std::string path_;
-  std::string name_;  // the path's last part
+  const std::filesystem::path path_;
   int directory_ = -1;
   int file_ = -1;
   std::string temporaryName_;  // empty once there is no such file
   std::unique_ptr<char[]> buffer_;
   std::size_t used_ = 0;
   uint64_t written_ = 0;
-  uint64_t handedToDisk_ = 0;
+  uint64_t handedOn_ = 0;
+  uint64_t onDisk_ = 0;
   std::optional<QVError> failure_;
 };

@@ -77,7 +77,10 @@ QVReportingPayloadStore::Position QVReportingPayloadStore::append(const QVDictio
     if (keySet == 0) QVReportingEncodeText(scratch_, entry.key);
     QVReportingEncodeValue(scratch_, entry.value);
   }
-  return place(scratch_);
+  const Position position = place(scratch_);
+  // A summary is as long as all that was sent before it.
+  if (scratch_.capacity() > kLargestChunkBytes) std::string().swap(scratch_);
+  return position;
 }
 
 QVReportingPayloadStore::Payload QVReportingPayloadStore::read(
@@ -125,7 +128,7 @@ std::string_view QVReportingPayloadStore::interned(uint32_t number) const {
 
 std::size_t QVReportingPayloadStore::footprint() const {
   const std::lock_guard lock(mutex_);
-  std::size_t bytes = 0;
+  std::size_t bytes = scratch_.capacity();
   for (const Chunk& chunk : chunks_) bytes += chunk.capacity;
   return bytes;
 }

@@ -39,7 +39,7 @@ class QVReportingPayloadStore {
   // Valid as long as the store.
   std::string_view interned(uint32_t number) const;
 
-  // Bytes of memory that the encoded payloads take.
+  // Bytes of memory that the encoded payloads, and their encoding, take.
   std::size_t footprint() const;
 
  private:

@@ -234,11 +234,18 @@ TEST(QVReportingPayloadStore, RemembersNoMoreThanAMebibyteOfKeys) {
   }
 }
 
+TEST(QVReportingPayloadStore, TakesOfALargePayloadNoMoreThanItsSize) {
+  constexpr std::size_t kBytes = 10'000'000;
+  QVReportingPayloadStore store;
+  store.append({{"text", std::string(kBytes, 'x')}});
+  EXPECT_LT(store.footprint(), kBytes + 1000);
+}
+
 TEST(QVReportingPayloadStore, StaysSmallForASingleMessage) {
   QVReportingPayloadStore store;
-  EXPECT_EQ(store.footprint(), 0u);
+  EXPECT_LT(store.footprint(), 32u);
   store.append({{"a", 1}});
-  EXPECT_EQ(store.footprint(), 512u);
+  EXPECT_LT(store.footprint(), 600u);
 }
 
 TEST(QVReportingPayloadStore, TakesLittleForATypicalMessage) {

@@ -19,6 +19,8 @@ TEST(QVFakePlatformTest, IsInstalledAndFilled) {
   EXPECT_EQ(platform.tracePoints.get(), &fakes.tracePoints());
   EXPECT_EQ(platform.preferences.get(), &fakes.preferences());
   EXPECT_EQ(platform.deviceInformation.get(), &fakes.deviceInformation());
+  EXPECT_EQ(platform.fileSystem.get(), &fakes.fileSystem());
+  EXPECT_EQ(platform.jsonOutput.get(), &fakes.jsonOutput());
   EXPECT_EQ(platform.conditions.get(), &fakes.conditions());
   EXPECT_EQ(platform.queues.get(), &fakes.queues());
   EXPECT_EQ(platform.beacon.get(), &fakes.beacon());
