@@ -146,8 +146,8 @@ int runService() {
   const int status = QVReportingServiceMain();
   // While the core can still be called: what comes from outside ends, and lets go of the sessions
   // that are registered for it.
-  platform.notifications = nullptr;
   platform.orientation = nullptr;
+  platform.notifications = nullptr;
   log.flush();
   QVPlatform::install(nullptr);
   return status;

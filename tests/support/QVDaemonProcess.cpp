@@ -1,5 +1,7 @@
 #include "tests/support/QVDaemonProcess.h"
 
+#include "tests/support/QVTestBus.h"
+
 #include <csignal>
 #include <fstream>
 #include <iterator>
@@ -51,6 +53,8 @@ std::map<std::string, std::string> QVDaemonProcess::environment(const QVTemporar
           {"STATE_DIRECTORY", root.state()},
           {"LOGS_DIRECTORY", root.logs()},
           {"CONFIGURATION_DIRECTORY", root.configuration()},
+          // Not the machine's own bus.
+          {"DBUS_SYSTEM_BUS_ADDRESS", QVTestBus::address(root.path())},
           {"NOTIFY_SOCKET", readinessPath(root)}};
 }
 
