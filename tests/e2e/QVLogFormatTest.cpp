@@ -75,11 +75,12 @@ TEST_F(QVLogFormatTest, TellsASessionsLife) {
       session.push_back(line);
     }
   }
-  const std::string delegate =
-      "<5>[qvrs] -[QVReportingServiceDelegate listener:shouldAcceptNewConnection:]: ";
+  const std::string service = "<5>[qvrs] -[QVReportingServiceDelegate ";
+  const std::string delegate = service + "listener:shouldAcceptNewConnection:]: ";
   EXPECT_THAT(
       connection,
       ElementsAre(
+          service + "listenForDefaultsNotification]: notify setup result 0",
           AllOf(StartsWith(delegate + "newConnection: "), HasSubstr(pid)),
           StartsWith(delegate +
                      "InvalidationHandler: connection exited process=qv_e2e_tests uptime_sec=")));
