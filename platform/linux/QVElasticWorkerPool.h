@@ -18,8 +18,9 @@
 // does run. Threads are made when a task finds none free. One worker is on its way at a time: when
 // it has come and finds more than it can do at once, it sends for the next, so a burst of short
 // tasks costs few wake-ups. The worker that rested last is the first to be used again, so those in
-// excess stay idle and retire; the last one stays, asleep without a time limit. (Asio's own io_context cannot serve here: it wakes its idle threads in turn, so that
-// none would ever retire, and those that may retire once a second.)
+// excess stay idle and retire; the last one stays, asleep without a time limit. (Asio's own
+// io_context cannot serve here: it wakes its idle threads in turn, so that none would ever retire,
+// and those that may retire once a second.)
 //
 // Used by QVAsioWorkQueues, one pool per quality of service. Threads: as QVWorkExecutor.
 // Failures: where no thread can be had, tasks wait for the next submission or a free worker; one
