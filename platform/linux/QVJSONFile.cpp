@@ -5,7 +5,11 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <charconv>
+#include <cmath>
 #include <cstdint>
+#include <cstdlib>
+#include <system_error>
 #include <utility>
 #include <vector>
 
@@ -15,17 +19,41 @@
 
 namespace {
 
+// The value of a number's text, which the reader has checked; absent where no double is so large.
+// (The reader's own conversion takes 2e308 for infinity and ends the process for 581e308.)
+QVValue number(std::string_view text) {
+  const char* const end = text.data() + text.size();
+  if (text.find_first_of(".eE") == std::string_view::npos) {
+    int64_t whole = 0;
+    if (std::from_chars(text.data(), end, whole).ec == std::errc()) return whole;
+    uint64_t natural = 0;
+    if (std::from_chars(text.data(), end, natural).ec == std::errc()) return natural;
+  }
+  double real = 0;
+  if (std::from_chars(text.data(), end, real).ec == std::errc()) return real;
+  // Too large or too small. The service keeps the locale in which a point is a point.
+  real = std::strtod(std::string(text).c_str(), nullptr);
+  return std::isfinite(real) ? QVValue(real) : QVValue();
+}
+
 // Builds values from the reader's events. Answering false ends the parse.
 class Builder {
  public:
   bool Null() { return add({}); }
   bool Bool(bool value) { return add(value); }
-  bool Int(int value) { return add(value); }
-  bool Uint(unsigned value) { return add(value); }
-  bool Int64(int64_t value) { return add(value); }
-  bool Uint64(uint64_t value) { return add(value); }
-  bool Double(double value) { return add(value); }
-  bool RawNumber(const char*, rapidjson::SizeType, bool) { return false; }
+  // Numbers come as their text (kParseNumbersAsStringsFlag), so these are never called.
+  bool Int(int) { return false; }
+  bool Uint(unsigned) { return false; }
+  bool Int64(int64_t) { return false; }
+  bool Uint64(uint64_t) { return false; }
+  bool Double(double) { return false; }
+  bool RawNumber(const char* text, rapidjson::SizeType length, bool) {
+    const QVValue value = number({text, length});
+    if (value.isAbsent()) {
+      refusal_ = rapidjson::GetParseError_En(rapidjson::kParseErrorNumberTooBig);
+    }
+    return refusal_.empty() && add(value);
+  }
   bool String(const char* text, rapidjson::SizeType length, bool) {
     return isPaired({text, length}) && add(std::string_view(text, length));
   }
@@ -69,7 +97,7 @@ class Builder {
     for (std::size_t at = text.find('\xED'); at != std::string_view::npos;
          at = text.find('\xED', at + 1)) {
       if (static_cast<unsigned char>(text[at + 1]) < 0xA0) continue;
-      refusal_ = "The surrogate pair in string is invalid.";
+      refusal_ = rapidjson::GetParseError_En(rapidjson::kParseErrorStringUnicodeSurrogateInvalid);
       return false;
     }
     return true;
@@ -107,7 +135,8 @@ std::string QVJSONFailure::description() const {
 }
 
 std::optional<QVValue> QVJSONFile::parse(std::string_view text, QVJSONFailure& failure) {
-  constexpr unsigned kFlags = rapidjson::kParseIterativeFlag | rapidjson::kParseFullPrecisionFlag |
+  constexpr unsigned kFlags = rapidjson::kParseIterativeFlag |
+                              rapidjson::kParseNumbersAsStringsFlag |
                               rapidjson::kParseValidateEncodingFlag;
   rapidjson::MemoryStream stream(text.data(), text.size());
   rapidjson::Reader reader;

@@ -79,6 +79,30 @@ TEST(QVJSONFile, RefusesHalvesOfSurrogatePairs) {
   EXPECT_EQ(parsed(R"("\ud7ff\ue000")"), QVValue("\xED\x9F\xBF\xEE\x80\x80"));
 }
 
+TEST(QVJSONFile, RefusesNumbersThatNoDoubleHolds) {
+  for (const char* text : {"2e308", "-2e308", "581e308", "1e309", "1e999", "1.8e308",
+                           "[1e2147483647]", "1e99999999999999999999"}) {
+    EXPECT_EQ(failureOf(text).reason, "Number too big to be stored in double.") << text;
+  }
+  EXPECT_EQ(failureOf("2" + std::string(308, '0')).reason,
+            "Number too big to be stored in double.");
+}
+
+TEST(QVJSONFile, ReadsNumbersAtTheEdges) {
+  EXPECT_EQ(parsed("1.7976931348623157e308"), QVValue(std::numeric_limits<double>::max()));
+  EXPECT_EQ(parsed("1" + std::string(308, '0')), QVValue(1e308));
+  EXPECT_EQ(parsed("5e-324"), QVValue(5e-324));
+  EXPECT_EQ(parsed("2.2250738585072014E-308"), QVValue(std::numeric_limits<double>::min()));
+  EXPECT_EQ(parsed("1e-999"), QVValue(0.0));
+  EXPECT_EQ(parsed("0." + std::string(400, '0') + "1"), QVValue(0.0));
+  EXPECT_EQ(parsed("-0"), QVValue(0));
+  EXPECT_EQ(parsed("9223372036854775808"), QVValue(uint64_t{1} << 63));
+  EXPECT_EQ(parsed("-9223372036854775809"), QVValue(-9223372036854775808.0));
+  // Halfway between two doubles, and a little more: the digits decide, however many there are.
+  EXPECT_EQ(parsed("9007199254740993.0"), QVValue(9007199254740992.0));
+  EXPECT_EQ(parsed("9007199254740993." + std::string(800, '0') + "1"), QVValue(9007199254740994.0));
+}
+
 TEST(QVJSONFile, RefusesBytesAfterAnEndThatTheyPretend) {
   EXPECT_EQ(failureOf(std::string_view("1\0", 2)).line, 1U);
 }
