@@ -140,10 +140,6 @@ std::size_t QVFakeFileSystem::openFiles() const {
   return state_->openFiles;
 }
 
-QVFakeMisuse& QVFakeFileSystem::misuse() {
-  return state_->misuse;
-}
-
 std::optional<std::errc> QVFakeFileSystem::State::failure(Step step, std::size_t bytes) const {
   const auto found = failures.find(step);
   if (found == failures.end()) return std::nullopt;

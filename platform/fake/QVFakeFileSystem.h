@@ -52,7 +52,7 @@ class QVFakeFileSystem final : public QVFileSystem {
 
   // Files that were written to, or committed, after they had been committed, and paths that name
   // no place.
-  QVFakeMisuse& misuse();
+  std::vector<std::string> takeMisuses() { return state_->misuse.take(); }
 
  private:
   class File;

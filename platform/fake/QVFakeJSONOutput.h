@@ -4,6 +4,8 @@
 #include "platform/fake/QVFakeMisuse.h"
 
 #include <memory>
+#include <string>
+#include <vector>
 
 // Writes JSON text for tests, simply: each element is made as a whole and handed to the sink.
 //
@@ -14,7 +16,7 @@ class QVFakeJSONOutput final : public QVJSONOutput {
 
   // Arrays that were added to or ended after their end or after a failure, and members that are not
   // in order.
-  QVFakeMisuse& misuse() { return *misuse_; }
+  std::vector<std::string> takeMisuses() { return misuse_->take(); }
 
  private:
   class Stream;

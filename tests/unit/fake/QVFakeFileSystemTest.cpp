@@ -92,7 +92,7 @@ TEST_F(QVFakeFileSystemTest, NotesWrongUse) {
   static_cast<void>(files_.makeAtomicFile("relative"));
   static_cast<void>(files_.createDirectory("/logs//a", 0777));
   files_.addFile("/nowhere/file", "x");
-  EXPECT_THAT(files_.misuse().take(),
+  EXPECT_THAT(files_.takeMisuses(),
               ElementsAre("written after its end: /logs/file", "committed twice: /logs/file",
                           "no place for a file: relative", "no place for a directory: /logs//a",
                           "no place for a file: /nowhere/file"));
@@ -105,12 +105,12 @@ TEST(QVFakeJSONOutputTest, NotesWrongUse) {
   const QVDictionaryEntry twice[] = {{"a", 1}, {"a", 2}};
   EXPECT_EQ(stream->append(unordered), std::nullopt);
   EXPECT_EQ(stream->append("name", twice), std::nullopt);
-  EXPECT_THAT(output.misuse().take(), ElementsAre("members out of order", "members out of order"));
+  EXPECT_THAT(output.takeMisuses(), ElementsAre("members out of order", "members out of order"));
   stream->end();
-  EXPECT_THAT(output.misuse().take(), IsEmpty());
+  EXPECT_THAT(output.takeMisuses(), IsEmpty());
   EXPECT_EQ(stream->append(QVDictionary{{"a", 1}}), std::nullopt);
   stream->end();
-  EXPECT_THAT(output.misuse().take(),
+  EXPECT_THAT(output.takeMisuses(),
               ElementsAre("an array appended to after its end", "an array ended twice"));
 }
 
