@@ -33,7 +33,8 @@
 #define QUIETVOX_CHANNELS_DIRECTORY "/run/quietvox/channels"
 
 // What becomes of the file when a driver ends in good order.
-enum { QUIETVOX_CHANNELS_KEEP = 0, QUIETVOX_CHANNELS_REMOVE = 1 };
+#define QUIETVOX_CHANNELS_KEEP 0
+#define QUIETVOX_CHANNELS_REMOVE 1
 
 // Publishes a group: `place` is its name, or with a "/" the path of its file, whose last part is
 // the name. Every name has one to 63 bytes. Without subgroups (0 of them) the channels belong to
