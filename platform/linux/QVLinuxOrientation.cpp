@@ -78,13 +78,13 @@ void QVLinuxOrientation::run() {
     bell_->hush();
     sensor_.work();
     file_.work();
-    sleep();
+    rest();
   }
 }
 
-void QVLinuxOrientation::sleep() const {
+void QVLinuxOrientation::rest() const {
   using std::chrono::milliseconds;
-  const QVSensorProxyOrientation::Sleep bus = sensor_.sleep();
+  const QVSensorProxyOrientation::Rest bus = sensor_.rest();
   int limit = -1;
   if (bus.end) {
     const auto left = std::chrono::ceil<milliseconds>(*bus.end - std::chrono::steady_clock::now());

@@ -44,7 +44,7 @@ class QVLinuxOrientation final : public QVOrientation {
  private:
   void demandChanged();
   void run();
-  void sleep() const;
+  void rest() const;
 
   QVLog& log_;
   const std::shared_ptr<const QVBell> bell_;

@@ -103,23 +103,23 @@ QVSensorProxyOrientation::~QVSensorProxyOrientation() {
   close();
 }
 
-QVSensorProxyOrientation::Sleep QVSensorProxyOrientation::sleep() const {
-  Sleep sleep;
+QVSensorProxyOrientation::Rest QVSensorProxyOrientation::rest() const {
+  Rest rest;
   if (bus_ == nullptr) {
-    if (period_ != QVOrientationRegistrations::kNoDemand) sleep.end = retryAt_;
-    return sleep;
+    if (period_ != QVOrientationRegistrations::kNoDemand) rest.end = retryAt_;
+    return rest;
   }
   const int events = sd_bus_get_events(bus_);
   uint64_t limit = 0;
   if (events < 0 || sd_bus_get_timeout(bus_, &limit) < 0) {
-    sleep.end = Clock::now();
-    return sleep;
+    rest.end = Clock::now();
+    return rest;
   }
-  sleep.descriptor = sd_bus_get_fd(bus_);
-  sleep.events = static_cast<short>(events);
+  rest.descriptor = sd_bus_get_fd(bus_);
+  rest.events = static_cast<short>(events);
   // Both count the kernel's monotonic time.
-  if (limit != UINT64_MAX) sleep.end = Clock::time_point(std::chrono::microseconds(limit));
-  return sleep;
+  if (limit != UINT64_MAX) rest.end = Clock::time_point(std::chrono::microseconds(limit));
+  return rest;
 }
 
 void QVSensorProxyOrientation::work() {

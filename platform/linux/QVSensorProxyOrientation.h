@@ -53,13 +53,13 @@ class QVSensorProxyOrientation {
   // Where the machine's own bus is. Asked before there are other threads.
   static std::string systemBusAddress();
 
-  // Until when, and for what, the thread may sleep.
-  struct Sleep {
+  // Until when, and for what, the thread may rest.
+  struct Rest {
     int descriptor = -1;  // none
     short events = 0;
     std::optional<std::chrono::steady_clock::time_point> end;
   };
-  Sleep sleep() const;
+  Rest rest() const;
   // Follows the demand and the bus.
   void work();
 

@@ -199,6 +199,19 @@ TEST_F(QVPreferencesTest, AreReadForVerboseLinesAsTheServiceStarts) {
   EXPECT_GT(log().count(verbose), 0U);
 }
 
+TEST_F(QVPreferencesTest, TurnAnalyticsEventsOffByName) {
+  root_.configure("preferences/net.quillon.countwise.json",
+                  R"({"unwanted": ["net.quillon.quietvox.Session_Playback.Start"]})");
+  startService({});
+  client().create(7, kTelephony);
+  client().start(7);
+  client().sendMessage({{"a", 1}}, {7});
+  client().sendMessage({{"a", 2}}, {7}, 0x40000007, 0);
+  endService();
+  EXPECT_THAT(store().rows("SELECT payload FROM countwise_event WHERE name NOT LIKE '%uptime'"),
+              ElementsAre(HasSubstr(R"("a":2)")));
+}
+
 // ---- How a notification is posted
 
 class QVPostingTest : public QVPreferencesTest,

@@ -312,13 +312,13 @@ TEST_F(QVSensorProxyOrientationTest, IsUndefinedUntilThereIsABus) {
   QVSensorProxyOrientation sensor(
       log_, {.busAddress = address(), .firstRetry = std::chrono::milliseconds(1)}, registrations);
   sensor.work();
-  EXPECT_EQ(sensor.sleep().descriptor, -1);
-  EXPECT_FALSE(sensor.sleep().end.has_value());
+  EXPECT_EQ(sensor.rest().descriptor, -1);
+  EXPECT_FALSE(sensor.rest().end.has_value());
 
   registrations.add("id", [this](int32_t orientation) { heard_.add(orientation); });
   sensor.work();
-  EXPECT_EQ(sensor.sleep().descriptor, -1);
-  EXPECT_TRUE(sensor.sleep().end.has_value());
+  EXPECT_EQ(sensor.rest().descriptor, -1);
+  EXPECT_TRUE(sensor.rest().end.has_value());
   EXPECT_THAT(log_.renderings(),
               ElementsAre("6[default] -[QVSensorProxyOrientation note:]: the device's orientation "
                           "is undefined, the system bus: No such file or directory"));
@@ -326,19 +326,19 @@ TEST_F(QVSensorProxyOrientationTest, IsUndefinedUntilThereIsABus) {
   startSensor("left-up");
   const auto limit = std::chrono::steady_clock::now() + std::chrono::minutes(1);
   while (heard_.values().empty() && std::chrono::steady_clock::now() < limit) {
-    const auto sleep = sensor.sleep();
-    pollfd event{sleep.descriptor, sleep.events, 0};
-    ::poll(&event, 1, sleep.end ? 1 : 60'000);
+    const auto rest = sensor.rest();
+    pollfd event{rest.descriptor, rest.events, 0};
+    ::poll(&event, 1, rest.end ? 1 : 60'000);
     sensor.work();
   }
   EXPECT_THAT(heard_.values(), ElementsAre(kLeftUp));
 
   registrations.remove("id");
-  while (sensor.sleep().descriptor >= 0 && std::chrono::steady_clock::now() < limit) {
+  while (sensor.rest().descriptor >= 0 && std::chrono::steady_clock::now() < limit) {
     sensor.work();
   }
-  EXPECT_EQ(sensor.sleep().descriptor, -1);
-  EXPECT_FALSE(sensor.sleep().end.has_value());
+  EXPECT_EQ(sensor.rest().descriptor, -1);
+  EXPECT_FALSE(sensor.rest().end.has_value());
 }
 
 TEST_F(QVSensorProxyOrientationTest, ConnectsAgainToABusThatRestarts) {
