@@ -1,0 +1,110 @@
+#include "platform/fake/QVFakeLog.h"
+#include "platform/linux/QVAsioRunLoopThreads.h"
+#include "platform/linux/QVAsioWorkQueues.h"
+#include "tests/unit/system/QVEvent.h"
+
+#include <array>
+#include <atomic>
+#include <chrono>
+#include <filesystem>
+#include <iterator>
+#include <optional>
+
+#include <gmock/gmock.h>
+#include <pthread.h>
+
+namespace {
+
+using namespace std::chrono_literals;
+
+std::size_t threadCount() {
+  const std::filesystem::directory_iterator tasks("/proc/self/task");
+  return static_cast<std::size_t>(std::distance(begin(tasks), end(tasks)));
+}
+
+class QVAsioRunLoopThreadsTest : public testing::Test {
+ protected:
+  QVFakeLog log_;
+  std::optional<QVAsioRunLoopThreads> threads_{std::in_place, log_};
+};
+
+TEST_F(QVAsioRunLoopThreadsTest, HasNoThreadUntilOneIsStarted) {
+  const std::size_t before = threadCount();
+  const auto timer = threads_->makeTimer(0s, [] {});
+  EXPECT_EQ(threadCount(), before);
+  QVEvent mayEnd;
+  threads_->startThread("qv-test", [&](QVRunLoop&) { EXPECT_TRUE(mayEnd.wait()); });
+  EXPECT_EQ(threadCount(), before + 1);
+  mayEnd.happen();
+  threads_.reset();
+}
+
+TEST_F(QVAsioRunLoopThreadsTest, WaitsForItsThreadsAtTheEnd) {
+  bool hasEnded = false;
+  const auto timer = threads_->makeTimer(20ms, [] {});
+  threads_->startThread("qv-test", [&](QVRunLoop& loop) {
+    loop.attach(timer);
+    loop.run();
+    hasEnded = true;
+  });
+  threads_.reset();
+  EXPECT_TRUE(hasEnded);
+}
+
+TEST_F(QVAsioRunLoopThreadsTest, CollectsThreadsThatHaveEndedWhenTheNextOneStarts) {
+  const std::size_t before = threadCount();
+  for (int i = 0; i < 20; ++i) {
+    const auto thread = threads_->startThread("qv-test", [](QVRunLoop&) {});
+    // The limit only ends a test that has failed.
+    for (int j = 0; j < 60'000 && !thread->isFinished(); ++j) threads_->pause(1ms);
+    ASSERT_TRUE(thread->isFinished());
+    EXPECT_LE(threadCount(), before + 1);
+  }
+}
+
+TEST_F(QVAsioRunLoopThreadsTest, NamesThreadsAsTheKernelCanHoldIt) {
+  std::array<char, 16> name{};
+  threads_->startThread("qv-with-a-name-that-is-too-long", [&](QVRunLoop&) {
+    pthread_getname_np(pthread_self(), name.data(), name.size());
+  });
+  threads_.reset();
+  EXPECT_STREQ(name.data(), "qv-with-a-name-");
+}
+
+TEST_F(QVAsioRunLoopThreadsTest, WakesOthersBeforeAnItemPauses) {
+  QVAsioWorkQueues queues(log_);
+  const auto first = queues.makeSerialQueue("first", QVQualityOfService::utility, 0);
+  const auto second = queues.makeSerialQueue("second", QVQualityOfService::userInteractive, 0);
+  QVEvent ranOnSecond;
+  QVEvent done;
+  bool ranMeanwhile = false;
+  first->async([&] {
+    second->async([&] { ranOnSecond.happen(); });
+    // The limit only ends a test that has failed.
+    for (int i = 0; i < 60'000 && !ranOnSecond.hasHappened(); ++i) threads_->pause(1ms);
+    ranMeanwhile = ranOnSecond.hasHappened();
+    done.happen();
+  });
+  ASSERT_TRUE(done.wait());
+  EXPECT_TRUE(ranMeanwhile);
+}
+
+TEST_F(QVAsioRunLoopThreadsTest, LetsAPoolUseAnotherWorkerWhileOnePauses) {
+  // More than the pool runs at once, each of which ends when all have begun.
+  constexpr int kItems = 16;
+  QVAsioWorkQueues queues(log_);
+  std::atomic<int> begun{0};
+  std::array<QVEvent, kItems> done;
+  for (QVEvent& event : done) {
+    const auto queue = queues.makeSerialQueue("item", QVQualityOfService::utility, 0);
+    queue->async([&, this] {
+      ++begun;
+      for (int i = 0; i < 60'000 && begun < kItems; ++i) threads_->pause(1ms);
+      event.happen();
+    });
+  }
+  for (QVEvent& event : done) ASSERT_TRUE(event.wait());
+  EXPECT_EQ(begun, kItems);
+}
+
+}  // namespace
