@@ -93,6 +93,11 @@ class Session {
   std::shared_ptr<QVReportingSession> session_;
 };
 
+benchmark::Counter perMessage(const benchmark::State& state) {
+  return {static_cast<double>(state.range(0)),
+          benchmark::Counter::kIsIterationInvariantRate | benchmark::Counter::kInvert};
+}
+
 void summaryEvent(benchmark::State& state) {
   Session session(static_cast<int>(state.range(0)));
   const double before = mebibytes("VmRSS");
@@ -100,9 +105,7 @@ void summaryEvent(benchmark::State& state) {
   for (auto _ : state) {
     benchmark::DoNotOptimize(session.session().createSummaryEventForSession());
   }
-  state.counters["ns_message"] = benchmark::Counter(
-      static_cast<double>(state.range(0)) * 1e-9,
-      benchmark::Counter::kIsIterationInvariantRate | benchmark::Counter::kInvert);
+  state.counters["per_message"] = perMessage(state);
   state.counters["MiB_before"] = before;
   state.counters["MiB_peak"] = mebibytes("VmHWM");
 }
@@ -125,9 +128,7 @@ void summaryFile(benchmark::State& state) {
   const double before = mebibytes("VmRSS");
   forgetPeak();
   for (auto _ : state) session.session().writeSummaryJson();
-  state.counters["ns_message"] = benchmark::Counter(
-      static_cast<double>(state.range(0)) * 1e-9,
-      benchmark::Counter::kIsIterationInvariantRate | benchmark::Counter::kInvert);
+  state.counters["per_message"] = perMessage(state);
   state.counters["MiB_before"] = before;
   state.counters["MiB_peak"] = mebibytes("VmHWM");
   state.counters["MiB_file"] = session.fileMebibytes();
