@@ -5,11 +5,10 @@
 #include "platform/QVValue.h"
 
 #include <cstdint>
-#include <deque>
 #include <memory>
 #include <mutex>
-#include <optional>
 #include <string_view>
+#include <vector>
 
 // One of a session's two arrays of recorded payloads: the aggregated one, whose entries have no
 // name, or the nested one, whose entries are payloads under their message identifiers. Payloads lie
@@ -51,11 +50,17 @@ class QVReportingPayloadArray {
     uint32_t count;  // from 1; 0: no identifier
   };
 
-  std::deque<Entry>& entries();
+  // Chunks grow from the first size to the last: there may be many sessions that record little, and
+  // large blocks go straight back to the system when a session stops.
+  static constexpr std::size_t kFirstChunkEntries = 8;
+  static constexpr std::size_t kLargestChunkEntries = 8192;
+
+  void add(const Entry& entry);
 
   mutable std::recursive_mutex mutex_;
   const std::shared_ptr<QVReportingPayloadStore> store_;
-  // Guarded by mutex_. Made with the first entry: an empty deque takes half a KiB, and there may be
-  // many sessions that never record anything.
-  std::optional<std::deque<Entry>> entries_;
+  // Guarded by mutex_.
+  std::vector<Entry> front_;                // inserted there, the latest last
+  std::vector<std::vector<Entry>> chunks_;  // appended; never more than was reserved for each
+  std::size_t size_ = 0;
 };
