@@ -1,7 +1,7 @@
 // What drivers count while a session runs: published by processes of their own and by the kernel's
 // texts, read at start and stop, stored as a message of the session.
 
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVEndToEndTest.h"
 #include "tests/support/QVDriverProcess.h"
 
 #include <csignal>

@@ -1,8 +1,8 @@
 // Messages that break the protocol. Each costs its sender the connection and nobody else anything,
 // and one log line says which rule it broke.
 
-#include "tests/e2e/QVEndToEndTest.h"
-#include "tests/e2e/QVFrameBuilder.h"
+#include "tests/support/QVEndToEndTest.h"
+#include "tests/support/QVFrameBuilder.h"
 
 #include <ostream>
 

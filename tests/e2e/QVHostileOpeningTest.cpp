@@ -1,7 +1,7 @@
 // Peers that break the rules before their first message. Each loses its connection, one log line
 // says why, and nobody else notices.
 
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVEndToEndTest.h"
 #include "tests/support/QVSubprocess.h"
 
 #include <deque>

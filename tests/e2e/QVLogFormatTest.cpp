@@ -1,6 +1,6 @@
 // What the service writes to its standard error.
 
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVEndToEndTest.h"
 
 #include <regex>
 

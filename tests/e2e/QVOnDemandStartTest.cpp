@@ -1,7 +1,7 @@
 // How the service comes to its socket, and what it says to its manager.
 
-#include "tests/e2e/QVDirectoryWatch.h"
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVDirectoryWatch.h"
+#include "tests/support/QVEndToEndTest.h"
 #include "tests/support/QVSubprocess.h"
 
 #include <filesystem>

@@ -1,6 +1,6 @@
 // What a session records of how the device is held and how its user interface is turned.
 
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVEndToEndTest.h"
 #include "tests/support/QVFileReadings.h"
 #include "tests/support/QVTestBus.h"
 #include "tests/support/QVTestSensor.h"

@@ -1,7 +1,7 @@
 // Peers that keep to the protocol and are a burden all the same: that do not read, vanish in the
 // middle, or use up what there is.
 
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVEndToEndTest.h"
 
 #include <deque>
 #include <filesystem>

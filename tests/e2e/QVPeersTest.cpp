@@ -1,6 +1,6 @@
 // Clients that were written in another language on implementations of the protocol of their own.
 
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVEndToEndTest.h"
 #include "tests/support/QVSubprocess.h"
 
 #include <gmock/gmock.h>

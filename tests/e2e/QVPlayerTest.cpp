@@ -1,6 +1,6 @@
 // The example player, playing a real recording and reporting it.
 
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVEndToEndTest.h"
 #include "tests/support/QVSubprocess.h"
 
 #include <gmock/gmock.h>

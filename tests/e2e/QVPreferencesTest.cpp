@@ -1,6 +1,6 @@
 // Preferences, and the notification that makes the service read them.
 
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVEndToEndTest.h"
 #include "tests/support/QVSubprocess.h"
 
 #include <filesystem>

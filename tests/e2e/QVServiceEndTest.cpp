@@ -1,6 +1,6 @@
 // How the service ends, and what is stored then.
 
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVEndToEndTest.h"
 
 #include <csignal>
 #include <filesystem>

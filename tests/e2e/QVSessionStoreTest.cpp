@@ -1,6 +1,6 @@
 // What a session's life leaves in the event store.
 
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVEndToEndTest.h"
 #include "tests/support/QVSubprocess.h"
 
 #include <chrono>

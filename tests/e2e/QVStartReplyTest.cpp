@@ -1,6 +1,6 @@
 // When the reply to a start comes, and when it never does; replies that come twice or not at all.
 
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVEndToEndTest.h"
 
 #include <gmock/gmock.h>
 

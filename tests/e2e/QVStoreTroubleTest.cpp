@@ -1,6 +1,6 @@
 // An event store that cannot be opened or written: the service goes on, says so, and counts.
 
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVEndToEndTest.h"
 
 #include <csignal>
 #include <filesystem>

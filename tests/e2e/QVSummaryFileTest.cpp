@@ -1,7 +1,7 @@
 // The file that a session leaves on an internal build when it stops.
 
-#include "tests/e2e/QVDirectoryWatch.h"
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVDirectoryWatch.h"
+#include "tests/support/QVEndToEndTest.h"
 #include "tests/support/QVSubprocess.h"
 
 #include <cmath>

@@ -1,6 +1,6 @@
 // The service as D-Bus tools see it: busctl (sd-bus), gdbus (GDBus), dbus-send (libdbus).
 
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVEndToEndTest.h"
 #include "tests/support/QVSubprocess.h"
 
 #include <gmock/gmock.h>

@@ -1,6 +1,6 @@
 // The service's trace points, as tools see them from outside.
 
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVEndToEndTest.h"
 #include "tests/support/QVSubprocess.h"
 
 #include <csignal>

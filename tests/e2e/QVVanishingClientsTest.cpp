@@ -1,6 +1,6 @@
 // Clients that start something and vanish, again and again: nothing of them is left.
 
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVEndToEndTest.h"
 
 #include <gmock/gmock.h>
 

@@ -4,7 +4,7 @@
 #include "platform/fake/QVFakeLog.h"
 #include "platform/fake/QVFakePreferences.h"
 #include "platform/linux/QVSQLiteEventStore.h"
-#include "tests/e2e/QVStoreReader.h"
+#include "tests/support/QVStoreReader.h"
 #include "tests/support/QVTemporaryRoot.h"
 
 #include <future>

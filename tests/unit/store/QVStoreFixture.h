@@ -7,7 +7,7 @@
 #include "platform/linux/QVStoreBeacon.h"
 #include "platform/linux/QVStoreCountwise.h"
 #include "platform/linux/QVStoreJoulewell.h"
-#include "tests/e2e/QVStoreReader.h"
+#include "tests/support/QVStoreReader.h"
 #include "tests/support/QVTemporaryRoot.h"
 
 #include <chrono>

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "tests/e2e/QVServiceLog.h"
+#include "tests/support/QVServiceLog.h"
 #include "tests/support/QVSubprocess.h"
 
 #include <cstddef>

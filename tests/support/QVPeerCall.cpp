@@ -1,4 +1,4 @@
-#include "tests/e2e/QVPeerCall.h"
+#include "tests/support/QVPeerCall.h"
 
 #include <utility>
 

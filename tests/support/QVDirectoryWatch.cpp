@@ -1,4 +1,4 @@
-#include "tests/e2e/QVDirectoryWatch.h"
+#include "tests/support/QVDirectoryWatch.h"
 
 #include <chrono>
 #include <stdexcept>

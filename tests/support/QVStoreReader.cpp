@@ -1,6 +1,6 @@
-#include "tests/e2e/QVStoreReader.h"
+#include "tests/support/QVStoreReader.h"
 
-#include "tests/e2e/QVDirectoryWatch.h"
+#include "tests/support/QVDirectoryWatch.h"
 
 #include <memory>
 #include <stdexcept>

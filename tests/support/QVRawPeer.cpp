@@ -1,4 +1,4 @@
-#include "tests/e2e/QVRawPeer.h"
+#include "tests/support/QVRawPeer.h"
 
 #include "platform/QVText.h"
 #include "platform/linux/bus/QVBusAuthClient.h"

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "tests/e2e/QVRawPeer.h"
+#include "tests/support/QVRawPeer.h"
 
 #include <cstdint>
 #include <filesystem>

@@ -1,8 +1,8 @@
 #pragma once
 
 #include "platform/linux/bus/QVBusFrameDecoder.h"
-#include "tests/e2e/QVPeerCall.h"
-#include "tests/e2e/QVPeerMessage.h"
+#include "tests/support/QVPeerCall.h"
+#include "tests/support/QVPeerMessage.h"
 
 #include <cstddef>
 #include <cstdint>

@@ -1,4 +1,4 @@
-#include "tests/e2e/QVServiceLog.h"
+#include "tests/support/QVServiceLog.h"
 
 #include <fstream>
 #include <utility>

@@ -1,8 +1,8 @@
 #pragma once
 
-#include "tests/e2e/QVPeerClient.h"
-#include "tests/e2e/QVServiceLog.h"
-#include "tests/e2e/QVStoreReader.h"
+#include "tests/support/QVPeerClient.h"
+#include "tests/support/QVServiceLog.h"
+#include "tests/support/QVStoreReader.h"
 #include "tests/support/QVDaemonProcess.h"
 #include "tests/support/QVTemporaryRoot.h"
 

@@ -1,4 +1,4 @@
-#include "tests/e2e/QVEndToEndTest.h"
+#include "tests/support/QVEndToEndTest.h"
 
 #include <gmock/gmock.h>
 

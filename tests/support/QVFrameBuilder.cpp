@@ -1,4 +1,4 @@
-#include "tests/e2e/QVFrameBuilder.h"
+#include "tests/support/QVFrameBuilder.h"
 
 QVFrameBuilder& QVFrameBuilder::align(std::size_t alignment, char padding) {
   while (bytes_.size() % alignment != 0) bytes_.push_back(padding);

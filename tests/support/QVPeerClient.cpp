@@ -1,4 +1,4 @@
-#include "tests/e2e/QVPeerClient.h"
+#include "tests/support/QVPeerClient.h"
 
 #include <gtest/gtest.h>
 

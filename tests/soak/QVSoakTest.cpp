@@ -1,8 +1,8 @@
 // Many clients at once that do whatever they may, and what they may not.
 
 #include "client/quietvox_channels.h"
-#include "tests/e2e/QVEndToEndTest.h"
-#include "tests/e2e/QVFrameBuilder.h"
+#include "tests/support/QVEndToEndTest.h"
+#include "tests/support/QVFrameBuilder.h"
 #include "tests/support/QVSubprocess.h"
 
 #include <atomic>

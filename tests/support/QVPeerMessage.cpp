@@ -1,4 +1,4 @@
-#include "tests/e2e/QVPeerMessage.h"
+#include "tests/support/QVPeerMessage.h"
 
 #include "platform/QVText.h"
 #include "platform/linux/bus/QVBusMessage.h"

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "tests/e2e/QVDirectoryWatch.h"
+#include "tests/support/QVDirectoryWatch.h"
 
 #include <cstddef>
 #include <filesystem>
