@@ -57,27 +57,26 @@ std::optional<std::string> failureOf(sd_bus_message* reply) {
 struct QVSensorProxyOrientation::Dispatch {
   using Handler = void (QVSensorProxyOrientation::*)(sd_bus_message*);
 
-  template <Handler handler>
+  template <Handler Handle>
   static int to(sd_bus_message* message, void* self, sd_bus_error*) {
-    (static_cast<QVSensorProxyOrientation*>(self)->*handler)(message);
+    (static_cast<QVSensorProxyOrientation*>(self)->*Handle)(message);
     return 0;
   }
 
-  // Makes a call of the daemon in place of the one under way.
-  template <Handler handler, class... Arguments>
-  static int call(QVSensorProxyOrientation& self, const char* interface, const char* member,
-                  bool mayStart, const char* types, Arguments... arguments) {
+  // Calls a member of one of the daemon's interfaces, in place of the call under way.
+  template <Handler Handle, class... Arguments>
+  static int call(QVSensorProxyOrientation& self, const char* of, const char* member, bool mayStart,
+                  const char* types, Arguments... arguments) {
     self.forgetCall();
     sd_bus_message* call = nullptr;
-    int result =
-        sd_bus_message_new_method_call(self.bus_, &call, kService, kPath, interface, member);
+    int result = sd_bus_message_new_method_call(self.bus_, &call, kService, kPath, of, member);
     if (result >= 0) result = sd_bus_message_set_auto_start(call, mayStart ? 1 : 0);
     if (result >= 0 && sizeof...(arguments) > 0) {
       result = sd_bus_message_append(call, types, arguments...);
     }
     if (result >= 0) {
       result =
-          sd_bus_call_async(self.bus_, &self.call_, call, to<handler>, &self,
+          sd_bus_call_async(self.bus_, &self.call_, call, to<Handle>, &self,
                             static_cast<uint64_t>(std::chrono::microseconds(kAnswerLimit).count()));
     }
     sd_bus_message_unref(call);
