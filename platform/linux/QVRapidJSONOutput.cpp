@@ -25,6 +25,7 @@ class Pieces {
 
   explicit Pieces(QVJSONOutput::Sink sink) : sink_(std::move(sink)) {}
 
+  // NOLINTNEXTLINE(readability-identifier-naming): RapidJSON's name.
   void Put(char c) {
     if (used_ == piece_.size()) Flush();
     piece_[used_++] = c;
@@ -46,6 +47,7 @@ class Pieces {
     std::memset(piece_.data() + used_, c, count);
     used_ += count;
   }
+  // NOLINTNEXTLINE(readability-identifier-naming): RapidJSON's name.
   void Flush() {
     if (used_ == 0) return;
     sink_({piece_.data(), used_});
@@ -64,6 +66,7 @@ class Pieces {
 };
 
 // Chosen by RapidJSON for the indentation, instead of putting one blank after the other.
+// NOLINTNEXTLINE(readability-identifier-naming): RapidJSON's name.
 void PutN(Pieces& pieces, char c, std::size_t count) {
   pieces.putRepeatedly(c, count);
 }

@@ -80,12 +80,12 @@ void appendDigits(std::string& out, int64_t number, std::size_t width) {
 
 // "20261116-061300+0000": the date at a place whose time is so far ahead of UTC.
 std::string dateText(QVDate date, std::chrono::seconds offset) {
-  using namespace std::chrono;
-  const auto local = floor<seconds>(date) + offset;
-  const auto day = floor<days>(local);
-  const year_month_day calendar(day);
-  const hh_mm_ss time(local - day);
-  const int64_t ahead = duration_cast<minutes>(offset).count();
+  namespace chrono = std::chrono;
+  const auto local = chrono::floor<chrono::seconds>(date) + offset;
+  const auto day = chrono::floor<chrono::days>(local);
+  const chrono::year_month_day calendar(day);
+  const chrono::hh_mm_ss time(local - day);
+  const int64_t ahead = chrono::duration_cast<chrono::minutes>(offset).count();
 
   std::string text;
   appendDigits(text, int{calendar.year()}, 4);

@@ -357,7 +357,6 @@ TEST_F(QVReportingSummaryFileTest, IsNamedAfterLocalTime) {
     const char* name;
   };
   using std::chrono::sys_days;
-  using namespace std::chrono;
   const Zone zones[] = {
       {sys_days(2026y / 11 / 16) + 6h + 13min, 0s, "20261116-061300+0000"},
       {sys_days(2026y / 11 / 16) + 6h + 13min, 5h + 45min, "20261116-115800+0545"},
