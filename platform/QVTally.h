@@ -61,8 +61,8 @@ class QVTally {
   // it could not be made.
   virtual std::shared_ptr<TallySubscription> TallyCreateSubscription(
       const TallyChannelSet& channels, std::shared_ptr<const TallyChannelSet>& subscribed) = 0;
-  // The channels' values now. Channels that are gone are left out. A missing subscription or set is
-  // an error.
+  // The channels' values now. Channels that are gone are left out, without an error, also where
+  // that leaves a set of none. A missing subscription or set is an error.
   virtual std::shared_ptr<const TallySampleSet> TallyCreateSamples(
       const std::shared_ptr<TallySubscription>& subscription,
       const std::shared_ptr<const TallyChannelSet>& subscribed, Error& error) = 0;

@@ -233,7 +233,8 @@ std::shared_ptr<const TallySampleSet> QVPublishedTally::TallyCreateSamples(
     if (channelsOfSource[source].empty()) continue;
     QVChannelReadings readings;
     if (const int code = set->sources[source]->read(readings)) {
-      note(error, code, set->sources[source]->group());
+      // A publisher that is gone takes its own channels with it, and nobody else's.
+      if (code != ENOENT) note(error, code, set->sources[source]->group());
       continue;
     }
     const Lookup lookup(readings);

@@ -218,6 +218,31 @@ TYPED_TEST(QVTallyContract, LeavesOutWhatIsGoneAndWhatIsNew) {
   EXPECT_THAT(this->contents(this->sample(subscribed)), IsEmpty());
 }
 
+TYPED_TEST(QVTallyContract, LeavesOutAPublisherThatGoesAwayAndNoOther) {
+  this->harness_.publish("One", "MCA", {{"a", 1}});
+  this->harness_.publish("Two", "MCA", {{"b", 2}});
+  const auto subscribed = this->subscribe(std::nullopt, "MCA");
+  const Samples before = this->sample(subscribed);
+  this->harness_.withdraw("One", "MCA");
+  this->harness_.publish("Two", "MCA", {{"b", 5}});
+  const Samples after = this->sample(subscribed);
+  EXPECT_THAT(this->contents(after), ElementsAre("b 5"));
+  EXPECT_THAT(this->contents(this->delta(before, after)), ElementsAre("b 3"));
+}
+
+TYPED_TEST(QVTallyContract, HasSamplesOfNothingOnceAllPublishersAreGone) {
+  this->harness_.publish("One", "MCA", {{"a", 1}});
+  this->harness_.publish("Two", "MCA", {{"b", 2}});
+  const auto subscribed = this->subscribe(std::nullopt, "MCA");
+  const Samples before = this->sample(subscribed);
+  this->harness_.withdraw("One", "MCA");
+  this->harness_.withdraw("Two", "MCA");
+  const Samples after = this->sample(subscribed);
+  ASSERT_NE(after, nullptr);
+  EXPECT_THAT(this->contents(after), IsEmpty());
+  EXPECT_THAT(this->contents(this->delta(before, after)), IsEmpty());
+}
+
 TYPED_TEST(QVTallyContract, KnowsChannelsOfOneNameByTheirPlace) {
   this->harness_.publish("Haptics", "Stats", {{"a", 1}, {"", 2}, {"a", 3}});
   const auto subscribed = this->subscribe("Haptics", "Stats");
