@@ -13,7 +13,11 @@
 // told. Where there is no source, or while it is out of order, the value is undefined.
 //
 // Registrations are named by an ID that the caller chooses. Several of one ID are all kept and all
-// called; each unregistration ends the oldest of its ID.
+// called; each unregistration ends the oldest of its ID. There may be a limit: a registration above
+// it is dropped, with its callback, and one error line says so until a registration has ended.
+//
+// An exception that escapes a callback is logged once at error level on the default log; the other
+// callbacks are called all the same.
 //
 // Threads: any, at once, also from a callback. None of the operations waits for the source. A
 // callback that is running while it is unregistered ends on its own; it is destroyed after that.

@@ -3,6 +3,7 @@
 #include "platform/QVText.h"
 
 #include <algorithm>
+#include <exception>
 #include <utility>
 
 bool QVFakeOrientation::Side::holds(const std::shared_ptr<Registration>& registration) const {
@@ -94,7 +95,15 @@ void QVFakeOrientation::setOrientation(Side& side, int32_t orientation) {
       const std::lock_guard lock(mutex_);
       if (!side.holds(registration)) continue;
     }
-    registration->callback(orientation);
+    try {
+      registration->callback(orientation);
+    } catch (const std::exception& exception) {
+      log_.error(nullptr, __func__, "exception in orientation callback ", registration->callbackID,
+                 ": ", exception.what());
+    } catch (...) {
+      log_.error(nullptr, __func__, "exception in orientation callback ", registration->callbackID,
+                 ": of unknown type");
+    }
   }
 }
 

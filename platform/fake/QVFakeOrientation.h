@@ -1,5 +1,6 @@
 #pragma once
 
+#include "platform/QVLog.h"
 #include "platform/QVOrientation.h"
 #include "platform/fake/QVFakeMisuse.h"
 
@@ -14,11 +15,13 @@
 //
 // Callbacks run on the thread that sets a value, with no lock held, in the order of registration;
 // one that was unregistered before its turn came is not called. Checks that a registration has an
-// ID and a callback.
+// ID and a callback. It has no limit.
 //
-// Threads: any.
+// Threads: any. The log outlives it.
 class QVFakeOrientation final : public QVOrientation {
  public:
+  explicit QVFakeOrientation(QVLog& log) : log_(log) {}
+
   void QVRegisterDeviceOrientation(std::string_view callbackID, Callback callback) override;
   void QVRegisterUIOrientation(std::string_view callbackID, Callback callback) override;
   void QVUnregisterDeviceOrientation(std::string_view callbackID) override;
@@ -57,6 +60,7 @@ class QVFakeOrientation final : public QVOrientation {
   void setOrientation(Side& side, int32_t orientation);
   std::vector<std::string> callbackIDs(const Side& side) const;
 
+  QVLog& log_;
   QVFakeMisuse misuse_{"QVFakeOrientation"};
   mutable std::mutex mutex_;
   // Guarded by mutex_.

@@ -29,7 +29,7 @@ QVFakePlatform::QVFakePlatform()
       countwise_(fill<QVFakeCountwise>(platform_.countwise)),
       joulewell_(fill<QVFakeJoulewell>(platform_.joulewell)),
       tally_(fill<QVFakeTally>(platform_.tally)),
-      orientation_(fill<QVFakeOrientation>(platform_.orientation)),
+      orientation_(fill<QVFakeOrientation>(platform_.orientation, *log_)),
       notifications_(fill<QVFakeNotifications>(platform_.notifications)),
       runLoopThreads_(
           fill<QVFakeRunLoopThreads>(platform_.runLoopThreads, *queues_, *clock_, *log_)),

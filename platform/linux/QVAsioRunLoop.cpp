@@ -2,8 +2,8 @@
 
 #include "platform/linux/QVAsioRunLoopTimer.h"
 #include "platform/linux/QVAsioRunLoopWaits.h"
+#include "platform/linux/QVLogException.h"
 
-#include <exception>
 #include <utility>
 
 QVAsioRunLoop::QVAsioRunLoop(std::string threadName, QVLog& log)
@@ -29,10 +29,8 @@ void QVAsioRunLoop::run() {
     try {
       waits_->run();
       return;
-    } catch (const std::exception& exception) {
-      log_.error(nullptr, __func__, "exception in run loop ", threadName_, ": ", exception.what());
     } catch (...) {
-      log_.error(nullptr, __func__, "exception in run loop ", threadName_, ": of unknown type");
+      QVLogException(log_, __func__, "run loop", threadName_);
     }
   }
 }

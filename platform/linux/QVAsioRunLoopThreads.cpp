@@ -2,12 +2,12 @@
 
 #include "platform/linux/QVAsioRunLoop.h"
 #include "platform/linux/QVAsioRunLoopTimer.h"
+#include "platform/linux/QVLogException.h"
 #include "platform/linux/QVThreads.h"
 #include "platform/linux/QVWakeUpBatch.h"
 #include "platform/linux/QVWorkerBlocking.h"
 
 #include <atomic>
-#include <exception>
 #include <string>
 #include <system_error>
 #include <utility>
@@ -26,10 +26,8 @@ class QVAsioRunLoopThreads::Handle final : public QVRunLoopThread {
       QVAsioRunLoop loop(name_, log);
       try {
         body(loop);
-      } catch (const std::exception& exception) {
-        log.error(nullptr, __func__, "exception in thread ", name_, ": ", exception.what());
       } catch (...) {
-        log.error(nullptr, __func__, "exception in thread ", name_, ": of unknown type");
+        QVLogException(log, __func__, "thread", name_);
       }
     }
     body = nullptr;

@@ -1,5 +1,6 @@
 #include "platform/linux/QVDirectoryWatcher.h"
 
+#include "platform/linux/QVLogException.h"
 #include "platform/linux/QVThreads.h"
 
 #include <algorithm>
@@ -20,6 +21,11 @@ namespace {
 
 // Nothing that is told here is urgent.
 constexpr int kNiceness = 5;
+
+constexpr const char* kThreadName = "qv-watch";
+
+// How long to wait for memory where there was none.
+constexpr int kRetryMilliseconds = 1000;
 
 // Events read at a time: some hundred with short names, one at least with the longest.
 constexpr std::size_t kEventBytes = 4096;
@@ -140,26 +146,43 @@ int QVDirectoryWatcher::follow(const std::string& directory, std::string& reason
 }
 
 void QVDirectoryWatcher::run() {
-  QVPrepareThread("qv-watch", kNiceness);
+  QVPrepareThread(kThreadName, kNiceness);
+  bool isBehind = false;
   for (;;) {
     std::array<pollfd, 2> waits{{{end_.descriptor(), POLLIN, 0}, {inotify_, POLLIN, 0}}};
-    poll(waits.data(), waits.size(), -1);
+    poll(waits.data(), waits.size(), isBehind ? kRetryMilliseconds : -1);
     if (waits[0].revents != 0) return;
-    const News news = readNews();
-    for (const auto& [level, text] : news.lines) {
-      log_.write(nullptr, level, "-[QVDirectoryWatcher followAnew:]", text);
-    }
-    for (const auto& watch : news.changed) {
-      if (!watch->isOver) watch->callback();
+    try {
+      tell(readNews(isBehind));
+      isBehind = false;
+    } catch (...) {
+      // For want of memory: what was read is lost, so all are told of once there is some.
+      QVLogException(log_, "-[QVDirectoryWatcher run]", "thread", kThreadName);
+      isBehind = true;
     }
   }
 }
 
-QVDirectoryWatcher::News QVDirectoryWatcher::readNews() {
+void QVDirectoryWatcher::tell(const News& news) {
+  for (const auto& [level, text] : news.lines) {
+    log_.write(nullptr, level, "-[QVDirectoryWatcher followAnew:]", text);
+  }
+  for (const auto& watch : news.changed) {
+    if (watch->isOver) continue;
+    try {
+      watch->callback();
+    } catch (...) {
+      QVLogException(log_, "-[QVDirectoryWatcher tell:]", "the callback for", watch->name);
+    }
+  }
+}
+
+QVDirectoryWatcher::News QVDirectoryWatcher::readNews(bool isBehind) {
   std::array<char, kEventBytes> buffer;
   const ssize_t length = read(inotify_, buffer.data(), buffer.size());
   News news;
   const QVMutexLock lock(mutex_);
+  if (isBehind) addAll(news);
   for (ssize_t offset = 0; offset < length;) {
     inotify_event event;
     const char* const begin = buffer.data() + offset;
@@ -173,7 +196,7 @@ QVDirectoryWatcher::News QVDirectoryWatcher::readNews() {
 
 void QVDirectoryWatcher::take(int descriptor, uint32_t events, std::string_view name, News& news) {
   if ((events & IN_Q_OVERFLOW) != 0) {
-    for (const auto& [path, directory] : directories_) news.add(directory);
+    addAll(news);
     return;
   }
   const auto found = std::ranges::find(directories_, descriptor,
@@ -188,6 +211,10 @@ void QVDirectoryWatcher::take(int descriptor, uint32_t events, std::string_view 
   for (const auto& watch : found->second.watches) {
     if (watch->name == name && (watch->events & events) != 0) news.add(watch);
   }
+}
+
+void QVDirectoryWatcher::addAll(News& news) const {
+  for (const auto& [path, directory] : directories_) news.add(directory);
 }
 
 void QVDirectoryWatcher::followAnew(const std::string& path, Directory& directory, News& news) {

@@ -25,6 +25,8 @@
 // Used by QVInotifyNotifications and QVFileOrientation. Threads: any, at once; callbacks run on the
 // watcher's own thread, one at a time, without a lock. It is not destroyed by a callback.
 // Ownership: a callback is destroyed without a lock, after it has run if it runs.
+// Failures: an exception of a callback is one error line, and the others are called; where there
+// was no memory to say what changed, all watches are told once there is.
 class QVDirectoryWatcher {
  public:
   // The service's user and group, with whose permission others post. A directory that is there
@@ -66,8 +68,10 @@ class QVDirectoryWatcher {
   bool start(std::string& reason) QV_REQUIRES(mutex_);
   int follow(const std::string& directory, std::string& reason) const QV_REQUIRES(mutex_);
   void run();
-  News readNews();
+  void tell(const News& news);
+  News readNews(bool isBehind);
   void take(int descriptor, uint32_t events, std::string_view name, News& news) QV_REQUIRES(mutex_);
+  void addAll(News& news) const QV_REQUIRES(mutex_);
   void followAnew(const std::string& path, Directory& directory, News& news) QV_REQUIRES(mutex_);
 
   QVLog& log_;

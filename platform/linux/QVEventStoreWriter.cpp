@@ -1,13 +1,14 @@
 #include "platform/linux/QVEventStoreWriter.h"
 
 #include "platform/linux/QVEventStoreError.h"
+#include "platform/linux/QVLogException.h"
 
 #include <algorithm>
 #include <array>
 #include <cerrno>
 #include <cstdio>
 #include <ctime>
-#include <exception>
+#include <new>
 #include <system_error>
 #include <type_traits>
 #include <utility>
@@ -251,14 +252,21 @@ int QVEventStoreWriter::writeTransaction(std::size_t& batches) {
   tooLarge_ = 0;
   bool urgent = false;
   int result = tables_.begin();
-  while (result == SQLITE_OK && rows < QVEventStoreQueue::kBatchRows) {
-    // Rows that came meanwhile go along: larger transactions write fewer half-filled pages.
-    if (batches == pending_.size() && (urgent || !queue_.takeWaiting(pending_))) break;
-    QVEventRows& batch = pending_[batches];
-    urgent = urgent || batch.urgent;
-    result = insertBatch(batch);
-    rows += batch.size();
-    if (result == SQLITE_OK) ++batches;
+  bool isOutOfMemory = false;
+  try {
+    while (result == SQLITE_OK && rows < QVEventStoreQueue::kBatchRows) {
+      // Rows that came meanwhile go along: larger transactions write fewer half-filled pages.
+      if (batches == pending_.size() && (urgent || !queue_.takeWaiting(pending_))) break;
+      QVEventRows& batch = pending_[batches];
+      urgent = urgent || batch.urgent;
+      result = insertBatch(batch);
+      rows += batch.size();
+      if (result == SQLITE_OK) ++batches;
+    }
+  } catch (const std::bad_alloc&) {
+    // As where SQLite says so: the transaction is taken back and tried again.
+    result = SQLITE_NOMEM;
+    isOutOfMemory = true;
   }
   if (result == SQLITE_OK) {
     if (tooLarge_ > 0) losses_[kLossTooLarge] += tooLarge_;
@@ -270,7 +278,7 @@ int QVEventStoreWriter::writeTransaction(std::size_t& batches) {
     }
   }
   if (result != SQLITE_OK) {
-    failure_ = tables_.message();
+    failure_ = isOutOfMemory ? "out of memory" : tables_.message();
     tables_.rollback();
   }
   return result;
@@ -427,10 +435,8 @@ template <class Callable>
 void QVEventStoreWriter::guarded(Callable&& callable) {
   try {
     callable();
-  } catch (const std::exception& exception) {
-    log_.error(nullptr, "-[QVEventStoreWriter run]", "a callback failed: ", exception.what());
   } catch (...) {
-    log_.error(nullptr, "-[QVEventStoreWriter run]", "a callback failed");
+    QVLogException(log_, "-[QVEventStoreWriter run]", "a callback");
   }
 }
 

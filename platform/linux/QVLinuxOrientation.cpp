@@ -1,5 +1,6 @@
 #include "platform/linux/QVLinuxOrientation.h"
 
+#include "platform/linux/QVLogException.h"
 #include "platform/linux/QVThreads.h"
 
 #include <algorithm>
@@ -16,6 +17,8 @@ namespace {
 // Nothing that is told here is urgent.
 constexpr int kNiceness = 5;
 
+constexpr const char* kThreadName = "qv-orientation";
+
 }  // namespace
 
 QVLinuxOrientation::QVLinuxOrientation(QVLog& log, std::shared_ptr<QVDirectoryWatcher> watcher,
@@ -23,6 +26,8 @@ QVLinuxOrientation::QVLinuxOrientation(QVLog& log, std::shared_ptr<QVDirectoryWa
                                        QVSensorProxyOptions sensorOptions)
     : log_(log),
       bell_(std::make_shared<const QVBell>()),
+      device_(log),
+      ui_(log),
       sensor_(log, std::move(sensorOptions), device_),
       file_(log, std::move(watcher), std::move(uiFile), bell_, ui_) {}
 
@@ -72,12 +77,17 @@ void QVLinuxOrientation::demandChanged() {
 }
 
 void QVLinuxOrientation::run() {
-  QVPrepareThread("qv-orientation", kNiceness);
+  QVPrepareThread(kThreadName, kNiceness);
   while (!isEnding_) {
     // Before the work: what is rung for from here on is worked on in the next round.
     bell_->hush();
-    sensor_.work();
-    file_.work();
+    try {
+      sensor_.work();
+      file_.work();
+    } catch (...) {
+      // For want of memory: what changes next is worked on again.
+      QVLogException(log_, "-[QVLinuxOrientation run]", "thread", kThreadName);
+    }
     rest();
   }
 }

@@ -27,7 +27,7 @@
 // Ownership: log and watcher outlive it. Callbacks that are still registered are destroyed with
 // it, after its thread has ended. It is not destroyed by a callback.
 // Failures: those of the sources are "undefined"; where no thread can be had, one error line, and
-// the next registration tries again.
+// the next registration tries again. An exception of a callback is one error line.
 class QVLinuxOrientation final : public QVOrientation {
  public:
   QVLinuxOrientation(QVLog& log, std::shared_ptr<QVDirectoryWatcher> watcher,

@@ -11,6 +11,9 @@ namespace {
 // For the sink to notice that it should give up.
 constexpr std::chrono::seconds kGivingUp{1};
 
+// How long to wait for memory where there was none; a line that comes ends it.
+constexpr std::chrono::seconds kRetry{1};
+
 // Lines for which the buffers keep room while nothing is logged.
 constexpr std::size_t kKeptLines = 64;
 
@@ -67,12 +70,25 @@ void QVLogWriter::run() {
     std::size_t bytes = 0;
     for (const QVLogLine& line : batch) bytes += line.text.size();
     const std::size_t lines = batch.size();
-    writeBatch(batch, lostCount);
+    bool isLost = false;
+    try {
+      writeBatch(batch, lostCount);
+    } catch (...) {
+      // For want of memory. The lines are counted as lost, whoever waits for them goes on.
+      batch.clear();
+      isLost = true;
+    }
     lock.lock();
+    if (isLost) lostCount_ += lostCount + lines;
     lineCount_ -= lines;
     byteCount_ -= bytes;
     writtenTotal_ += lines;
     progress_.notify_all();
+    if (isLost && !isStopped_) {
+      isResting_ = true;
+      lock.waitUntil(wake_, std::chrono::steady_clock::now() + kRetry);
+      isResting_ = false;
+    }
   }
   isRunning_ = false;
   progress_.notify_all();

@@ -1,5 +1,7 @@
 #include "platform/linux/QVOrientationRegistrations.h"
 
+#include "platform/linux/QVLogException.h"
+
 #include <algorithm>
 #include <atomic>
 #include <utility>
@@ -15,13 +17,23 @@ struct QVOrientationRegistrations::Registration {
 
 void QVOrientationRegistrations::add(std::string_view callbackID,
                                      QVOrientation::Callback callback) {
+  // Goes after the lock where there is no room for it, with its callback.
   auto registration = std::make_shared<Registration>(callbackID, std::move(callback));
-  const QVMutexLock lock(mutex_);
-  if (registrations_.empty()) {
-    ++lastPeriod_;
-    known_.reset();
+  bool isFirstDropped = false;
+  {
+    const QVMutexLock lock(mutex_);
+    if (registrations_.size() < kMaximumRegistrations) {
+      registrations_.push_back(std::move(registration));
+      if (registrations_.size() > 1) return;
+      ++lastPeriod_;
+      known_.reset();
+      return;
+    }
+    isFirstDropped = !std::exchange(hasDropped_, true);
   }
-  registrations_.push_back(std::move(registration));
+  if (!isFirstDropped) return;
+  log_.error(nullptr, "-[QVOrientationRegistrations add:callback:]", "orientation callback ",
+             callbackID, " is not registered: there are ", kMaximumRegistrations);
 }
 
 void QVOrientationRegistrations::remove(std::string_view callbackID) {
@@ -33,6 +45,7 @@ void QVOrientationRegistrations::remove(std::string_view callbackID) {
   over = std::move(*oldest);
   over->isOver = true;
   registrations_.erase(oldest);
+  hasDropped_ = false;
 }
 
 QVOrientationRegistrations::Period QVOrientationRegistrations::period() const {
@@ -45,11 +58,18 @@ void QVOrientationRegistrations::report(Period period, int32_t orientation) {
   {
     const QVMutexLock lock(mutex_);
     if (period != lastPeriod_ || registrations_.empty()) return;
-    const bool isFirst = !known_;
-    if (std::exchange(known_, orientation) == orientation || isFirst) return;
-    told = registrations_;
+    if (known_ == orientation) return;
+    // First, so that a change for which there is no memory now is one again the next time.
+    if (known_) told = registrations_;
+    known_ = orientation;
   }
   for (const auto& registration : told) {
-    if (!registration->isOver) registration->callback(orientation);
+    if (registration->isOver) continue;
+    try {
+      registration->callback(orientation);
+    } catch (...) {
+      QVLogException(log_, "-[QVOrientationRegistrations report:orientation:]",
+                     "orientation callback", registration->callbackID);
+    }
   }
 }

@@ -1,8 +1,10 @@
 #pragma once
 
+#include "platform/QVLog.h"
 #include "platform/QVOrientation.h"
 #include "platform/linux/QVThreadAnnotations.h"
 
+#include <cstddef>
 #include <cstdint>
 #include <memory>
 #include <optional>
@@ -17,11 +19,19 @@
 // own. The first value reported in a period is what is known from then on: nobody is told of it.
 //
 // Used by QVLinuxOrientation. Threads: any; report() on the orientation's thread alone. Callbacks
-// are called and destroyed without a lock.
+// are called and destroyed without a lock. The log outlives it.
+// Failures: an exception of a callback is one error line; the others are called all the same. What
+// comes above kMaximumRegistrations is dropped, with one error line until one has been free again.
 class QVOrientationRegistrations {
  public:
   using Period = uint64_t;
   static constexpr Period kNoDemand = 0;
+  // Each holds a session, some hundred bytes and more, for as long as its owner does not end it,
+  // and every change is told to all. So many sessions at once are far more than a machine's
+  // applications have.
+  static constexpr std::size_t kMaximumRegistrations = 16'384;
+
+  explicit QVOrientationRegistrations(QVLog& log) : log_(log) {}
 
   void add(std::string_view callbackID, QVOrientation::Callback callback);
   // The oldest of the ID.
@@ -35,8 +45,10 @@ class QVOrientationRegistrations {
  private:
   struct Registration;
 
+  QVLog& log_;
   mutable QVMutex mutex_;
   std::vector<std::shared_ptr<Registration>> registrations_ QV_GUARDED_BY(mutex_);
+  bool hasDropped_ QV_GUARDED_BY(mutex_) = false;  // since one was free
   Period lastPeriod_ QV_GUARDED_BY(mutex_) = kNoDemand;
   std::optional<int32_t> known_ QV_GUARDED_BY(mutex_);
 };

@@ -3,8 +3,10 @@
 #include "platform/QVText.h"
 
 #include <algorithm>
+#include <cerrno>
 #include <cstdint>
 #include <cstdlib>
+#include <new>
 #include <string_view>
 #include <system_error>
 #include <utility>
@@ -59,7 +61,13 @@ struct QVSensorProxyOrientation::Dispatch {
 
   template <Handler Handle>
   static int to(sd_bus_message* message, void* self, sd_bus_error*) {
-    (static_cast<QVSensorProxyOrientation*>(self)->*Handle)(message);
+    auto& orientation = *static_cast<QVSensorProxyOrientation*>(self);
+    try {
+      (orientation.*Handle)(message);
+    } catch (const std::bad_alloc&) {
+      // Not through the library, which is C: the connection is given up once it has returned.
+      orientation.isOutOfMemory_ = true;
+    }
     return 0;
   }
 
@@ -177,6 +185,7 @@ void QVSensorProxyOrientation::process() {
   int result = 1;
   for (int taken = 0; taken < kMostMessages && result > 0; ++taken) {
     result = sd_bus_process(bus_, nullptr);
+    if (std::exchange(isOutOfMemory_, false)) result = -ENOMEM;
     tell();
   }
   if (result < 0) {

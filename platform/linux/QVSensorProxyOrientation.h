@@ -94,6 +94,7 @@ class QVSensorProxyOrientation {
   std::string owner_;             // the daemon's own name on the bus, once it granted the claim
   std::optional<int32_t> value_;  // where something is known
   std::string trouble_;           // what was noted last
+  bool isOutOfMemory_ = false;    // since the handling of a message
   std::chrono::milliseconds retry_;
   std::chrono::steady_clock::time_point retryAt_;
 };

@@ -10,6 +10,7 @@
 
 #include <fstream>
 #include <memory>
+#include <stdexcept>
 #include <string>
 
 #include <gmock/gmock.h>
@@ -48,11 +49,13 @@ class FakeDeviceHarness {
   using Side = DeviceSide;
   FakeDeviceHarness() { orientation_.setDeviceOrientation(QVOrientation::kNormal); }
   QVOrientation& orientation() { return orientation_; }
+  QVFakeLog& log() { return log_; }
   void settle() {}
   void turn(int32_t value) { orientation_.setDeviceOrientation(value); }
 
  private:
-  QVFakeOrientation orientation_;
+  QVFakeLog log_;
+  QVFakeOrientation orientation_{log_};
 };
 
 class FakeUIHarness {
@@ -60,17 +63,20 @@ class FakeUIHarness {
   using Side = UISide;
   FakeUIHarness() { orientation_.setUIOrientation(QVOrientation::kNormal); }
   QVOrientation& orientation() { return orientation_; }
+  QVFakeLog& log() { return log_; }
   void settle() {}
   void turn(int32_t value) { orientation_.setUIOrientation(value); }
 
  private:
-  QVFakeOrientation orientation_;
+  QVFakeLog log_;
+  QVFakeOrientation orientation_{log_};
 };
 
 class SensorHarness {
  public:
   using Side = DeviceSide;
   QVOrientation& orientation() { return orientation_; }
+  QVFakeLog& log() { return log_; }
   void settle() { EXPECT_TRUE(monitor_.await(kReadingSeen, ++periods_)); }
   void turn(int32_t value) { sensor_.turn(std::string(QVOrientation::textOfOrientation(value))); }
 
@@ -92,6 +98,7 @@ class FileHarness {
   using Side = UISide;
   FileHarness() { turn(QVOrientation::kNormal); }
   QVOrientation& orientation() { return orientation_; }
+  QVFakeLog& log() { return log_; }
   void settle() { EXPECT_TRUE(readings_.await()); }
   void turn(int32_t value) const {
     std::ofstream(root_.runtime() / "ui-orientation") << QVOrientation::textOfOrientation(value);
@@ -186,6 +193,25 @@ TYPED_TEST(QVOrientationContract, LetsACallbackUnregisterAndRegister) {
   this->turn(QVOrientation::kNormal);
   EXPECT_THAT(this->other_->await(1), ElementsAre(QVOrientation::kNormal));
   EXPECT_THAT(this->heard_->values(), ElementsAre(1));
+}
+
+TYPED_TEST(QVOrientationContract, GoesOnWhereACallbackFails) {
+  using Where = typename TestFixture::Side;
+  Where::add(this->harness_->orientation(), "failing",
+             [](int32_t) { throw std::runtime_error("out of order"); });
+  this->add("other", this->other_);
+  this->settle();
+  this->turn(QVOrientation::kRightUp);
+  EXPECT_THAT(this->other_->await(1), ElementsAre(QVOrientation::kRightUp));
+  this->remove("failing");
+  this->turn(QVOrientation::kBottomUp);
+  EXPECT_THAT(this->other_->await(2),
+              ElementsAre(QVOrientation::kRightUp, QVOrientation::kBottomUp));
+  const auto lines = this->harness_->log().lines();
+  ASSERT_EQ(lines.size(), 1U);
+  EXPECT_EQ(lines[0].level, QVLogLevel::error);
+  EXPECT_EQ(lines[0].scope, QVFakeLog::kDefaultScope);
+  EXPECT_EQ(lines[0].text, "exception in orientation callback failing: out of order");
 }
 
 TYPED_TEST(QVOrientationContract, LetsGoOfWhatACallbackHolds) {

@@ -1,4 +1,5 @@
 #include "platform/QVText.h"
+#include "platform/fake/QVFakeLog.h"
 #include "platform/fake/QVFakeOrientation.h"
 
 #include <cstdint>
@@ -21,7 +22,8 @@ class QVFakeOrientationTest : public testing::Test {
     return [this, note](int32_t value) { told_.push_back(QVText(note, ' ', value)); };
   }
 
-  QVFakeOrientation orientation_;
+  QVFakeLog log_;
+  QVFakeOrientation orientation_{log_};
   std::vector<std::string> told_;
 };
 

@@ -264,7 +264,7 @@ TEST_F(QVSQLiteEventStoreTest, OutlivesAPayloadCallbackThatThrows) {
                             []() -> QVDictionary { throw std::runtime_error("no payload"); });
   flushAll();
   EXPECT_THAT(rows("SELECT name, payload FROM countwise_event"), ElementsAre("event|{}"));
-  EXPECT_THAT(lines(QVLogLevel::error), ElementsAre("a callback failed: no payload"));
+  EXPECT_THAT(lines(QVLogLevel::error), ElementsAre("exception in a callback: no payload"));
 }
 
 TEST_F(QVSQLiteEventStoreTest, LetsGoOfPayloadsOnceTheyAreCommitted) {

@@ -10,6 +10,7 @@
 #include <cstdio>
 #include <memory>
 #include <mutex>
+#include <new>
 #include <sstream>
 #include <string>
 #include <string_view>
@@ -33,6 +34,7 @@ class HoldingSink final : public QVLogSink {
   void write(std::span<const QVLogLine> lines, const std::atomic<bool>& giveUp) override {
     entered.happen();
     while (isHolding && !giveUp) release.wait();
+    if (failing.exchange(false)) throw std::bad_alloc();
     const std::lock_guard lock(mutex);
     for (const QVLogLine& line : lines) {
       texts.push_back(line.text);
@@ -41,6 +43,7 @@ class HoldingSink final : public QVLogSink {
   }
 
   std::atomic<bool> isHolding{false};
+  std::atomic<bool> failing{false};  // the next write
   QVEvent entered;
   QVEvent release;
   std::mutex mutex;
@@ -71,6 +74,17 @@ class QVSystemLogTest : public testing::Test {
   HoldingSink* sink_;
   std::unique_ptr<QVSystemLog> log_;
 };
+
+TEST_F(QVSystemLogTest, GoesOnWhereThereIsNoMemoryForAWrite) {
+  sink_->failing = true;
+  log_->info(nullptr, "f", "lost");
+  log_->flush();
+  log_->info(nullptr, "f", "next");
+  log_->flush();
+  const std::lock_guard lock(sink_->mutex);
+  EXPECT_THAT(sink_->texts, testing::UnorderedElementsAre(
+                                "1 log lines were lost, the log's queue was full", "next"));
+}
 
 TEST_F(QVSystemLogTest, CountsTheLinesThatFindNoRoom) {
   hold();

@@ -7,6 +7,7 @@
 #include <filesystem>
 #include <fstream>
 #include <memory>
+#include <stdexcept>
 #include <thread>
 
 #include <fcntl.h>
@@ -240,6 +241,24 @@ TEST_F(QVDirectoryWatcherTest, TellsAllWatchesOfAFileAndOfTwoDirectories) {
   EXPECT_EQ(marker_.count(), 0U);
   std::ofstream(root_.state() / "file").flush();
   EXPECT_TRUE(marker_.await(1));
+}
+
+TEST_F(QVDirectoryWatcherTest, TellsTheOthersWhereACallbackFails) {
+  std::string reason;
+  const Token failing = watcher_.watch(
+      {directory_, "file", Kind::posts}, [] { throw std::runtime_error("out of order"); }, reason);
+  watch("file", Kind::posts, occurrences_);
+  touch("file");
+  EXPECT_TRUE(occurrences_.await(1));
+  settle();
+  const auto lines = log_.renderings();
+  EXPECT_THAT(lines, testing::Each("3[default] -[QVDirectoryWatcher tell:]: exception in the "
+                                   "callback for file: out of order"));
+  EXPECT_THAT(lines, testing::Not(IsEmpty()));
+  watcher_.unwatch(failing);
+  const std::size_t before = occurrences_.count();
+  touch("file");
+  EXPECT_TRUE(occurrences_.await(before + 1));
 }
 
 // ---- The life of a watch

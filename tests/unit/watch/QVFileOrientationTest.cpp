@@ -62,7 +62,7 @@ class QVFileOrientationTest : public testing::Test {
   QVFakeLog log_;
   const std::shared_ptr<const QVBell> bell_ = std::make_shared<const QVBell>();
   const std::shared_ptr<QVDirectoryWatcher> watcher_ = std::make_shared<QVDirectoryWatcher>(log_);
-  QVOrientationRegistrations registrations_;
+  QVOrientationRegistrations registrations_{log_};
   std::unique_ptr<QVFileOrientation> orientation_ =
       std::make_unique<QVFileOrientation>(log_, watcher_, file_, bell_, registrations_);
   std::vector<int32_t> told_;

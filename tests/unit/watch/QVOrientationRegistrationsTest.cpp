@@ -1,6 +1,9 @@
+#include "platform/fake/QVFakeLog.h"
 #include "platform/linux/QVOrientationRegistrations.h"
 
+#include <cstddef>
 #include <memory>
+#include <stdexcept>
 #include <string>
 #include <utility>
 #include <vector>
@@ -24,7 +27,8 @@ class QVOrientationRegistrationsTest : public testing::Test {
   void report(int32_t orientation) { registrations_.report(registrations_.period(), orientation); }
   std::vector<std::string> takeTold() { return std::exchange(told_, {}); }
 
-  QVOrientationRegistrations registrations_;
+  QVFakeLog log_;
+  QVOrientationRegistrations registrations_{log_};
   std::vector<std::string> told_;
 };
 
@@ -124,6 +128,48 @@ TEST_F(QVOrientationRegistrationsTest, DestroysCallbacksWithoutItsLock) {
   EXPECT_THAT(takeTold(), IsEmpty());
   registrations_.remove("a");
   EXPECT_THAT(takeTold(), ElementsAre("gone"));
+}
+
+TEST_F(QVOrientationRegistrationsTest, CallsTheOthersWhereACallbackFails) {
+  add("a", "a");
+  registrations_.add("b", [](int32_t) { throw std::runtime_error("out of order"); });
+  registrations_.add("c", [](int32_t) { throw 1; });
+  add("d", "d");
+  report(1);
+  report(2);
+  EXPECT_THAT(takeTold(), ElementsAre("a 2", "d 2"));
+  constexpr const char* kLine =
+      "3[default] -[QVOrientationRegistrations report:orientation:]: exception in orientation "
+      "callback ";
+  EXPECT_THAT(log_.renderings(), ElementsAre(std::string(kLine) + "b: out of order",
+                                             std::string(kLine) + "c: of unknown type"));
+}
+
+TEST_F(QVOrientationRegistrationsTest, DropsWhatComesAboveItsLimitUntilOneHasEnded) {
+  for (std::size_t i = 0; i < QVOrientationRegistrations::kMaximumRegistrations; ++i) {
+    registrations_.add("many", [](int32_t) {});
+  }
+  EXPECT_THAT(log_.renderings(), IsEmpty());
+  const auto held = std::make_shared<int>(0);
+  registrations_.add("a", [held](int32_t) {});
+  EXPECT_EQ(held.use_count(), 1) << "it goes with its callback";
+  add("b", "b");
+  constexpr const char* kLine =
+      "3[default] -[QVOrientationRegistrations add:callback:]: orientation callback ";
+  EXPECT_THAT(log_.renderings(),
+              ElementsAre(std::string(kLine) + "a is not registered: there are 16384"));
+  registrations_.remove("b");
+  add("c", "c");
+  EXPECT_EQ(log_.renderings().size(), 1U) << "b was none, so none is free";
+
+  registrations_.remove("many");
+  add("d", "d");
+  add("e", "e");
+  EXPECT_THAT(log_.renderings(),
+              ElementsAre(testing::_, std::string(kLine) + "e is not registered: there are 16384"));
+  report(1);
+  report(2);
+  EXPECT_THAT(takeTold(), ElementsAre("d 2"));
 }
 
 TEST_F(QVOrientationRegistrationsTest, KeepsARunningCallbackUntilItHasEnded) {

@@ -308,7 +308,7 @@ TEST_F(QVSensorProxyOrientationTest, IsUndefinedWhereTheDaemonHasNoSuchProperty)
 
 // The test's thread is the orientation's.
 TEST_F(QVSensorProxyOrientationTest, IsUndefinedUntilThereIsABus) {
-  QVOrientationRegistrations registrations;
+  QVOrientationRegistrations registrations(log_);
   QVSensorProxyOrientation sensor(
       log_, {.busAddress = address(), .firstRetry = std::chrono::milliseconds(1)}, registrations);
   sensor.work();
