@@ -1,8 +1,8 @@
 // What drivers count while a session runs: published by processes of their own and by the kernel's
 // texts, read at start and stop, stored as a message of the session.
 
-#include "tests/support/QVEndToEndTest.h"
 #include "tests/support/QVDriverProcess.h"
+#include "tests/support/QVEndToEndTest.h"
 
 #include <csignal>
 #include <filesystem>
