@@ -21,7 +21,7 @@ if(QV_SANITIZE)
     # length (a build folder's name is one), and the standard library's regular expressions for
     # uninitialised; the same sources are checked without instrumentation.
     target_compile_options(qv_options INTERFACE
-      -Wno-array-bounds -Wno-restrict -Wno-maybe-uninitialized)
+      -Wno-array-bounds -Wno-restrict -Wno-stringop-overflow -Wno-maybe-uninitialized)
   endif()
 endif()
 

@@ -45,11 +45,9 @@ static const char kHelp[] =
     "\n"
     "Exit status: 0, 1 where the group cannot be published, 2 for a wrong command line.\n";
 
-static volatile sig_atomic_t interrupted = 0;
-
+// Signals are told by the wait that they end.
 static void interrupt(int number) {
   (void)number;
-  interrupted = 1;
 }
 
 static int refuse(const char* what, const char* argument) {
@@ -124,24 +122,24 @@ static void count(QuietVoxChannels* channels, const Options* options) {
   }
 }
 
-// Waits for the time to pass, or without a limit for input. Signals come nowhere else, so that none
-// comes too early to end the wait.
-static void await(const struct timespec* limit) {
+// Waits for the time to pass, or without a limit for input; false where the program is told to end.
+// Signals come nowhere else, so that none comes too early to end the wait.
+static int await(const struct timespec* limit) {
   fd_set input;
   sigset_t none;
   sigemptyset(&none);
   FD_ZERO(&input);
   if (limit == NULL) FD_SET(STDIN_FILENO, &input);
-  pselect(STDIN_FILENO + 1, &input, NULL, NULL, limit, &none);
+  return pselect(STDIN_FILENO + 1, &input, NULL, NULL, limit, &none) >= 0 || errno != EINTR;
 }
 
 static void countByTime(QuietVoxChannels* channels, const Options* options) {
   struct timespec pause;
   pause.tv_sec = options->interval / 1000;
   pause.tv_nsec = options->interval % 1000 * 1000000;
-  for (long round = 0; round < options->rounds && !interrupted; ++round) {
+  for (long round = 0; round < options->rounds; ++round) {
     count(channels, options);
-    await(&pause);
+    if (!await(&pause)) return;
   }
 }
 
@@ -149,8 +147,7 @@ static void countByInput(QuietVoxChannels* channels, const Options* options) {
   long round = 0;
   while (round < options->rounds) {
     char byte;
-    await(NULL);
-    if (interrupted || read(STDIN_FILENO, &byte, 1) != 1) return;
+    if (!await(NULL) || read(STDIN_FILENO, &byte, 1) != 1) return;
     if (byte != '\n') continue;
     count(channels, options);
     printf("%ld\n", ++round);

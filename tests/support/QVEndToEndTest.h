@@ -1,9 +1,9 @@
 #pragma once
 
+#include "tests/support/QVDaemonProcess.h"
 #include "tests/support/QVPeerClient.h"
 #include "tests/support/QVServiceLog.h"
 #include "tests/support/QVStoreReader.h"
-#include "tests/support/QVDaemonProcess.h"
 #include "tests/support/QVTemporaryRoot.h"
 
 #include <optional>

@@ -34,17 +34,14 @@ QVLog& log() {
   return *QVPlatform::shared().log;
 }
 
-QVRunLoopThreads& threads() {
-  return *QVPlatform::shared().runLoopThreads;
-}
-
 }  // namespace
 
-QVReportingBlockThrottle::QVReportingBlockThrottle() : unscheduledTimerKeys_(emptyKeys()) {}
+QVReportingBlockThrottle::QVReportingBlockThrottle()
+    : threads_(*QVPlatform::shared().runLoopThreads), unscheduledTimerKeys_(emptyKeys()) {}
 
 std::shared_ptr<QVReportingBlockThrottle> QVReportingBlockThrottle::init() {
   std::shared_ptr<QVReportingBlockThrottle> throttle(new QVReportingBlockThrottle);
-  throttle->queueThread_ = threads().startThread(
+  throttle->queueThread_ = throttle->threads_.startThread(
       kThreadName, [throttle](QVRunLoop& workingRunLoop) { throttle->runThread(workingRunLoop); });
   if (throttle->queueThread_ == nullptr) return nullptr;
   return throttle;
@@ -59,7 +56,7 @@ void QVReportingBlockThrottle::runThread(QVRunLoop& workingRunLoop) {
       workingRunLoop.run();
     }
     log().verbose(nullptr, kInit, "sleeping in thread");
-    threads().pause(kPassPeriod);
+    threads_.pause(kPassPeriod);
   }
 }
 
@@ -98,7 +95,7 @@ void QVReportingBlockThrottle::addMessageBlock(Block block, int64_t reporterID,
     const auto wrapper = std::make_shared<Wrapper>(std::move(block));
     // The timer can fire nowhere but on the thread, which holds the throttle.
     wrapper->setTimer(
-        threads().makeTimer(Wrapper::durationFromSeconds(delay), [this, key] { fire(key); }));
+        threads_.makeTimer(Wrapper::durationFromSeconds(delay), [this, key] { fire(key); }));
     timersInFlight_.emplace(key, wrapper);
   }
   const std::lock_guard lock(unscheduledTimerKeysLock_);
@@ -140,7 +137,7 @@ void QVReportingBlockThrottle::waitForCompletion() {
   log().verbose(nullptr, kWaitForCompletion, "Waiting up to ", kLongestCompletion.count(),
                 " seconds for blockThrottle queue to be empty.");
   for (int poll = 0; poll < kCompletionPolls && pending > 0; ++poll) {
-    threads().pause(kCompletionPollPeriod);
+    threads_.pause(kCompletionPollPeriod);
     pending = timersInFlightCount();
   }
   if (pending == 0) return;

@@ -74,6 +74,8 @@ class QVReportingBlockThrottle {
   std::size_t timersInFlightCount() const;
   std::size_t unscheduledTimerKeysCount() const;
 
+  // Of the bundle, whose member is taken away while the thread may still look for it.
+  QVRunLoopThreads& threads_;
   std::atomic<bool> shouldKeepRunning_{true};
   std::shared_ptr<QVRunLoopThread> queueThread_;  // set by init
 
