@@ -144,10 +144,11 @@ int runService() {
   if (platform.listener == nullptr) return giveUp(log, error);
 
   const int status = QVReportingServiceMain();
-  // While the core can still be called: what comes from outside ends, and lets go of the sessions
-  // that are registered for it.
+  // While the core can still be called: what comes from outside and what runs by itself ends, and
+  // lets go of the sessions that are registered for it.
   platform.orientation = nullptr;
   platform.notifications = nullptr;
+  platform.runLoopThreads = nullptr;
   log.flush();
   QVPlatform::install(nullptr);
   return status;

@@ -9,8 +9,9 @@
 #include <string_view>
 
 // Writes one file so that readers see the old contents or the new ones, never a part: bytes go to
-// a temporary file in the same directory, which takes the name's place when all is on the disk.
-// Dropped before that, it leaves nothing behind. Extra memory: one buffer of fixed size.
+// a temporary file in the same directory, which takes the name's place when all is on the disk. It
+// is not waited until that is there, too: a loss of power may bring the old contents back. Dropped
+// before that, it leaves nothing behind. Extra memory: one buffer of fixed size.
 //
 // Threads: one at a time. Blocks on the disk.
 class QVAtomicFile {
@@ -18,21 +19,30 @@ class QVAtomicFile {
   virtual ~QVAtomicFile() = default;
   // Appends. After the first failure bytes are dropped, and the failure is kept for commit().
   virtual void write(std::string_view bytes) = 0;
-  // Syncs, moves into place and ends the writing; answers what went wrong, at any step so far.
+  // Syncs the contents, moves into place and ends the writing; answers what went wrong, at any step
+  // so far.
   [[nodiscard]] virtual std::optional<QVError> commit() = 0;
 };
 
-// The part of the file system that the core writes to.
+// The part of the file system that the core writes to: what lies below the diagnostic-log root.
+//
+// The root is the administrator's. Below it anybody may be let in: so a symbolic link in the place
+// of a directory there is a failure, and nothing is made or written behind it. Paths that lie
+// elsewhere, or have empty parts, "." or "..", fail.
 //
 // Threads: any, at once. Blocks on the disk. Failures are answered, with the path in their
 // description; nothing is logged.
 class QVFileSystem {
  public:
+  // Of a root that has to be made.
+  static constexpr uint32_t kRootPermissions = 0750;
+
   virtual ~QVFileSystem() = default;
   // The directory under which diagnostic logs lie. Need not exist.
   virtual std::string diagnosticLogRoot() const = 0;
-  // Makes the directory and those above it that are missing, each with exactly these permissions
-  // (the process's umask does not count); existing ones are left alone.
+  // Makes the directory and those between it and the root that are missing, each with exactly these
+  // permissions (the process's umask does not count); existing ones are left alone. A missing root
+  // is made, too, with kRootPermissions, as are those above it.
   [[nodiscard]] virtual std::optional<QVError> createDirectory(const std::string& path,
                                                                uint32_t permissions) = 0;
   // Begins a file; what cannot be opened fails in commit().

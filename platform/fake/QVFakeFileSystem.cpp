@@ -4,7 +4,7 @@
 
 namespace {
 
-constexpr uint32_t kRootPermissions = 0755;
+constexpr uint32_t kTreePermissions = 0755;
 
 QVError makeError(const std::string& path, std::errc reason) {
   const std::error_code code = std::make_error_code(reason);
@@ -72,7 +72,7 @@ class QVFakeFileSystem::File final : public QVAtomicFile {
 };
 
 QVFakeFileSystem::QVFakeFileSystem() : state_(std::make_shared<State>()) {
-  state_->nodes["/"].permissions = kRootPermissions;
+  state_->nodes["/"].permissions = kTreePermissions;
 }
 
 std::optional<QVError> QVFakeFileSystem::createDirectory(const std::string& path,
@@ -84,7 +84,9 @@ std::optional<QVError> QVFakeFileSystem::createDirectory(const std::string& path
     if (state_->obstacle(part) == std::errc::no_such_file_or_directory) {
       const auto failure = state_->failure(Step::createDirectory);
       if (failure) return makeError(part, *failure);
-      state_->nodes[part].permissions = permissions;
+      // Those above the root are as the root.
+      const bool isRoot = kDiagnosticLogRoot.starts_with(part);
+      state_->nodes[part].permissions = isRoot ? QVFileSystem::kRootPermissions : permissions;
     }
     if (const auto obstacle = state_->obstacle(part)) return makeError(part, *obstacle);
     if (end == std::string::npos) return std::nullopt;
@@ -113,11 +115,16 @@ void QVFakeFileSystem::addFile(const std::string& path, std::string contents) {
   }
 }
 
+void QVFakeFileSystem::addLink(const std::string& path) {
+  const std::lock_guard lock(state_->mutex);
+  state_->nodes[path] = {.isLink = true};
+}
+
 std::vector<std::string> QVFakeFileSystem::files() const {
   const std::lock_guard lock(state_->mutex);
   std::vector<std::string> paths;
   for (const auto& [path, node] : state_->nodes) {
-    if (!node.permissions) paths.push_back(path);
+    if (node.isFile()) paths.push_back(path);
   }
   return paths;
 }
@@ -125,7 +132,7 @@ std::vector<std::string> QVFakeFileSystem::files() const {
 std::optional<std::string> QVFakeFileSystem::contents(const std::string& path) const {
   const std::lock_guard lock(state_->mutex);
   const auto found = state_->nodes.find(path);
-  if (found == state_->nodes.end() || found->second.permissions) return std::nullopt;
+  if (found == state_->nodes.end() || !found->second.isFile()) return std::nullopt;
   return found->second.contents;
 }
 
@@ -154,7 +161,8 @@ std::optional<std::errc> QVFakeFileSystem::State::obstacle(const std::string& pa
   const auto found = nodes.find(path);
   if (found != nodes.end()) {
     if (found->second.permissions) return std::nullopt;
-    return std::errc::not_a_directory;
+    return found->second.isLink ? std::errc::too_many_symbolic_link_levels
+                                : std::errc::not_a_directory;
   }
   const auto above = obstacle(parentOf(path));
   return above ? above : std::errc::no_such_file_or_directory;
@@ -169,6 +177,6 @@ std::optional<std::errc> QVFakeFileSystem::State::replace(const std::string& pat
       (*obstacle != std::errc::no_such_file_or_directory || this->obstacle(parentOf(path)))) {
     return obstacle;
   }
-  nodes[path].contents = std::move(contents);
+  nodes[path] = {.contents = std::move(contents)};
   return std::nullopt;
 }

@@ -41,6 +41,8 @@ class QVFakeFileSystem final : public QVFileSystem {
   void recover(Step step);
   // Puts a file there, whatever was there before; its directory has to be there.
   void addFile(const std::string& path, std::string contents);
+  // Puts a symbolic link there, to a directory that is none of the service's business.
+  void addLink(const std::string& path);
 
   // Paths of all files, in order; the contents of one, nothing where there is none.
   std::vector<std::string> files() const;
@@ -57,8 +59,11 @@ class QVFakeFileSystem final : public QVFileSystem {
  private:
   class File;
   struct Node {
-    std::optional<uint32_t> permissions;  // of a directory
-    std::string contents;                 // of a file
+    std::optional<uint32_t> permissions{};  // of a directory
+    std::string contents{};                 // of a file
+    bool isLink = false;
+
+    bool isFile() const { return !permissions && !isLink; }
   };
   // What open files share with their file system, which they may outlive.
   struct State {

@@ -18,9 +18,9 @@ constexpr mode_t kMode = S_IRUSR | S_IWUSR | S_IRGRP | S_IROTH;
 // Names that are tried: each is one of 2^64, so a second one is needed hardly ever.
 constexpr int kNames = 16;
 
-// After so many bytes the kernel writes them while more are made, and forgets those before them:
-// what is kept of a large file is twice this, not all of it, and pages are used again while they
-// are in the processor's cache.
+// After so many bytes the kernel begins to write them while more are made, so that the syncing at
+// the end has little left to do; and forgets what has arrived of those before them, so that a large
+// file takes pages that are in the processor's cache again and again, and little memory.
 constexpr uint64_t kHandOnBytes = uint64_t{8} << 20;
 
 std::string arbitraryName() {
@@ -35,14 +35,15 @@ std::string arbitraryName() {
 bool sync(int descriptor) {
   int result = 0;
   do {
-    result = ::fsync(descriptor);
+    result = ::fdatasync(descriptor);
   } while (result != 0 && errno == EINTR);
   return result == 0;
 }
 
 }  // namespace
 
-QVPosixAtomicFile::QVPosixAtomicFile(const std::string& path) : path_(path) {
+QVPosixAtomicFile::QVPosixAtomicFile(const std::string& path, int directory)
+    : path_(path), directory_(directory) {
   open();
 }
 
@@ -51,7 +52,6 @@ QVPosixAtomicFile::~QVPosixAtomicFile() {
 }
 
 void QVPosixAtomicFile::open() {
-  directory_ = ::open(path_.parent_path().c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
   if (!check(directory_ >= 0)) return;
   for (int i = 0; i < kNames && file_ < 0; ++i) {
     temporaryName_ = arbitraryName();
@@ -90,23 +90,14 @@ void QVPosixAtomicFile::writeOut(std::string_view bytes) {
 
 void QVPosixAtomicFile::handOn() {
   if (written_ - handedOn_ < kHandOnBytes) return;
-  const auto sync = [this](uint64_t from, uint64_t to, unsigned flags) {
-    const int result =
-        ::sync_file_range(file_, static_cast<off_t>(from), static_cast<off_t>(to - from), flags);
-    // What failed on its way to the disk is told once, so it may not be overheard here. The call
-    // itself may be refused to a service that is locked in: then the syncing at the end does it
-    // all.
-    check(result == 0 || errno == EPERM || errno == ENOSYS);
-  };
-  sync(handedOn_, written_, SYNC_FILE_RANGE_WRITE);
-  if (handedOn_ > onDisk_) {
-    sync(onDisk_, handedOn_,
-         SYNC_FILE_RANGE_WAIT_BEFORE | SYNC_FILE_RANGE_WRITE | SYNC_FILE_RANGE_WAIT_AFTER);
-    static_cast<void>(::posix_fadvise(file_, static_cast<off_t>(onDisk_),
-                                      static_cast<off_t>(handedOn_ - onDisk_),
-                                      POSIX_FADV_DONTNEED));
-  }
-  onDisk_ = std::exchange(handedOn_, written_);
+  // Nothing is waited for. Where the call is refused, or what it began fails, the syncing at the
+  // end does it all, or says so.
+  static_cast<void>(::sync_file_range(file_, static_cast<off_t>(handedOn_),
+                                      static_cast<off_t>(written_ - handedOn_),
+                                      SYNC_FILE_RANGE_WRITE));
+  static_cast<void>(
+      ::posix_fadvise(file_, 0, static_cast<off_t>(handedOn_), POSIX_FADV_DONTNEED));
+  handedOn_ = written_;
 }
 
 std::optional<QVError> QVPosixAtomicFile::commit() {
@@ -116,7 +107,6 @@ std::optional<QVError> QVPosixAtomicFile::commit() {
   if (!failure_ && check(::renameat(directory_, temporaryName_.c_str(), directory_,
                                     path_.filename().c_str()) == 0)) {
     temporaryName_.clear();
-    check(sync(directory_));
   }
   abandon();
   return failure_;

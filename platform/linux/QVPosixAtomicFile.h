@@ -10,9 +10,10 @@
 #include <string_view>
 
 // A file that is written beside the place that it shall take: into a hidden file of an arbitrary
-// name in the same directory, which is synced and renamed. Whatever goes wrong before the renaming,
-// and when the object is dropped, that file is removed; only a service that is killed meanwhile
-// leaves it behind.
+// name in the same directory, which is synced and renamed. The renaming itself is not waited for:
+// after a loss of power the place may have what was there before. Whatever goes wrong before the
+// renaming, and when the object is dropped, that file is removed; only a service that is killed
+// meanwhile leaves it behind.
 //
 // The file is readable by the service's group and, where the process's umask lets them, by others.
 // A link that somebody laid under the name is replaced, not followed.
@@ -23,7 +24,9 @@ class QVPosixAtomicFile final : public QVAtomicFile {
   // What is held back to be written at once, in bytes.
   static constexpr std::size_t kBufferBytes = std::size_t{64} * 1024;
 
-  explicit QVPosixAtomicFile(const std::string& path);
+  // `directory` is a descriptor of the path's directory, which this closes; below 0 there is none,
+  // and errno says why.
+  QVPosixAtomicFile(const std::string& path, int directory);
   ~QVPosixAtomicFile() override;
   QVPosixAtomicFile(const QVPosixAtomicFile&) = delete;
   QVPosixAtomicFile& operator=(const QVPosixAtomicFile&) = delete;
@@ -34,20 +37,19 @@ class QVPosixAtomicFile final : public QVAtomicFile {
  private:
   void open();
   void writeOut(std::string_view bytes);
-  // Has the kernel write what it was given so far.
+  // Has the kernel begin to write what it was given so far.
   void handOn();
   // Keeps the first failure; answers whether there is none.
   bool check(bool succeeded);
   void abandon();
 
   const std::filesystem::path path_;
-  int directory_ = -1;
+  int directory_;
   int file_ = -1;
   std::string temporaryName_;  // empty once there is no such file
   std::unique_ptr<char[]> buffer_;
   std::size_t used_ = 0;
   uint64_t written_ = 0;
   uint64_t handedOn_ = 0;
-  uint64_t onDisk_ = 0;
   std::optional<QVError> failure_;
 };

@@ -11,47 +11,123 @@
 
 namespace {
 
-bool isDirectory(const std::string& path) {
-  struct stat status {};
-  if (::stat(path.c_str(), &status) != 0) return false;
-  if (S_ISDIR(status.st_mode)) return true;
-  errno = ENOTDIR;
-  return false;
+// Directories are passed through: that takes no permission to read them.
+constexpr int kDirectoryFlags = O_PATH | O_DIRECTORY | O_CLOEXEC;
+
+void closeKeepingErrno(int descriptor) {
+  const int number = errno;
+  ::close(descriptor);
+  errno = number;
 }
 
-// Makes one directory where there is none. False, with errno set, where it cannot be.
-bool makeDirectory(const std::string& path, mode_t permissions) {
-  if (isDirectory(path)) return true;
-  if (errno != ENOENT) return false;
-  // Nobody gets in before the permissions are the wanted ones: mkdir() takes the umask from them.
-  if (::mkdir(path.c_str(), S_IRWXU) != 0) {
-    // Another may have been faster.
-    return errno == EEXIST && isDirectory(path);
-  }
-  const int directory = ::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
-  if (directory < 0) return false;
-  const bool changed = ::fchmod(directory, permissions) == 0;
-  const int number = errno;
-  ::close(directory);
-  errno = number;
+// Of a directory that has just been made, so that what it stands for is what is changed. Nobody got
+// in before: mkdir() takes the umask from permissions, so they come after it.
+bool setPermissions(int parent, const char* name, mode_t permissions) {
+  const int made = ::openat(parent, name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
+  if (made < 0) return false;
+  const bool changed = ::fchmod(made, permissions) == 0;
+  closeKeepingErrno(made);
   return changed;
+}
+
+// Makes one directory. False, with errno set, where it cannot be; another may have been faster.
+bool makeDirectory(int parent, const char* name, mode_t permissions) {
+  if (::mkdirat(parent, name, S_IRWXU) != 0) return errno == EEXIST;
+  return setPermissions(parent, name, permissions);
+}
+
+bool isLink(int parent, const char* name) {
+  struct stat status {};
+  return ::fstatat(parent, name, &status, AT_SYMLINK_NOFOLLOW) == 0 && S_ISLNK(status.st_mode);
+}
+
+// A descriptor of the directory of that name, which is no link; below 0, with errno set, where
+// there is none.
+int openChild(int parent, const std::string& name) {
+  if (name.empty() || name == "." || name == ".." || name.find('\0') != std::string::npos) {
+    errno = EINVAL;
+    return -1;
+  }
+  const int child = ::openat(parent, name.c_str(), kDirectoryFlags | O_NOFOLLOW);
+  // The kernel says "not a directory" of a link, too.
+  if (child < 0 && errno == ENOTDIR) errno = isLink(parent, name.c_str()) ? ELOOP : ENOTDIR;
+  return child;
+}
+
+// The root, whose path is the administrator's, links and all.
+int openRoot(const std::string& root, bool make, std::string& failed) {
+  failed = root;
+  int directory = ::open(root.c_str(), kDirectoryFlags);
+  if (directory >= 0 || errno != ENOENT || !make) return directory;
+  for (std::size_t end = 0; end != std::string::npos;) {
+    end = root.find('/', end + 1);
+    failed = root.substr(0, end);
+    directory = ::open(failed.c_str(), kDirectoryFlags);
+    if (directory < 0) {
+      if (errno != ENOENT ||
+          !makeDirectory(AT_FDCWD, failed.c_str(), QVFileSystem::kRootPermissions)) {
+        return -1;
+      }
+      directory = ::open(failed.c_str(), kDirectoryFlags);
+      if (directory < 0) return -1;
+    }
+    if (end != std::string::npos) ::close(directory);
+  }
+  return directory;
+}
+
+// The part of the path below the root, empty for the root itself; nothing where it lies elsewhere.
+std::optional<std::string_view> partBelow(std::string_view root, std::string_view path) {
+  if (!path.starts_with(root)) return std::nullopt;
+  const std::string_view below = path.substr(root.size());
+  if (below.empty()) return below;
+  if (below.front() != '/') return std::nullopt;
+  return below.substr(1);
 }
 
 }  // namespace
 
+int QVPosixFileSystem::openDirectory(std::string_view below, std::optional<uint32_t> permissions,
+                                     std::string& failed) const {
+  int directory = openRoot(diagnosticLogRoot_, permissions.has_value(), failed);
+  for (bool isLast = below.empty(); directory >= 0 && !isLast;) {
+    const std::size_t end = below.find('/');
+    const std::string name(below.substr(0, end));
+    isLast = end == std::string_view::npos;
+    below.remove_prefix(isLast ? below.size() : end + 1);
+    failed.append("/").append(name);
+    int child = openChild(directory, name);
+    if (child < 0 && errno == ENOENT && permissions &&
+        makeDirectory(directory, name.c_str(), *permissions)) {
+      child = openChild(directory, name);
+    }
+    closeKeepingErrno(directory);
+    directory = child;
+  }
+  return directory;
+}
+
 std::optional<QVError> QVPosixFileSystem::createDirectory(const std::string& path,
                                                           uint32_t permissions) {
-  // Usually everything is there.
-  if (isDirectory(path)) return std::nullopt;
-  std::size_t end = 0;
-  while (end != std::string::npos) {
-    end = path.find('/', end + 1);
-    const std::string part = path.substr(0, end);
-    if (!makeDirectory(part, permissions)) return QVMakePosixError(part);
-  }
+  const auto below = partBelow(diagnosticLogRoot_, path);
+  if (!below) return QVMakePosixError(path, EINVAL);
+  std::string failed;
+  const int directory = openDirectory(*below, permissions, failed);
+  if (directory < 0) return QVMakePosixError(failed);
+  ::close(directory);
   return std::nullopt;
 }
 
 std::unique_ptr<QVAtomicFile> QVPosixFileSystem::makeAtomicFile(const std::string& path) {
-  return std::make_unique<QVPosixAtomicFile>(path);
+  const std::size_t slash = path.rfind('/');
+  const auto below = partBelow(diagnosticLogRoot_,
+                               std::string_view(path).substr(0, slash == path.npos ? 0 : slash));
+  int directory = -1;
+  if (below) {
+    std::string failed;
+    directory = openDirectory(*below, std::nullopt, failed);
+  } else {
+    errno = EINVAL;
+  }
+  return std::make_unique<QVPosixAtomicFile>(path, directory);
 }

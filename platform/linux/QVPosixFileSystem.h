@@ -3,8 +3,11 @@
 #include "platform/QVFileSystem.h"
 
 #include <string>
+#include <string_view>
+#include <utility>
 
-// Directories and files of the operating system.
+// Directories and files of the operating system. Below the root every directory is opened by its
+// name in the one above it, and never through a symbolic link.
 //
 // Threads: any, at once.
 class QVPosixFileSystem final : public QVFileSystem {
@@ -18,5 +21,11 @@ class QVPosixFileSystem final : public QVFileSystem {
   std::unique_ptr<QVAtomicFile> makeAtomicFile(const std::string& path) override;
 
  private:
+  // A descriptor of the directory that lies `below` the root; below 0, with errno set, where it
+  // cannot be opened, and then `failed` is the path of the part that failed. Missing parts are made
+  // where there are permissions for them.
+  int openDirectory(std::string_view below, std::optional<uint32_t> permissions,
+                    std::string& failed) const;
+
   const std::string diagnosticLogRoot_;
 };

@@ -28,6 +28,9 @@ class FakeFileSystemHarness {
   std::optional<uint32_t> permissions(const std::string& path) { return files_.permissions(path); }
   // All files below the root, hidden ones too.
   std::vector<std::string> allFiles() const { return files_.files(); }
+  // A symbolic link to a directory elsewhere; what lies there.
+  void addLink(const std::string& path) { files_.addLink(path); }
+  std::vector<std::string> filesBehindLinks() const { return {}; }
 
  private:
   QVFakeFileSystem files_;
@@ -56,6 +59,16 @@ class PosixFileSystemHarness {
     std::vector<std::string> paths;
     for (const auto& entry : std::filesystem::recursive_directory_iterator(root())) {
       if (!entry.is_directory()) paths.push_back(entry.path().string());
+    }
+    return paths;
+  }
+  void addLink(const std::string& path) const {
+    std::filesystem::create_directory_symlink(root_.state(), path);
+  }
+  std::vector<std::string> filesBehindLinks() const {
+    std::vector<std::string> paths;
+    for (const auto& entry : std::filesystem::directory_iterator(root_.state())) {
+      paths.push_back(entry.path().string());
     }
     return paths;
   }
@@ -97,7 +110,32 @@ TYPED_TEST(QVFileSystemContract, MakesADirectoryWithThoseAboveItThatAreMissing) 
   for (const char* below : {"a/b/c", "a/b", "a"}) {
     EXPECT_EQ(this->harness_.permissions(this->path(below)), 0777u) << below;
   }
-  EXPECT_EQ(this->harness_.permissions(this->harness_.root()), 0777u);
+}
+
+TYPED_TEST(QVFileSystemContract, MakesAMissingRootForTheServiceAlone) {
+  EXPECT_EQ(this->createDirectory("a", 0777), std::nullopt);
+  EXPECT_EQ(this->harness_.permissions(this->harness_.root()), 0750u);
+}
+
+TYPED_TEST(QVFileSystemContract, MakesNothingBehindALink) {
+  EXPECT_EQ(this->createDirectory("a", 0777), std::nullopt);
+  this->harness_.addLink(this->path("a/link"));
+  EXPECT_EQ(this->createDirectory("a/link", 0777),
+            this->path("a/link: Too many levels of symbolic links"));
+  EXPECT_EQ(this->createDirectory("a/link/b", 0777),
+            this->path("a/link: Too many levels of symbolic links"));
+  EXPECT_THAT(this->harness_.filesBehindLinks(), IsEmpty());
+}
+
+TYPED_TEST(QVFileSystemContract, WritesNoFileBehindALink) {
+  EXPECT_EQ(this->createDirectory("a", 0777), std::nullopt);
+  this->harness_.addLink(this->path("a/link"));
+  EXPECT_EQ(this->write("a/link/file", "x"),
+            this->path("a/link/file: Too many levels of symbolic links"));
+  EXPECT_THAT(this->harness_.filesBehindLinks(), IsEmpty());
+  EXPECT_EQ(this->write("a/link", "x"), std::nullopt) << "a file takes its place";
+  EXPECT_EQ(this->contents("a/link"), "x");
+  EXPECT_THAT(this->harness_.filesBehindLinks(), IsEmpty());
 }
 
 TYPED_TEST(QVFileSystemContract, LeavesDirectoriesThatAreThereAlone) {

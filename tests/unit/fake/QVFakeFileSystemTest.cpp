@@ -74,6 +74,14 @@ TEST_F(QVFakeFileSystemTest, TakesFilesThatATestPutsThere) {
   EXPECT_EQ(files_.permissions("/logs/file"), std::nullopt) << "a file";
 }
 
+TEST_F(QVFakeFileSystemTest, TakesLinksThatATestPutsThere) {
+  files_.addLink("/logs/link");
+  EXPECT_EQ(write("/logs/link/file", "x"), "/logs/link/file: Too many levels of symbolic links");
+  EXPECT_EQ(files_.contents("/logs/link"), std::nullopt);
+  EXPECT_EQ(files_.permissions("/logs/link"), std::nullopt);
+  EXPECT_THAT(files_.files(), IsEmpty());
+}
+
 TEST_F(QVFakeFileSystemTest, LetsAFileOutliveIt) {
   std::unique_ptr<QVAtomicFile> file;
   {

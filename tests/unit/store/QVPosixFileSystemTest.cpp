@@ -3,6 +3,7 @@
 #include "platform/linux/QVPosixFileSystem.h"
 #include "tests/support/QVTemporaryRoot.h"
 
+#include <cerrno>
 #include <csignal>
 #include <filesystem>
 #include <fstream>
@@ -116,19 +117,62 @@ TEST_F(QVPosixFileSystemTest, ReplacesALinkInsteadOfFollowingIt) {
   EXPECT_FALSE(std::filesystem::exists(path("nowhere")));
 }
 
-TEST_F(QVPosixFileSystemTest, TakesALinkToADirectoryForADirectory) {
+TEST_F(QVPosixFileSystemTest, FollowsNoLinkInPlaceOfADirectory) {
   std::filesystem::create_directory(path("elsewhere"));
-  std::filesystem::create_directory_symlink(path("elsewhere"), path("link"));
-  EXPECT_EQ(files_.createDirectory(path("link/inside"), 0777), std::nullopt);
-  EXPECT_TRUE(std::filesystem::is_directory(path("elsewhere/inside")));
+  for (const char* target : {"elsewhere", "nowhere"}) {
+    std::filesystem::create_directory_symlink(path(target), path("link"));
+    const auto error = files_.createDirectory(path("link/inside"), 0777);
+    ASSERT_TRUE(error.has_value());
+    EXPECT_EQ(error->description(), path("link: Too many levels of symbolic links"));
+    EXPECT_EQ(write("link/file.json", "x"),
+              path("link/file.json: Too many levels of symbolic links"));
+    std::filesystem::remove(path("link"));
+  }
+  EXPECT_TRUE(std::filesystem::is_empty(path("elsewhere")));
+  EXPECT_FALSE(std::filesystem::exists(path("nowhere")));
 }
 
-TEST_F(QVPosixFileSystemTest, MakesNoDirectoryBehindALinkToNowhere) {
-  std::filesystem::create_directory_symlink(path("nowhere"), path("link"));
-  const auto error = files_.createDirectory(path("link/inside"), 0777);
-  ASSERT_TRUE(error.has_value());
-  EXPECT_EQ(error->description(), path("link: No such file or directory"));
-  EXPECT_FALSE(std::filesystem::exists(path("nowhere")));
+TEST_F(QVPosixFileSystemTest, WritesWhereItBeganAndNotWhereALinkIsPutMeanwhile) {
+  std::filesystem::create_directory(path("directory"));
+  std::filesystem::create_directory(path("elsewhere"));
+  const auto file = files_.makeAtomicFile(path("directory/file.json"));
+  std::filesystem::rename(path("directory"), path("moved"));
+  std::filesystem::create_directory_symlink(path("elsewhere"), path("directory"));
+  file->write("x");
+  EXPECT_EQ(file->commit(), std::nullopt);
+  EXPECT_TRUE(std::filesystem::is_empty(path("elsewhere")));
+  EXPECT_EQ(contents("moved/file.json"), "x");
+}
+
+TEST_F(QVPosixFileSystemTest, TakesARootThatIsALink) {
+  std::filesystem::create_directory(path("disk"));
+  std::filesystem::create_directory_symlink(path("disk"), path("root"));
+  QVPosixFileSystem files(path("root"));
+  EXPECT_EQ(files.createDirectory(path("root/inside"), 0777), std::nullopt);
+  EXPECT_TRUE(std::filesystem::is_directory(path("disk/inside")));
+}
+
+TEST_F(QVPosixFileSystemTest, MakesAMissingRootAndThoseAboveItForTheServiceAlone) {
+  const Umask mask(0);
+  QVPosixFileSystem files(path("var/log"));
+  EXPECT_EQ(files.createDirectory(path("var/log/inside"), 0777), std::nullopt);
+  EXPECT_EQ(mode("var"), mode_t{0750});
+  EXPECT_EQ(mode("var/log"), mode_t{0750});
+  EXPECT_EQ(mode("var/log/inside"), mode_t{0777});
+}
+
+TEST_F(QVPosixFileSystemTest, RefusesWhatLiesElsewhere) {
+  for (const std::string& place :
+       {root_.state().string(), path("../elsewhere"), path("a/../../elsewhere"), path("a//b"),
+        path("."), root_.logs().string() + "beside"}) {
+    const auto error = files_.createDirectory(place, 0777);
+    ASSERT_TRUE(error.has_value()) << place;
+    EXPECT_EQ(error->code, EINVAL) << place;
+    const auto failure = files_.makeAtomicFile(place + "/file")->commit();
+    ASSERT_TRUE(failure.has_value()) << place;
+    EXPECT_EQ(failure->code, EINVAL) << place;
+  }
+  EXPECT_EQ(files_.makeAtomicFile("file")->commit()->code, EINVAL);
 }
 
 TEST_F(QVPosixFileSystemTest, LeavesNothingWhereTheDiskTakesNoMore) {
@@ -182,10 +226,12 @@ TEST_F(QVPosixFileSystemTest, SurvivesThatItsDirectoryIsRemoved) {
 
 TEST_F(QVPosixFileSystemTest, NamesThePlaceWhereNobodyMayMakeAnything) {
   // Not even root.
-  const auto error = files_.createDirectory("/proc/self/quietvox/logs", 0777);
+  QVPosixFileSystem files("/proc/self/quietvox");
+  const auto error = files.createDirectory("/proc/self/quietvox/logs", 0777);
   ASSERT_TRUE(error.has_value());
   EXPECT_EQ(error->description(), "/proc/self/quietvox: No such file or directory");
-  EXPECT_TRUE(files_.makeAtomicFile("/proc/self/file.json")->commit().has_value());
+  QVPosixFileSystem process("/proc/self");
+  EXPECT_TRUE(process.makeAtomicFile("/proc/self/file.json")->commit().has_value());
 }
 
 }  // namespace
