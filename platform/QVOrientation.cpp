@@ -18,6 +18,6 @@ std::string_view QVOrientation::textOfOrientation(int32_t orientation) {
 }
 
 int32_t QVOrientation::orientationNamed(std::string_view word) {
-  const auto found = std::ranges::find(kWords, word);
+  const auto* const found = std::ranges::find(kWords, word);
   return found == kWords.end() ? kUndefined : static_cast<int32_t>(found - kWords.begin());
 }

@@ -57,7 +57,7 @@ class Session {
  public:
   explicit Session(int messages) {
     // As the service has it: large blocks go back to the kernel.
-    ::mallopt(M_MMAP_THRESHOLD, 64 * 1024);
+    ::mallopt(M_MMAP_THRESHOLD, 64 * 1024);  // NOLINT(concurrency-mt-unsafe): one thread so far
     QVPlatform::shared().fileSystem = std::make_unique<QVPosixFileSystem>(root_.logs().string());
     QVPlatform::shared().jsonOutput = std::make_unique<QVRapidJSONOutput>();
     fakes_.deviceInformation().setAnswer("InternalBuild", true);

@@ -59,8 +59,8 @@ std::shared_ptr<QVRunLoopThread> QVAsioRunLoopThreads::startThread(std::string_v
   threads_.push_back({std::make_shared<Handle>(name), {}});
   auto& [handle, thread] = threads_.back();
   try {
-    thread = std::thread([handle = handle, body = std::move(body), &log = log_]() mutable {
-      handle->run(std::move(body), log);
+    thread = std::thread([shared = handle, body = std::move(body), &log = log_]() mutable {
+      shared->run(std::move(body), log);
     });
   } catch (const std::system_error& failure) {
     log_.error(nullptr, __func__, "no thread for ", name, ": ", failure.what());

@@ -95,8 +95,7 @@ void QVPosixAtomicFile::handOn() {
   static_cast<void>(::sync_file_range(file_, static_cast<off_t>(handedOn_),
                                       static_cast<off_t>(written_ - handedOn_),
                                       SYNC_FILE_RANGE_WRITE));
-  static_cast<void>(
-      ::posix_fadvise(file_, 0, static_cast<off_t>(handedOn_), POSIX_FADV_DONTNEED));
+  static_cast<void>(::posix_fadvise(file_, 0, static_cast<off_t>(handedOn_), POSIX_FADV_DONTNEED));
   handedOn_ = written_;
 }
 

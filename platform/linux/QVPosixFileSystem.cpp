@@ -120,8 +120,8 @@ std::optional<QVError> QVPosixFileSystem::createDirectory(const std::string& pat
 
 std::unique_ptr<QVAtomicFile> QVPosixFileSystem::makeAtomicFile(const std::string& path) {
   const std::size_t slash = path.rfind('/');
-  const auto below = partBelow(diagnosticLogRoot_,
-                               std::string_view(path).substr(0, slash == path.npos ? 0 : slash));
+  const auto below = partBelow(
+      diagnosticLogRoot_, std::string_view(path).substr(0, slash == std::string::npos ? 0 : slash));
   int directory = -1;
   if (below) {
     std::string failed;
