@@ -34,15 +34,11 @@ class QVAtomicFile {
 // description; nothing is logged.
 class QVFileSystem {
  public:
-  // Of a root that has to be made.
-  static constexpr uint32_t kRootPermissions = 0750;
-
   virtual ~QVFileSystem() = default;
   // The directory under which diagnostic logs lie. Need not exist.
   virtual std::string diagnosticLogRoot() const = 0;
-  // Makes the directory and those between it and the root that are missing, each with exactly these
-  // permissions (the process's umask does not count); existing ones are left alone. A missing root
-  // is made, too, with kRootPermissions, as are those above it.
+  // Makes the directory and those above it that are missing, the root as well, each with exactly
+  // these permissions (the process's umask does not count); existing ones are left alone.
   [[nodiscard]] virtual std::optional<QVError> createDirectory(const std::string& path,
                                                                uint32_t permissions) = 0;
   // Begins a file; what cannot be opened fails in commit().

@@ -84,9 +84,7 @@ std::optional<QVError> QVFakeFileSystem::createDirectory(const std::string& path
     if (state_->obstacle(part) == std::errc::no_such_file_or_directory) {
       const auto failure = state_->failure(Step::createDirectory);
       if (failure) return makeError(part, *failure);
-      // Those above the root are as the root.
-      const bool isRoot = kDiagnosticLogRoot.starts_with(part);
-      state_->nodes[part].permissions = isRoot ? QVFileSystem::kRootPermissions : permissions;
+      state_->nodes[part].permissions = permissions;
     }
     if (const auto obstacle = state_->obstacle(part)) return makeError(part, *obstacle);
     if (end == std::string::npos) return std::nullopt;

@@ -55,19 +55,16 @@ int openChild(int parent, const std::string& name) {
 }
 
 // The root, whose path is the administrator's, links and all.
-int openRoot(const std::string& root, bool make, std::string& failed) {
+int openRoot(const std::string& root, std::optional<uint32_t> permissions, std::string& failed) {
   failed = root;
   int directory = ::open(root.c_str(), kDirectoryFlags);
-  if (directory >= 0 || errno != ENOENT || !make) return directory;
+  if (directory >= 0 || errno != ENOENT || !permissions) return directory;
   for (std::size_t end = 0; end != std::string::npos;) {
     end = root.find('/', end + 1);
     failed = root.substr(0, end);
     directory = ::open(failed.c_str(), kDirectoryFlags);
     if (directory < 0) {
-      if (errno != ENOENT ||
-          !makeDirectory(AT_FDCWD, failed.c_str(), QVFileSystem::kRootPermissions)) {
-        return -1;
-      }
+      if (errno != ENOENT || !makeDirectory(AT_FDCWD, failed.c_str(), *permissions)) return -1;
       directory = ::open(failed.c_str(), kDirectoryFlags);
       if (directory < 0) return -1;
     }
@@ -89,7 +86,7 @@ std::optional<std::string_view> partBelow(std::string_view root, std::string_vie
 
 int QVPosixFileSystem::openDirectory(std::string_view below, std::optional<uint32_t> permissions,
                                      std::string& failed) const {
-  int directory = openRoot(diagnosticLogRoot_, permissions.has_value(), failed);
+  int directory = openRoot(diagnosticLogRoot_, permissions, failed);
   for (bool isLast = below.empty(); directory >= 0 && !isLast;) {
     const std::size_t end = below.find('/');
     const std::string name(below.substr(0, end));
