@@ -50,23 +50,25 @@ void handleBackends(BackendSearch& search, const std::optional<QVArray>& backend
 }  // namespace
 
 std::shared_ptr<QVReportingSession> QVReportingSession::initWithID(
-    int64_t reporterID, std::vector<int32_t> processIdentifiers) {
+    int64_t reporterID, std::vector<int32_t> processIdentifiers, std::size_t maximumBytes) {
   QVReportingSessionLog::registerScope();
   std::shared_ptr<QVReportingSession> session(
-      new QVReportingSession(reporterID, std::move(processIdentifiers)));
+      new QVReportingSession(reporterID, std::move(processIdentifiers), maximumBytes));
   log().info(scope(), "-[QVReportingSession initWithID:processIdentifiers:]",
              "created reporting session for ID: ", reporterID);
   platform().tracePoints->mark(kTraceCreated);
   return session;
 }
 
-QVReportingSession::QVReportingSession(int64_t reporterID, std::vector<int32_t> processIdentifiers)
+QVReportingSession::QVReportingSession(int64_t reporterID, std::vector<int32_t> processIdentifiers,
+                                       std::size_t maximumBytes)
     : reporterID_(reporterID),
       processIdentifiers_(std::move(processIdentifiers)),
       userInfo_(std::make_shared<QVReportingUserInfo>()),
       beaconQueue_(platform().queues->makeSerialQueue("net.quillon.quietvox.session.beacon",
                                                       QVQualityOfService::utility, 0)),
       serviceType_(kQVReportingServiceTypeUnknown),
+      maximumBytes_(maximumBytes),
       serviceName_("unknown") {
   makeEmptyPayloadArrays();
 }
@@ -189,12 +191,6 @@ std::shared_ptr<QVReportingPayloadArray> QVReportingSession::nestedAggregatedPay
   return nestedAggregatedPayloadData_;
 }
 
-void QVReportingSession::makeEmptyPayloadArrays() {
-  const auto store = std::make_shared<QVReportingPayloadStore>();
-  replacePayloadArrays(std::make_shared<QVReportingPayloadArray>(store),
-                       std::make_shared<QVReportingPayloadArray>(store));
-}
-
 void QVReportingSession::replacePayloadArrays(std::shared_ptr<QVReportingPayloadArray> aggregated,
                                               std::shared_ptr<QVReportingPayloadArray> nested) {
   // Each property changes under the lock of the array that it held, so that whoever has that lock
@@ -218,3 +214,7 @@ void QVReportingSession::replacePayloadArrays(std::shared_ptr<QVReportingPayload
 std::string QVReportingSession::description() const {
   return QVText("<QVReportingSession ", reporterID_, '>');
 }
+void QVReportingSession::setTransactionCompleteBlock(Reply<bool> block) {
+  transactionCompleteBlock_ = std::move(block);
+}
+
