@@ -59,9 +59,10 @@ class QVReportingSession final : public QVReportingSessionInformation,
   void updateDefaults(const QVDictionary& defaults);
 
   // Both return at once; the framework's work goes on behind. A second `start`, or a `stop` of a
-  // session that is not started, changes nothing.
+  // session that is not started, changes nothing. A `stop` always comes to its end: a step that
+  // fails costs an error line and what that step was to do.
   void start();
-  void stop();
+  void stop() noexcept;
 
   // Numbers, records and sends one message. The reply (may be empty) is answered with no error,
   // before the framework sees the message; what becomes of the send is never told.
@@ -124,7 +125,7 @@ class QVReportingSession final : public QVReportingSessionInformation,
   void flushBeaconSession();
 
   void registerForOrientation();
-  void unregisterFromOrientation();
+  void unregisterFromOrientation(const QVLogSite& site);
 
   MessageIdentifier nextIdentifier(uint32_t category, uint16_t type);
   void record(const QVDictionary& payload, const MessageIdentifier& identifier);
@@ -137,8 +138,8 @@ class QVReportingSession final : public QVReportingSessionInformation,
   const std::vector<int32_t> processIdentifiers_;
   const std::shared_ptr<QVReportingUserInfo> userInfo_;  // locked inside
   const std::shared_ptr<QVWorkQueue> beaconQueue_;
-
   const std::size_t maximumBytes_;
+
   // Any thread.
   std::atomic<bool> started_{false};
   std::atomic<bool> beaconSessionStarted_{false};
