@@ -67,7 +67,7 @@ class QVLog {
   }
 
   // Makes the default log (null) verbose, or not, as at first. It has no scope, and so no switch in
-  // the preferences.
+  // the preferences: the keys there are those of scopes. For programs with a throttle of their own.
   static void setDefaultVerbose(bool verbose) noexcept {
     isDefaultVerbose_.store(verbose, std::memory_order_relaxed);
   }

@@ -13,8 +13,10 @@
 // told. Where there is no source, or while it is out of order, the value is undefined.
 //
 // Registrations are named by an ID that the caller chooses. Several of one ID are all kept and all
-// called; each unregistration ends the oldest of its ID. There may be a limit: a registration above
-// it is dropped, with its callback, and one error line says so until a registration has ended.
+// called; each unregistration ends the oldest of its ID, whoever made it: of two that share an ID,
+// the one that unregisters first leaves the other with the younger registration. There may be a
+// limit: a registration above it is dropped, with its callback, and one error line says so until a
+// registration has ended.
 //
 // An exception that escapes a callback is logged once at error level on the default log; the other
 // callbacks are called all the same.

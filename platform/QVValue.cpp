@@ -7,6 +7,7 @@
 #include <limits>
 #include <memory>
 #include <new>
+#include <stdexcept>
 #include <utility>
 #include <vector>
 
@@ -39,6 +40,12 @@ struct TextStorage {
     return characters;
   }
 };
+
+// What a value keeps of a string's length.
+uint32_t lengthOf(std::string_view text) {
+  if (text.size() > UINT32_MAX) throw std::length_error("a string of 4 GiB or more");
+  return static_cast<uint32_t>(text.size());
+}
 
 bool sameReal(double a, double b) noexcept {
   return a == b || (std::isnan(a) && std::isnan(b));
@@ -176,10 +183,9 @@ struct QVValueStorage {
 // ---- QVValue
 
 QVValue::QVValue(std::string_view value)
-    : bits_{.characters = TextStorage::make(value)},
-      length_(static_cast<uint32_t>(value.size())),
-      kind_(Kind::string),
-      counted_(true) {}
+    : length_(lengthOf(value)), kind_(Kind::string), counted_(true) {
+  bits_.characters = TextStorage::make(value);
+}
 
 QVValue::QVValue(QVArray value) noexcept
     : bits_{.array = value.storage_}, kind_(Kind::array), counted_(value.storage_ != nullptr) {
@@ -193,10 +199,10 @@ QVValue::QVValue(QVDictionary value) noexcept
   value.storage_ = nullptr;
 }
 
-QVValue QVValue::borrowing(std::string_view characters) noexcept {
+QVValue QVValue::borrowing(std::string_view characters) {
   QVValue value;
   value.bits_.characters = characters.data();
-  value.length_ = static_cast<uint32_t>(characters.size());
+  value.length_ = lengthOf(characters);
   value.kind_ = Kind::string;
   return value;
 }

@@ -18,6 +18,8 @@ class QVDictionary;
 // dictionary may borrow its characters from the container's memory; a copy of it is always
 // self-contained, a reference to it is valid as long as its container.
 //
+// A string of 4 GiB or more is refused with std::length_error.
+//
 // Threads: distinct QVValue objects may share contents across threads; one object may not be
 // assigned while another thread uses it.
 class QVValue {
@@ -52,7 +54,7 @@ class QVValue {
   QVValue(QVDictionary value) noexcept;
 
   // A string whose characters stay where they are and must outlive the value; copies own theirs.
-  static QVValue borrowing(std::string_view characters) noexcept;
+  static QVValue borrowing(std::string_view characters);
 
   QVValue(const QVValue& other);
   QVValue(QVValue&& other) noexcept;

@@ -1,8 +1,11 @@
 #include "QVServices/Statistics/Service/QVReportingBlockThrottle.h"
 
+#include "QVServices/Statistics/Service/QVReportingRunStep.h"
 #include "platform/QVPlatform.h"
 
 #include <chrono>
+#include <cstddef>
+#include <optional>
 #include <utility>
 
 namespace {
@@ -34,6 +37,12 @@ QVLog& log() {
   return *QVPlatform::shared().log;
 }
 
+// Of a pass of the thread. Whatever goes wrong in one, the next one follows: blocks are waiting.
+template <class Step>
+void runStep(std::string_view what, const Step& step) noexcept {
+  QVReportingRunStep(nullptr, kInit, what, std::nullopt, step);
+}
+
 }  // namespace
 
 QVReportingBlockThrottle::QVReportingBlockThrottle()
@@ -50,31 +59,41 @@ std::shared_ptr<QVReportingBlockThrottle> QVReportingBlockThrottle::init() {
 void QVReportingBlockThrottle::runThread(QVRunLoop& workingRunLoop) {
   while (shouldKeepRunning_) {
     if (unscheduledTimerKeysCount() > 0) {
-      log().verbose(nullptr, kInit, "calling workingRunLoop run from inside thread block");
+      runStep("log the run", [] {
+        log().verbose(nullptr, kInit, "calling workingRunLoop run from inside thread block");
+      });
       attachUnscheduledTimers(workingRunLoop);
       // Until the last of them has fired; keys that come meanwhile have to wait for that.
-      workingRunLoop.run();
+      runStep("run timers", [&workingRunLoop] { workingRunLoop.run(); });
     }
-    log().verbose(nullptr, kInit, "sleeping in thread");
+    runStep("log the pause", [] { log().verbose(nullptr, kInit, "sleeping in thread"); });
     threads_.pause(kPassPeriod);
   }
 }
 
 void QVReportingBlockThrottle::attachUnscheduledTimers(QVRunLoop& workingRunLoop) {
-  std::vector<std::string> keys = emptyKeys();
+  std::size_t attached = 0;
+  runStep("attach timers", [this, &workingRunLoop, &attached] {
+    for (const std::size_t count = unscheduledTimerKeysCount(); attached < count; ++attached) {
+      workingRunLoop.attach(timerOfUnscheduledKey(attached));
+    }
+  });
+  // After a failure the others stay, for the next pass. Nobody else takes keys out.
+  const std::lock_guard lock(unscheduledTimerKeysLock_);
+  const auto first = unscheduledTimerKeys_.begin();
+  unscheduledTimerKeys_.erase(first, first + static_cast<std::ptrdiff_t>(attached));
+}
+
+std::shared_ptr<QVRunLoopTimer> QVReportingBlockThrottle::timerOfUnscheduledKey(
+    std::size_t index) const {
+  std::string key;
   {
     const std::lock_guard lock(unscheduledTimerKeysLock_);
-    keys.swap(unscheduledTimerKeys_);
+    key = unscheduledTimerKeys_[index];
   }
-  for (const std::string& key : keys) {
-    std::shared_ptr<QVRunLoopTimer> timer;
-    {
-      // Only its timer's firing removes a key, and that comes after this.
-      const std::lock_guard lock(timersInFlightLock_);
-      timer = timersInFlight_.at(key)->timer();
-    }
-    workingRunLoop.attach(std::move(timer));
-  }
+  // Only its timer's firing removes a key, and that comes after this.
+  const std::lock_guard lock(timersInFlightLock_);
+  return timersInFlight_.at(key)->timer();
 }
 
 void QVReportingBlockThrottle::addMessageBlock(Block block, int64_t reporterID,
@@ -98,8 +117,14 @@ void QVReportingBlockThrottle::addMessageBlock(Block block, int64_t reporterID,
         threads_.makeTimer(Wrapper::durationFromSeconds(delay), [this, key] { fire(key); }));
     timersInFlight_.emplace(key, wrapper);
   }
-  const std::lock_guard lock(unscheduledTimerKeysLock_);
-  unscheduledTimerKeys_.push_back(key);
+  try {
+    const std::lock_guard lock(unscheduledTimerKeysLock_);
+    unscheduledTimerKeys_.push_back(key);
+  } catch (...) {
+    // Nobody would ever attach its timer.
+    removeKey(key);
+    throw;
+  }
 }
 
 void QVReportingBlockThrottle::fire(const std::string& key) {

@@ -25,7 +25,8 @@
 // Ownership: shared; the thread holds it too, so it lives on until the thread is told to end.
 // Limits: none on the number of pending keys. A timer fires at most 5 s after the last message of
 // its key once it is attached; it is attached when all that were attached before have fired, so a
-// stream of equal messages that does not end holds back the keys that come after it.
+// stream of equal messages that does not end holds back the keys that come after it. One that
+// cannot be attached is tried again with each pass, with an error line.
 class QVReportingBlockThrottle {
  public:
   using Block = QVReportingBlockThrottleTimerWrapper::Block;
@@ -36,7 +37,8 @@ class QVReportingBlockThrottle {
   // Schedules the block, or puts it in the place of the one that is pending for an equal message
   // and moves that one's timer. A block that comes for a key whose block is running is dropped: the
   // key is removed after it. An exception of a block frees its key and passes on to the run loop,
-  // which logs it. An empty block does nothing when its time has come.
+  // which logs it. An empty block does nothing when its time has come. Throws where there is no
+  // memory; a key that was not pending is free then.
   void addMessageBlock(Block block, int64_t reporterID, const QVDictionary& message,
                        uint32_t category, uint16_t type);
 
@@ -68,6 +70,7 @@ class QVReportingBlockThrottle {
   QVReportingBlockThrottle();
   void runThread(QVRunLoop& workingRunLoop);
   void attachUnscheduledTimers(QVRunLoop& workingRunLoop);
+  std::shared_ptr<QVRunLoopTimer> timerOfUnscheduledKey(std::size_t index) const;
   void fire(const std::string& key);
   Block takeBlock(const std::string& key);
   void removeKey(const std::string& key);

@@ -15,10 +15,11 @@ void QVReportingPayloadArray::add(const Entry& entry) {
   ++size_;
 }
 
-QVReportingPayloadArray::Position QVReportingPayloadArray::append(const QVDictionary& payload) {
+std::optional<QVReportingPayloadArray::Position> QVReportingPayloadArray::append(
+    const QVDictionary& payload) {
   const std::lock_guard lock(mutex_);
-  const Position position = store_->append(payload);
-  add({position, 0, 0});
+  const std::optional<Position> position = store_->appendIfNotFull(payload);
+  if (position) add({*position, 0, 0});
   return position;
 }
 

@@ -7,6 +7,7 @@
 #include <cstdint>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <string_view>
 #include <vector>
 
@@ -31,11 +32,12 @@ class QVReportingPayloadArray {
   void lock() { mutex_.lock(); }
   void unlock() { mutex_.unlock(); }
 
-  // Appends a payload; answers where it lies, for an entry of the other array.
-  Position append(const QVDictionary& payload);
+  // Appends a payload; answers where it lies, for an entry of the other array. Nothing, with
+  // nothing appended, where the store is full.
+  std::optional<Position> append(const QVDictionary& payload);
   // Appends the payload at `position` of the shared store under the identifier BASE_COUNT.
   void append(std::string_view identifierBase, uint32_t count, Position position);
-  // Makes the payload the first entry, without a name.
+  // Makes the payload the first entry, without a name, also where the store is full.
   void insertAtFront(const QVDictionary& payload);
 
   std::size_t size() const;

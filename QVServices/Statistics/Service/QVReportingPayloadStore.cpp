@@ -4,11 +4,15 @@
 
 #include <algorithm>
 #include <functional>
+#include <utility>
 
 namespace {
 
 // A position is a chunk's index and an offset within the chunk.
 constexpr unsigned kOffsetBits = 32;
+
+// Bytes of a payload's entries in the two arrays that share the store.
+constexpr std::size_t kEntryBytes = 32;
 
 std::size_t hashOfKeys(const QVDictionary& payload) {
   std::size_t hash = payload.size();
@@ -19,6 +23,10 @@ std::size_t hashOfKeys(const QVDictionary& payload) {
 }
 
 }  // namespace
+
+QVReportingPayloadStore::QVReportingPayloadStore(std::size_t maximumBytes,
+                                                 QVFunction<void()> whenFull)
+    : maximumBytes_(maximumBytes), whenFull_(std::move(whenFull)) {}
 
 bool QVReportingPayloadStore::hasKeys(const QVDictionary& payload, const Keys& keys) {
   return std::equal(
@@ -59,6 +67,7 @@ QVReportingPayloadStore::Position QVReportingPayloadStore::place(std::string_vie
                                  : std::min(chunks_.back().capacity * 2, kLargestChunkBytes);
     const std::size_t capacity = std::max(next, encoded.size());
     chunks_.push_back({std::make_unique_for_overwrite<uint8_t[]>(capacity), 0, capacity});
+    chunkBytes_ += capacity;
   }
   Chunk& chunk = chunks_.back();
   std::copy(encoded.begin(), encoded.end(), chunk.bytes.get() + chunk.used);
@@ -67,8 +76,23 @@ QVReportingPayloadStore::Position QVReportingPayloadStore::place(std::string_vie
   return position;
 }
 
+std::optional<QVReportingPayloadStore::Position> QVReportingPayloadStore::appendIfNotFull(
+    const QVDictionary& payload) {
+  {
+    const std::lock_guard lock(mutex_);
+    if (chunkBytes_ + payloads_ * kEntryBytes < maximumBytes_) return encode(payload);
+    if (std::exchange(hasRefused_, true)) return std::nullopt;
+  }
+  if (whenFull_) whenFull_();
+  return std::nullopt;
+}
+
 QVReportingPayloadStore::Position QVReportingPayloadStore::append(const QVDictionary& payload) {
   const std::lock_guard lock(mutex_);
+  return encode(payload);
+}
+
+QVReportingPayloadStore::Position QVReportingPayloadStore::encode(const QVDictionary& payload) {
   scratch_.clear();
   const uint64_t keySet = keySetOf(payload);
   QVReportingEncodeNumber(scratch_, keySet);
@@ -78,6 +102,7 @@ QVReportingPayloadStore::Position QVReportingPayloadStore::append(const QVDictio
     QVReportingEncodeValue(scratch_, entry.value);
   }
   const Position position = place(scratch_);
+  ++payloads_;
   // A summary is as long as all that was sent before it.
   if (scratch_.capacity() > kLargestChunkBytes) std::string().swap(scratch_);
   return position;
@@ -128,7 +153,5 @@ std::string_view QVReportingPayloadStore::interned(uint32_t number) const {
 
 std::size_t QVReportingPayloadStore::footprint() const {
   const std::lock_guard lock(mutex_);
-  std::size_t bytes = scratch_.capacity();
-  for (const Chunk& chunk : chunks_) bytes += chunk.capacity;
-  return bytes;
+  return scratch_.capacity() + chunkBytes_;
 }

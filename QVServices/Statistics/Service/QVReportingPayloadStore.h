@@ -1,11 +1,14 @@
 #pragma once
 
+#include "platform/QVFunction.h"
 #include "platform/QVValue.h"
 
+#include <cstddef>
 #include <cstdint>
 #include <map>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <span>
 #include <string>
 #include <string_view>
@@ -16,7 +19,7 @@
 // session's two payload arrays, so that a payload is kept once for both.
 //
 // Append-only; everything goes with the last owner.
-// Threads: any; locked inside, never calls out.
+// Threads: any; locked inside, calls out without the lock.
 class QVReportingPayloadStore {
  public:
   // Names one payload within its store.
@@ -30,7 +33,20 @@ class QVReportingPayloadStore {
     uint64_t keySet;
   };
 
+  // Bytes that one session's payloads may take, with their entries in the two arrays: some ten
+  // million ordinary messages. A client that never stops its session must not take all memory.
+  static constexpr std::size_t kMaximumBytes = std::size_t{1} << 30;
+
+  // Calls `whenFull`, where there is one, when a payload is refused for the first time, on the
+  // thread that brings it.
+  explicit QVReportingPayloadStore(std::size_t maximumBytes = kMaximumBytes,
+                                   QVFunction<void()> whenFull = {});
+
+  // Keeps the payload in any case.
   Position append(const QVDictionary& payload);
+  // Nothing, and the payload is not kept, once the maximum has been reached. The one that reaches
+  // it is kept whole.
+  std::optional<Position> appendIfNotFull(const QVDictionary& payload);
   // Decodes the payload into `room`, which is used again and again for one payload after the other.
   Payload read(Position position, std::vector<QVDictionaryEntry>& room) const;
 
@@ -60,13 +76,22 @@ class QVReportingPayloadStore {
     std::size_t capacity = 0;
   };
 
+  // What follows: with the lock held.
+  Position encode(const QVDictionary& payload);
   static bool hasKeys(const QVDictionary& payload, const Keys& keys);
   // The number of the payload's set of keys, from 1; 0 where it has to be written out.
   uint64_t keySetOf(const QVDictionary& payload);
   Position place(std::string_view encoded);
 
+  // Constant after creation.
+  const std::size_t maximumBytes_;
+  QVFunction<void()> whenFull_;  // called once
+
   mutable std::mutex mutex_;
   // All guarded by mutex_.
+  std::size_t chunkBytes_ = 0;
+  std::size_t payloads_ = 0;
+  bool hasRefused_ = false;
   std::vector<Keys> keySets_;
   std::size_t keySetBytes_ = 0;
   std::multimap<std::size_t, std::size_t> keySetsByHash_;

@@ -1,6 +1,7 @@
 #include "QVServices/Statistics/Service/QVReportingServerInstance.h"
 
 #include "QVServices/Statistics/QVReportingVocabulary.h"
+#include "QVServices/Statistics/Service/QVReportingRunStep.h"
 #include "QVServices/Statistics/Service/QVReportingServer.h"
 #include "platform/QVPlatform.h"
 
@@ -42,8 +43,11 @@ QVReportingServerInstance::QVReportingServerInstance(
     : processIdentifier_(pid), delegate_(std::move(delegate)) {}
 
 QVReportingServerInstance::~QVReportingServerInstance() {
-  log().standard(scope(), "-[QVReportingServerInstance dealloc]", "dealloc ", processIdentifier_,
-                 " from the server client list");
+  constexpr const char* kFunction = "-[QVReportingServerInstance dealloc]";
+  QVReportingRunStep(scope(), kFunction, "log the end of client", processIdentifier_, [this] {
+    log().standard(scope(), kFunction, "dealloc ", processIdentifier_,
+                   " from the server client list");
+  });
 }
 
 std::optional<QVDate> QVReportingServerInstance::clientStartDate() const {
@@ -193,23 +197,34 @@ void QVReportingServerInstance::stop(int64_t reporterID, Reply<bool>& reply) {
     reply(true);
     return;
   }
+  const auto run = [reporterID](std::string_view what, auto&& step) {
+    QVReportingRunStep(scope(), kFunction, what, reporterID, step);
+  };
   if (const auto session = findReportingSessionForID(reporterID, false)) {
-    QVDictionary grown;
-    if (const auto delegate = delegate_.lock()) {
-      grown = delegate->getDriverStatisticsRelativeToSnapShot(session->driverSnapShot());
-    }
-    if (grown.isAbsent()) {
-      log().standard(scope(), kFunction, "nothing interesting to fetch from the drivers");
-    } else {
-      session->sendMessage(grown, kQVReportingCategoryTallying, kQVReportingMessageTypeGeneric, {});
-      log().standard(scope(), kFunction, "fetching driver logs ", grown);
-    }
+    run("send driver statistics of reporter", [&] { sendDriverStatistics(*session, kFunction); });
     session->setDriverSnapShot(nullptr);
     session->stop();
-    if (auto waiting = std::exchange(session->transactionCompleteBlock(), nullptr)) waiting(true);
+    if (auto waiting = std::exchange(session->transactionCompleteBlock(), nullptr)) {
+      run("answer the start of reporter", [&waiting] { waiting(true); });
+    }
   }
-  log().standard(scope(), kFunction, "stopping ", reporterID);
+  run("log the stop of reporter",
+      [reporterID] { log().standard(scope(), kFunction, "stopping ", reporterID); });
   reply(true);
+}
+
+void QVReportingServerInstance::sendDriverStatistics(QVReportingSession& session,
+                                                     const QVLogSite& site) const {
+  QVDictionary grown;
+  if (const auto delegate = delegate_.lock()) {
+    grown = delegate->getDriverStatisticsRelativeToSnapShot(session.driverSnapShot());
+  }
+  if (grown.isAbsent()) {
+    log().standard(scope(), site, "nothing interesting to fetch from the drivers");
+    return;
+  }
+  session.sendMessage(grown, kQVReportingCategoryTallying, kQVReportingMessageTypeGeneric, {});
+  log().standard(scope(), site, "fetching driver logs ", grown);
 }
 
 void QVReportingServerInstance::destroyReportingSession(int64_t reporterID, Reply<bool> reply) {
@@ -223,6 +238,7 @@ void QVReportingServerInstance::destroyReportingSession(int64_t reporterID, Repl
 }
 
 void QVReportingServerInstance::destroy(int64_t reporterID, Reply<bool>& reply) {
+  constexpr const char* kFunction = "-[QVReportingServerInstance destroyReportingSession:reply:]";
   if (reporterID == 0) {
     reply(true);
     return;
@@ -232,8 +248,9 @@ void QVReportingServerInstance::destroy(int64_t reporterID, Reply<bool>& reply) 
     if (entry->second->started()) entry->second->stop();
     clientReportingSessionMap_.erase(entry);
   }
-  log().standard(scope(), "-[QVReportingServerInstance destroyReportingSession:reply:]",
-                 "destroying ", reporterID);
+  QVReportingRunStep(scope(), kFunction, "log the end of reporter", reporterID, [reporterID] {
+    log().standard(scope(), kFunction, "destroying ", reporterID);
+  });
   reply(true);
 }
 

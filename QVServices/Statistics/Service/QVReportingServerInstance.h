@@ -92,6 +92,7 @@ class QVReportingServerInstance final
                      const std::vector<int64_t>& reporterIDs) const;
   void routeToAllStarted(const QVDictionary& message, uint32_t category, uint16_t type,
                          const QVReportingServiceDelegateProtocol& delegate) const;
+  void sendDriverStatistics(QVReportingSession& session, const QVLogSite& site) const;
   void removeFromService();
 
   // Constant after creation.

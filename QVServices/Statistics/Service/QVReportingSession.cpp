@@ -3,6 +3,7 @@
 #include "QVServices/Statistics/QVReportingUtility.h"
 #include "QVServices/Statistics/QVReportingVocabulary.h"
 #include "QVServices/Statistics/Service/QVReportingBeaconClient.h"
+#include "QVServices/Statistics/Service/QVReportingRunStep.h"
 #include "QVServices/Statistics/Service/QVReportingSessionLog.h"
 #include "platform/QVPlatform.h"
 
@@ -50,29 +51,34 @@ void handleBackends(BackendSearch& search, const std::optional<QVArray>& backend
 }  // namespace
 
 std::shared_ptr<QVReportingSession> QVReportingSession::initWithID(
-    int64_t reporterID, std::vector<int32_t> processIdentifiers) {
+    int64_t reporterID, std::vector<int32_t> processIdentifiers, std::size_t maximumBytes) {
   QVReportingSessionLog::registerScope();
   std::shared_ptr<QVReportingSession> session(
-      new QVReportingSession(reporterID, std::move(processIdentifiers)));
+      new QVReportingSession(reporterID, std::move(processIdentifiers), maximumBytes));
   log().info(scope(), "-[QVReportingSession initWithID:processIdentifiers:]",
              "created reporting session for ID: ", reporterID);
   platform().tracePoints->mark(kTraceCreated);
   return session;
 }
 
-QVReportingSession::QVReportingSession(int64_t reporterID, std::vector<int32_t> processIdentifiers)
+QVReportingSession::QVReportingSession(int64_t reporterID, std::vector<int32_t> processIdentifiers,
+                                       std::size_t maximumBytes)
     : reporterID_(reporterID),
       processIdentifiers_(std::move(processIdentifiers)),
       userInfo_(std::make_shared<QVReportingUserInfo>()),
       beaconQueue_(platform().queues->makeSerialQueue("net.quillon.quietvox.session.beacon",
                                                       QVQualityOfService::utility, 0)),
+      maximumBytes_(maximumBytes),
       serviceType_(kQVReportingServiceTypeUnknown),
       serviceName_("unknown") {
   makeEmptyPayloadArrays();
 }
 
 QVReportingSession::~QVReportingSession() {
-  log().info(scope(), "-[QVReportingSession dealloc]", "deallocing this session ", reporterID_);
+  constexpr const char* kFunction = "-[QVReportingSession dealloc]";
+  QVReportingRunStep(scope(), kFunction, "log the end of reporter", reporterID_, [this] {
+    log().info(scope(), kFunction, "deallocing this session ", reporterID_);
+  });
   platform().tracePoints->mark(kTraceDestroyed);
 }
 
@@ -149,22 +155,30 @@ void QVReportingSession::setUpBeaconSession(const std::optional<std::string_view
   // Success is not stored: it is known to the search alone, and `beaconSessionStarted` stays false.
 }
 
-void QVReportingSession::stop() {
+void QVReportingSession::stop() noexcept {
   constexpr const char* kFunction = "-[QVReportingSession stop]";
-  log().verbose(scope(), kFunction, "ending session ", reporterID_);
-  if (shouldReportOrientation()) unregisterFromOrientation();
+  const auto run = [this](std::string_view what, auto&& step) {
+    QVReportingRunStep(scope(), kFunction, what, reporterID_, step);
+  };
+  const auto logEnd = [this] { log().verbose(scope(), kFunction, "ending session ", reporterID_); };
+  run("log the end of reporter", logEnd);
+  run("unregister the callbacks of reporter", [this] {
+    if (shouldReportOrientation()) unregisterFromOrientation(kFunction);
+  });
   if (!started_) return;
 
   // Written again for a started session; tools count on two lines.
-  log().verbose(scope(), kFunction, "ending session ", reporterID_);
+  run("log the end of reporter", logEnd);
   platform().tracePoints->mark(kTraceStopped);
-  const QVDictionary summary = createSummaryEventForSession();
-  if (!summary.isAbsent()) {
+  run("send the summary event of reporter", [this] {
+    const QVDictionary summary = createSummaryEventForSession();
+    if (summary.isAbsent()) return;
     log().standard(scope(), kFunction, "sending summary event for reporter ", reporterID_);
     sendMessage(summary, kQVReportingCategorySummary, kQVReportingMessageTypeSummary, true, {});
-  }
-  writeSummaryJson();
-  beaconQueue_->async([self = shared_from_this()] { self->flushBeaconSession(); });
+  });
+  run("write the summary file of reporter", [this] { writeSummaryJson(); });
+  run("flush the messages of reporter",
+      [this] { beaconQueue_->async([self = shared_from_this()] { self->flushBeaconSession(); }); });
   replacePayloadArrays(nullptr, nullptr);
   started_ = false;
 }
@@ -189,12 +203,6 @@ std::shared_ptr<QVReportingPayloadArray> QVReportingSession::nestedAggregatedPay
   return nestedAggregatedPayloadData_;
 }
 
-void QVReportingSession::makeEmptyPayloadArrays() {
-  const auto store = std::make_shared<QVReportingPayloadStore>();
-  replacePayloadArrays(std::make_shared<QVReportingPayloadArray>(store),
-                       std::make_shared<QVReportingPayloadArray>(store));
-}
-
 void QVReportingSession::replacePayloadArrays(std::shared_ptr<QVReportingPayloadArray> aggregated,
                                               std::shared_ptr<QVReportingPayloadArray> nested) {
   // Each property changes under the lock of the array that it held, so that whoever has that lock
@@ -213,6 +221,10 @@ void QVReportingSession::replacePayloadArrays(std::shared_ptr<QVReportingPayload
   };
   replace(aggregatedPayloadData_, aggregated);
   replace(nestedAggregatedPayloadData_, nested);
+}
+
+void QVReportingSession::setTransactionCompleteBlock(Reply<bool> block) {
+  transactionCompleteBlock_ = std::move(block);
 }
 
 std::string QVReportingSession::description() const {

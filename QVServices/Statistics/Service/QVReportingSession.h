@@ -44,8 +44,11 @@ class QVReportingSession final : public QVReportingSessionInformation,
   using DriverSnapShot = std::shared_ptr<const QVReportingDriverSnapShot>;
   using MessageTypeCounts = std::map<std::string, uint32_t, std::less<>>;
 
-  static std::shared_ptr<QVReportingSession> initWithID(int64_t reporterID,
-                                                        std::vector<int32_t> processIdentifiers);
+  // Collects up to `maximumBytes` between a start and a stop; what comes after that is sent all the
+  // same, and one error line says so.
+  static std::shared_ptr<QVReportingSession> initWithID(
+      int64_t reporterID, std::vector<int32_t> processIdentifiers,
+      std::size_t maximumBytes = QVReportingPayloadStore::kMaximumBytes);
   ~QVReportingSession() override;
   QVReportingSession(const QVReportingSession&) = delete;
   QVReportingSession& operator=(const QVReportingSession&) = delete;
@@ -56,9 +59,10 @@ class QVReportingSession final : public QVReportingSessionInformation,
   void updateDefaults(const QVDictionary& defaults);
 
   // Both return at once; the framework's work goes on behind. A second `start`, or a `stop` of a
-  // session that is not started, changes nothing.
+  // session that is not started, changes nothing. A `stop` always comes to its end: a step that
+  // fails costs an error line and what that step was to do.
   void start();
-  void stop();
+  void stop() noexcept;
 
   // Numbers, records and sends one message. The reply (may be empty) is answered with no error,
   // before the framework sees the message; what becomes of the send is never told.
@@ -103,9 +107,7 @@ class QVReportingSession final : public QVReportingSessionInformation,
   const DriverSnapShot& driverSnapShot() const { return driverSnapShot_; }
   void setDriverSnapShot(DriverSnapShot snapShot) { driverSnapShot_ = std::move(snapShot); }
   Reply<bool>& transactionCompleteBlock() { return transactionCompleteBlock_; }
-  void setTransactionCompleteBlock(Reply<bool> block) {
-    transactionCompleteBlock_ = std::move(block);
-  }
+  void setTransactionCompleteBlock(Reply<bool> block);
 
   std::string description() const;
 
@@ -113,7 +115,8 @@ class QVReportingSession final : public QVReportingSessionInformation,
   struct Message;
   struct MessageIdentifier;
 
-  QVReportingSession(int64_t reporterID, std::vector<int32_t> processIdentifiers);
+  QVReportingSession(int64_t reporterID, std::vector<int32_t> processIdentifiers,
+                     std::size_t maximumBytes);
 
   void addUserInformation(const QVDictionary& entries, const QVLogSite& site);
   void setUpBeaconSession(const std::optional<std::string_view>& serviceName, uint16_t serviceType,
@@ -122,7 +125,7 @@ class QVReportingSession final : public QVReportingSessionInformation,
   void flushBeaconSession();
 
   void registerForOrientation();
-  void unregisterFromOrientation();
+  void unregisterFromOrientation(const QVLogSite& site);
 
   MessageIdentifier nextIdentifier(uint32_t category, uint16_t type);
   void record(const QVDictionary& payload, const MessageIdentifier& identifier);
@@ -135,6 +138,7 @@ class QVReportingSession final : public QVReportingSessionInformation,
   const std::vector<int32_t> processIdentifiers_;
   const std::shared_ptr<QVReportingUserInfo> userInfo_;  // locked inside
   const std::shared_ptr<QVWorkQueue> beaconQueue_;
+  const std::size_t maximumBytes_;
 
   // Any thread.
   std::atomic<bool> started_{false};

@@ -101,12 +101,24 @@ void QVReportingSession::sendMessage(const QVDictionary& message, uint32_t categ
   if (reply) reply(std::nullopt);
 }
 
+void QVReportingSession::makeEmptyPayloadArrays() {
+  const auto store = std::make_shared<QVReportingPayloadStore>(
+      maximumBytes_, [reporterID = reporterID_, maximumBytes = maximumBytes_] {
+        log().error(scope(), kSendFunction, "messages of reporter ", reporterID, " take ",
+                    maximumBytes, " bytes, no more are collected");
+      });
+  replacePayloadArrays(std::make_shared<QVReportingPayloadArray>(store),
+                       std::make_shared<QVReportingPayloadArray>(store));
+}
+
 void QVReportingSession::record(const QVDictionary& payload, const MessageIdentifier& identifier) {
   const auto aggregated = aggregatedPayloadData();
   const auto nested = nestedAggregatedPayloadData();
   // Both are there or, after a stop, neither.
   if (aggregated == nullptr || nested == nullptr) return;
-  nested->append(identifier.base, identifier.count, aggregated->append(payload));
+  if (const auto position = aggregated->append(payload)) {
+    nested->append(identifier.base, identifier.count, *position);
+  }
 }
 
 void QVReportingSession::sendOnBeaconQueue(const Message& message) {

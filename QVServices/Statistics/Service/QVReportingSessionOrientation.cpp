@@ -2,6 +2,7 @@
 
 #include "QVServices/Statistics/QVReportingUtility.h"
 #include "QVServices/Statistics/QVReportingVocabulary.h"
+#include "QVServices/Statistics/Service/QVReportingRunStep.h"
 #include "QVServices/Statistics/Service/QVReportingSession.h"
 #include "QVServices/Statistics/Service/QVReportingSessionLog.h"
 #include "platform/QVPlatform.h"
@@ -75,6 +76,8 @@ std::optional<QVDate> QVReportingSession::startDate() const {
 }
 
 void QVReportingSession::registerForOrientation() {
+  // Callbacks that the last stop left, as the session did not report then, would record twice.
+  unregisterFromOrientation("-[QVReportingSession start]");
   const std::string callbackID = callbackIDOf(reporterID_);
   {
     const std::lock_guard lock(propertiesMutex_);
@@ -89,11 +92,18 @@ void QVReportingSession::registerForOrientation() {
   platform().orientation->QVRegisterUIOrientation(callbackID, callback(kUIMode));
 }
 
-void QVReportingSession::unregisterFromOrientation() {
-  const auto callbackID = orientationCallbackID();
+void QVReportingSession::unregisterFromOrientation(const QVLogSite& site) {
+  std::optional<std::string> callbackID;
+  {
+    const std::lock_guard lock(propertiesMutex_);
+    callbackID.swap(orientationCallbackID_);
+  }
   if (!callbackID) return;
-  platform().orientation->QVUnregisterDeviceOrientation(*callbackID);
-  platform().orientation->QVUnregisterUIOrientation(*callbackID);
-  const std::lock_guard lock(propertiesMutex_);
-  orientationCallbackID_.reset();
+  const QVLogScope* const scope = QVReportingSessionLog::scope();
+  QVReportingRunStep(
+      scope, site, "unregister the device callback of reporter", reporterID_,
+      [&callbackID] { platform().orientation->QVUnregisterDeviceOrientation(*callbackID); });
+  QVReportingRunStep(
+      scope, site, "unregister the UI callback of reporter", reporterID_,
+      [&callbackID] { platform().orientation->QVUnregisterUIOrientation(*callbackID); });
 }

@@ -18,7 +18,7 @@ namespace {
 constexpr std::string_view kSummaryEventKey = "QV_Session_Summary_Event";
 
 constexpr std::string_view kSummaryDirectory = "/DiagnosticLogs/Audio/Reporting";
-// On an internal build everybody may look at the files, and clear them away.
+// On an internal build everybody may list the files and clear them away.
 constexpr uint32_t kSummaryDirectoryPermissions = 0777;
 
 QVPlatform& platform() {
@@ -35,7 +35,7 @@ class Columns {
       for (const auto& [key, value] : payload.entries) add(key, value);
       return;
     }
-    // Looking up names would take most of the time; messages have few sets of keys.
+    // Names are looked up once for each set of keys, not with each message.
     if (known_.size() <= payload.keySet) known_.resize(payload.keySet + 1);
     std::vector<Column*>& columns = known_[payload.keySet];
     if (columns.empty()) {

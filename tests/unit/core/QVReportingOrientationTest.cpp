@@ -314,6 +314,26 @@ TEST_F(QVReportingOrientationTest, IsRecordedByALaterStartWhereItStayedRegistere
       << "the start of a session that does not report leaves the date as it is";
 }
 
+TEST_F(QVReportingOrientationTest, IsRecordedOnceByALaterStartThatRegistersAnew) {
+  const auto session = makeStartedSession();
+  session->setServiceType(1);
+  session->stop();
+  session->setServiceType(kTelephony);
+  session->start();
+  EXPECT_THAT(
+      orientation().calls(),
+      ElementsAre("register device QVReportingService 7", "register ui QVReportingService 7",
+                  "unregister device QVReportingService 7", "unregister ui QVReportingService 7",
+                  "register device QVReportingService 7", "register ui QVReportingService 7"));
+  orientation().setDeviceOrientation(QVOrientation::kNormal);
+  orientation().setUIOrientation(QVOrientation::kLeftUp);
+  EXPECT_THAT(recorded(*session), ElementsAre("device_orientation=normal device_orientation_time=0",
+                                              "ui_orientation=left-up ui_orientation_time=0"));
+  session->stop();
+  EXPECT_THAT(orientation().deviceCallbackIDs(), IsEmpty());
+  EXPECT_THAT(orientation().uiCallbackIDs(), IsEmpty());
+}
+
 TEST_F(QVReportingOrientationTest, TellsSessionsOfTheSameReporterApart) {
   const auto first = makeStartedSession(7);
   const auto second = makeStartedSession(7);
@@ -325,6 +345,19 @@ TEST_F(QVReportingOrientationTest, TellsSessionsOfTheSameReporterApart) {
   orientation().setUIOrientation(QVOrientation::kLeftUp);
   EXPECT_THAT(recorded(*second), SizeIs(2)) << "the oldest registration of the ID was ended";
   second->stop();
+  EXPECT_THAT(orientation().uiCallbackIDs(), IsEmpty());
+}
+
+TEST_F(QVReportingOrientationTest, EndsTheOldestRegistrationOfAReporterThatHasTwoSessions) {
+  const auto first = makeStartedSession(7);
+  const auto second = makeStartedSession(7);
+  second->stop();
+  EXPECT_THAT(orientation().uiCallbackIDs(), ElementsAre("QVReportingService 7"));
+  orientation().setUIOrientation(QVOrientation::kNormal);
+  EXPECT_THAT(recorded(*first), IsEmpty()) << "the stop of the other ended its registration";
+  EXPECT_EQ(second->aggregatedPayloadData(), nullptr) << "what is registered records nothing";
+  first->stop();
+  EXPECT_THAT(orientation().deviceCallbackIDs(), IsEmpty());
   EXPECT_THAT(orientation().uiCallbackIDs(), IsEmpty());
 }
 

@@ -6,6 +6,7 @@
 #include <atomic>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <string>
 #include <thread>
 #include <utility>
@@ -43,8 +44,8 @@ TEST_F(QVReportingPayloadArrayTest, IteratesInTheOrderOfTheAppends) {
 }
 
 TEST_F(QVReportingPayloadArrayTest, NamesEntriesThatShareAPayload) {
-  const auto first = aggregated_.append({{"n", 1}});
-  const auto second = aggregated_.append({{"n", 2}});
+  const auto first = aggregated_.append({{"n", 1}}).value();
+  const auto second = aggregated_.append({{"n", 2}}).value();
   nested_.append("Playback_Start", 1, first);
   nested_.append("Playback_Start", 4294967295u, second);
   nested_.append("Record_Stop", 1, second);
@@ -56,7 +57,7 @@ TEST_F(QVReportingPayloadArrayTest, NamesEntriesThatShareAPayload) {
 }
 
 TEST_F(QVReportingPayloadArrayTest, TakesAPayloadWithoutANameAtItsFront) {
-  nested_.append("Playback_Start", 1, aggregated_.append({{"n", 1}}));
+  nested_.append("Playback_Start", 1, aggregated_.append({{"n", 1}}).value());
   nested_.insertAtFront({{"HostApplicationDisplayID", "net.quillon.player"}});
   EXPECT_THAT(
       entriesOf(nested_),
@@ -68,6 +69,15 @@ TEST_F(QVReportingPayloadArrayTest, TakesAPayloadWithoutANameAtItsFront) {
 TEST_F(QVReportingPayloadArrayTest, TakesAPayloadAtItsFrontWhereItIsEmpty) {
   nested_.insertAtFront({});
   EXPECT_THAT(entriesOf(nested_), ElementsAre(std::pair("", QVDictionary())));
+}
+
+TEST_F(QVReportingPayloadArrayTest, AppendsNothingWhereTheStoreIsFull) {
+  const auto full = std::make_shared<QVReportingPayloadStore>(0);
+  QVReportingPayloadArray array(full);
+  EXPECT_EQ(array.append({{"n", 1}}), std::nullopt);
+  EXPECT_TRUE(array.empty());
+  array.insertAtFront({{"HostApplicationDisplayID", "net.quillon.player"}});
+  EXPECT_EQ(array.size(), 1u) << "a file has its session's configuration all the same";
 }
 
 TEST_F(QVReportingPayloadArrayTest, KeepsTheStoreThatItsEntriesLieIn) {
@@ -124,7 +134,7 @@ TEST_F(QVReportingPayloadArrayTest, TakesAppendsOfSeveralThreadsWhileItIsIterate
   for (int thread = 0; thread < kThreads; ++thread) {
     threads.emplace_back([&, thread] {
       for (int i = 0; i < kAppends; ++i) {
-        const auto position = aggregated_.append({{"thread", thread}, {"n", i}});
+        const auto position = aggregated_.append({{"thread", thread}, {"n", i}}).value();
         nested_.append("of thread", static_cast<uint32_t>(i + 1), position);
       }
       --running;

@@ -271,4 +271,31 @@ TEST(QVReportingPayloadStore, InternsTexts) {
   EXPECT_EQ(store.interned(second), "Session_Playback_Stop");
 }
 
+TEST(QVReportingPayloadStore, RefusesWhatComesAfterItsMaximumAndSaysSoOnce) {
+  int told = 0;
+  QVReportingPayloadStore store(2000, [&told] { ++told; });
+  std::vector<QVReportingPayloadStore::Position> positions;
+  while (const auto position = store.appendIfNotFull({{"n", int64_t(positions.size())}})) {
+    positions.push_back(*position);
+  }
+  EXPECT_EQ(told, 1);
+  // 512 bytes, and 32 for each payload's entries in the arrays.
+  EXPECT_EQ(positions.size(), (2000u - 512u + 31u) / 32u);
+  EXPECT_EQ(store.appendIfNotFull({}), std::nullopt);
+  EXPECT_EQ(told, 1);
+  EXPECT_EQ(payloadAt(store, store.append({{"n", -1}})), (QVDictionary{{"n", -1}}))
+      << "what does not ask for the maximum";
+  EXPECT_EQ(payloadAt(store, positions.back()),
+            (QVDictionary{{"n", int64_t(positions.size()) - 1}}));
+}
+
+TEST(QVReportingPayloadStore, KeepsThePayloadWholeThatReachesItsMaximum) {
+  QVReportingPayloadStore store(2000);
+  const QVDictionary large{{"text", std::string(5000, 'x')}};
+  const auto position = store.appendIfNotFull(large);
+  ASSERT_TRUE(position);
+  EXPECT_EQ(payloadAt(store, *position), large);
+  EXPECT_EQ(store.appendIfNotFull({{"n", 1}}), std::nullopt) << "nobody need be told";
+}
+
 }  // namespace

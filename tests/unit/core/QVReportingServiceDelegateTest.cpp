@@ -1,9 +1,12 @@
 #include "QVServices/Statistics/Service/QVReportingServiceDelegate.h"
 #include "QVServices/Statistics/Service/QVReportingServiceMain.h"
 #include "tests/support/QVServiceFixture.h"
+#include "tests/unit/core/QVLogDetour.h"
 
+#include <atomic>
 #include <chrono>
 #include <optional>
+#include <thread>
 
 namespace {
 
@@ -16,6 +19,66 @@ constexpr std::string_view kNewConnection = "listener:shouldAcceptNewConnection:
 constexpr std::string_view kLookup = "findReportingSessionForID:";
 
 class QVReportingServiceDelegateTest : public QVServiceFixture {};
+
+// A connection that does something of the test's while it is being set up.
+class ConnectionWithSetUp final : public QVIPCConnection {
+ public:
+  explicit ConnectionWithSetUp(QVFunction<void()> setUp) : setUp_(std::move(setUp)) {}
+
+  int32_t processIdentifier() const override { return 44; }
+  std::string description() const override { return "connection with set-up"; }
+  void setExportedInterface(QVIPCInterface) override {}
+  void setExportedObject(std::shared_ptr<QVReportingServiceProtocol> object) override {
+    exportedObject_ = std::move(object);
+    setUp_();
+  }
+  std::shared_ptr<QVReportingServiceProtocol> exportedObject() const override {
+    return exportedObject_;
+  }
+  void setInterruptionHandler(QVFunction<void()>) override {}
+  void setInvalidationHandler(QVFunction<void()>) override {}
+  void resume() override {}
+
+ private:
+  QVFunction<void()> setUp_;
+  std::shared_ptr<QVReportingServiceProtocol> exportedObject_;
+};
+
+// A thread of its own that looks for a session, and whether it had to wait for who began it.
+class LookUpOfAnotherThread {
+ public:
+  explicit LookUpOfAnotherThread(const QVReportingServiceDelegate& service) : service_(service) {}
+  ~LookUpOfAnotherThread() {
+    if (thread_.joinable()) thread_.join();
+  }
+  LookUpOfAnotherThread(const LookUpOfAnotherThread&) = delete;
+  LookUpOfAnotherThread& operator=(const LookUpOfAnotherThread&) = delete;
+
+  // Begins it, and leaves it far more turns than a look-up takes that does not have to wait.
+  void begin() {
+    constexpr int kTurns = 10'000;
+    thread_ = std::thread([this] {
+      hasBegun_ = true;
+      service_.findReportingSessionForID(0);
+      hasEnded_ = true;
+    });
+    while (!hasBegun_) std::this_thread::yield();
+    for (int turn = 0; turn < kTurns; ++turn) std::this_thread::yield();
+    hadEndedMeanwhile_ = hasEnded_;
+  }
+  // Before begin() returned. Asked once, after it.
+  bool hadEndedMeanwhile() {
+    thread_.join();
+    return hadEndedMeanwhile_;
+  }
+
+ private:
+  const QVReportingServiceDelegate& service_;
+  std::thread thread_;
+  std::atomic<bool> hasBegun_ = false;
+  std::atomic<bool> hasEnded_ = false;
+  bool hadEndedMeanwhile_ = false;
+};
 
 TEST_F(QVReportingServiceDelegateTest, RegistersTheServerScopeAndThenThatOfTheDrivers) {
   service();
@@ -225,6 +288,44 @@ TEST_F(QVReportingServiceDelegateTest, FindsNothingWhileReportingIsSwitchedOff) 
   EXPECT_THAT(takeJournal(), IsEmpty());
   switchReporting(true);
   EXPECT_EQ(service().findReportingSessionForID(7), client.session(7));
+}
+
+TEST_F(QVReportingServiceDelegateTest, FindsASessionWhileItSetsUpAConnection) {
+  QVTestClient& client = clientWithSession(42, 7);
+  std::shared_ptr<QVReportingSession> found;
+  const auto connection = std::make_shared<ConnectionWithSetUp>(
+      [&] { found = service().findReportingSessionForID(7); });
+  EXPECT_TRUE(service().listener(platform_.listener(), connection));
+  EXPECT_EQ(found, client.session(7));
+}
+
+TEST_F(QVReportingServiceDelegateTest, FindsASessionWhileItLooksForAnother) {
+  QVTestClient& client = clientWithSession(42, 7);
+  std::shared_ptr<QVReportingSession> found;
+  QVLogDetour::install([&](std::string_view text) {
+    if (text == "failed to find reporting session 99") {
+      found = service().findReportingSessionForID(7);
+    }
+  });
+  EXPECT_EQ(service().findReportingSessionForID(99), nullptr);
+  EXPECT_EQ(found, client.session(7));
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(hostLine(info, kLookup, "found reporting session 7 for client 42"),
+                          hostLine(error, kLookup, "failed to find reporting session 99")));
+}
+
+TEST_F(QVReportingServiceDelegateTest, KeepsOtherThreadsWaitingWhileItSetsUpAConnection) {
+  LookUpOfAnotherThread lookUp(service());
+  const auto connection = std::make_shared<ConnectionWithSetUp>([&] { lookUp.begin(); });
+  EXPECT_TRUE(service().listener(platform_.listener(), connection));
+  EXPECT_FALSE(lookUp.hadEndedMeanwhile());
+}
+
+TEST_F(QVReportingServiceDelegateTest, KeepsOtherThreadsWaitingWhileItLooksForASession) {
+  LookUpOfAnotherThread lookUp(service());
+  QVLogDetour::install([&](std::string_view) { lookUp.begin(); });
+  EXPECT_EQ(service().findReportingSessionForID(99), nullptr);
+  EXPECT_FALSE(lookUp.hadEndedMeanwhile());
 }
 
 TEST_F(QVReportingServiceDelegateTest, RemovesAClientFromTheListAndTakesNoteOfNoOther) {

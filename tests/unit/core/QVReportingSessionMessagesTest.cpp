@@ -266,4 +266,38 @@ TEST_F(QVReportingSessionMessagesTest, SendsAnEmptyAndAnAbsentMessage) {
                           "end 1"));
 }
 
+// ---- what a session collects
+
+TEST_F(QVReportingSessionMessagesTest, CollectsNoMoreThanItsMaximumAndSendsAllTheSame) {
+  const auto session = QVReportingSession::initWithID(7, {42}, 1000);
+  session->start();
+  runUntilIdle();
+  journal_.forget();
+  takeBeaconStory();
+  const std::string large(2000, 'x');
+  session->sendMessage({{"text", large}}, 0x08000001, 1, {});
+  EXPECT_THAT(journal_.entries("3["), IsEmpty());
+  session->sendMessage({{"n", 1}}, 0x08000001, 1, {});
+  session->sendMessage({{"n", 2}}, 0x08000001, 1, reply());
+  const auto line =
+      sessionLine(error, kSend, "messages of reporter 7 take 1000 bytes, no more are collected");
+  EXPECT_THAT(journal_.entries("3["), ElementsAre(line));
+  EXPECT_THAT(journal_.entries("reply "), ElementsAre("reply nil"));
+  EXPECT_EQ(session->aggregatedPayloadData()->size(), 1u);
+  EXPECT_EQ(session->nestedAggregatedPayloadData()->size(), 1u);
+  runUntilIdle();
+  EXPECT_THAT(takeBeaconStory(), SizeIs(3));
+
+  session->stop();
+  runUntilIdle();
+  EXPECT_THAT(takeBeaconStory(),
+              ElementsAre(R"(message 1: 65535/65535 {"QV_Session_Summary_Event":"65535","text":")" +
+                              large + "\"}",
+                          "flush 1", "end 1"));
+  session->start();
+  session->sendMessage({{"n", 3}}, 0x08000001, 1, {});
+  EXPECT_EQ(session->aggregatedPayloadData()->size(), 1u) << "each start collects anew";
+  EXPECT_THAT(journal_.entries("3["), ElementsAre(line));
+}
+
 }  // namespace

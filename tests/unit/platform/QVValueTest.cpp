@@ -3,7 +3,9 @@
 #include <cmath>
 #include <cstdint>
 #include <limits>
+#include <stdexcept>
 #include <string>
+#include <string_view>
 #include <utility>
 #include <vector>
 
@@ -149,6 +151,14 @@ TEST(QVValue, CopiesBorrowedCharacters) {
     EXPECT_NE(copy.string().data(), text->data());
   }
   EXPECT_EQ(copy.string(), "gone with its owner, and long enough");
+}
+
+TEST(QVValue, RefusesStringsThatItsLengthCannotTell) {
+  // Refused before a character is read.
+  const char character = 'x';
+  const std::string_view tooLong(&character, std::size_t{UINT32_MAX} + 1);
+  EXPECT_THROW(QVValue{tooLong}, std::length_error);
+  EXPECT_THROW(QVValue::borrowing(tooLong), std::length_error);
 }
 
 TEST(QVValue, SharesOwnedCharactersBetweenCopies) {
