@@ -121,13 +121,13 @@ void QVReportingSession::start() {
   });
 }
 
-void QVReportingSession::setUpBeaconSession(const std::optional<std::string_view>& serviceName,
-                                            uint16_t serviceType, bool startFlag) {
-  if (serviceType == kQVReportingServiceTypeTest) return;
+void QVReportingSession::setUpBeaconSession(std::optional<std::string_view> name, uint16_t type,
+                                            bool startFlag) {
+  if (type == kQVReportingServiceTypeTest) return;
 
   QVBeacon& beacon = *platform().beacon;
   beaconAgentToken_ = beacon.newSecureHierarchyTokenFromParentToken(nullptr);
-  const bool realtime = serviceType == kQVReportingServiceTypeAPIUsage;
+  const bool realtime = type == kQVReportingServiceTypeAPIUsage;
   const QVDictionary sessionInfo{
       {kBeaconSessionInfoClientType, QVReportingBeaconClient::kType},
       {kBeaconSessionInfoClientVersion, QVReportingBeaconClient::version()},
@@ -136,10 +136,10 @@ void QVReportingSession::setUpBeaconSession(const std::optional<std::string_view
       {kBeaconSessionInfoHierarchyToken, beaconAgentToken_->description()},
       {kBeaconSessionInfoContainsRealtimeEvents, realtime}};
   // The client's entries come last: they may replace the two names.
-  const QVDictionary userInfo =
-      QVDictionary{{kBeaconUserInfoClientName, QVReportingBeaconClient::kName},
-                   {kBeaconUserInfoServiceName, QVText(serviceName, "_session")}}
-          .merging(this->userInfo());
+  const QVDictionary userInfo = QVDictionary{
+      {kBeaconUserInfoClientName, QVReportingBeaconClient::kName},
+      {kBeaconUserInfoServiceName,
+       QVText(name, "_session")}}.merging(this->userInfo());
   beaconSession_ = beacon.initWithSessionInfo(sessionInfo, userInfo, {});
 
   const auto search =

@@ -119,8 +119,7 @@ class QVReportingSession final : public QVReportingSessionInformation,
                      std::size_t maximumBytes);
 
   void addUserInformation(const QVDictionary& entries, const QVLogSite& site);
-  void setUpBeaconSession(const std::optional<std::string_view>& serviceName, uint16_t serviceType,
-                          bool startFlag);
+  void setUpBeaconSession(std::optional<std::string_view> name, uint16_t type, bool startFlag);
   void sendOnBeaconQueue(const Message& message);
   void flushBeaconSession();
 
