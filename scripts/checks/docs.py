@@ -24,7 +24,7 @@ SKIPPED = ("CHANGELOG.md",)
 
 # Commands of others that documents use.
 OTHERS = set("""
-    apt-get bpftrace busctl c++ cat cc cd cmake ctest dbus-send echo export gdb gdbus git grep
+    aplay apt-get bpftrace busctl c++ cat cc cd cmake ctest dbus-send echo export gdb gdbus git grep
     journalctl lintian mkdir mmvdump perf pidof pkg-config printf readelf rm sqlite3 systemctl
     systemd-analyze systemd-socket-activate tail touch usermod dpkg-buildpackage
 """.split())
@@ -127,8 +127,8 @@ class Documents:
             self.presets = {preset["name"] for preset in presets["configurePresets"]}
         sources = project.sources(".cpp", ".h", ".c")
         self.words = {word for name in sources for word in re.findall(r"\w+", project.read(name))}
-        # A class has as many sources as it needs.
-        self.words |= {os.path.splitext(os.path.basename(name))[0] for name in sources}
+        # Names of files count: a class may have several sources.
+        self.words |= {os.path.splitext(os.path.basename(name))[0] for name in project.files}
 
     def report(self, name, line, text):
         self.project.report(name, line, "docs", text)

@@ -183,7 +183,8 @@ FAULTS = [
         "sh\ngonectl look", "sh\ntrue; echo | thingctl look", "sh\nthingctl gone",
         "sh\nthingctl look --gone", "sh\nthingctl look -g", "\nthingctl --gone",
         "sh\nsudo A=b thingctl --gone >/dev/null", "sh\necho 'no end", "sh\nscripts/tool \\\n  --quiet",
-        "sh\necho $(thingctl gone)")],
+        "sh\necho $(thingctl gone)",
+        "sh\nthingctl $(echo a) --gone")],
     *[fault("docs", "docs", "README.md:3", "README.md", f"# Thing\n<!-- {file} -->\n```\nother\n```\n")
       for file in ("tools/CMakeLists.txt", "tools/gone.cpp")],
     *[fault("docs", "docs", "tools/thingctl.1:2", "tools/thingctl.1", f".TH THINGCTL 1\n{text}\n.fi\n")

@@ -136,7 +136,7 @@ def commands_in(line):
     """The commands of a line of shell: lists of words, without assignments and redirections."""
     lexer = shlex.shlex(line, posix=True, punctuation_chars="();<>|&")
     lexer.whitespace_split = True
-    command, skip = [], False
+    command, skip, outer = [], False, []
     for token in lexer:
         if set(token) <= set("<>") or token in (">&", "&>"):
             skip = True
@@ -144,6 +144,12 @@ def commands_in(line):
                 command.pop()  # the descriptor
         elif skip:
             skip = False
+        elif token == "(" and command and command[-1].endswith("$"):
+            outer.append(command)
+            command = []
+        elif token == ")" and outer:
+            yield command
+            command = outer.pop()
         elif token in SEPARATORS:
             yield command
             command = []
