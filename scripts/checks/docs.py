@@ -1,7 +1,12 @@
-"""What the documents name exists: files, links, scripts and their options, presets, programs, classes.
+"""What the documents name exists: files, links, commands and their options, presets, programs, classes.
 
-Looks at code spans and code blocks of every Markdown file, and at links. The change log may name
-what is gone.
+Looks at code spans, code blocks and links of every Markdown file, and at the manual pages. A block
+marked `sh` holds shell: each command in it is one of the project's or one that is named below. A
+block behind a line `<!-- FILE -->` shows that file: nothing more, nothing less. The change log may
+name what is gone.
+
+With --programs DIR, the programs that are built there are asked what they take, and every option of
+theirs has to be in their manual page; without it, their sources are looked at.
 """
 
 import fnmatch
@@ -9,31 +14,35 @@ import itertools
 import json
 import os
 import re
+import shlex
+import sys
 
 from project import open_project
+from usage import OPTION, Usages, commands_in, faults
 
 SKIPPED = ("CHANGELOG.md",)
 
+# Commands of others that documents use.
+OTHERS = set("""
+    aplay apt-get bpftrace busctl c++ cat cc cd cmake ctest dbus-send echo export gdb gdbus git grep
+    journalctl lintian mkdir mmvdump perf pidof pkg-config printf readelf rm sqlite3 systemctl
+    systemd-analyze systemd-socket-activate tail touch usermod dpkg-buildpackage
+""".split())
+
 LINK = re.compile(r"\]\((?P<target>[^)\s]+)\)")
 SPAN = re.compile(r"(?P<ticks>`+)(?P<code>.+?)(?P=ticks)")
-FENCE = re.compile(r"^\s*(```|~~~)")
+FENCE = re.compile(r"^\s*(```|~~~)(?P<language>\w*)")
+SHOWN = re.compile(r"<!-- (?P<path>\S+) -->")
 CLASS = re.compile(r"\bQV[A-Z]\w*[a-z]\w*")
 PRESET = re.compile(r"--preset[ =](?P<name>[\w-]+)")
 PROGRAM = re.compile(r"\bbuild/(?P<preset>[\w<>*-]+)/bin/(?P<name>[\w-]+)")
-OPTION = re.compile(r"(?<!\S)(?P<option>--[a-z][\w-]*)")
 
-
-def code_of(text):
-    """(line, code) of each code span and each line of a code block."""
-    fenced = False
-    for line, content in enumerate(text.split("\n"), 1):
-        if FENCE.match(content):
-            fenced = not fenced
-        elif fenced:
-            yield line, content
-        else:
-            for span in SPAN.finditer(content):
-                yield line, span["code"]
+MANUAL = re.compile(r"(?:.*/)?(?P<program>[\w-]+)\.[1-8]")
+MACRO = re.compile(r"\.(?P<name>[A-Z]{1,2})(?: +(?P<arguments>.*))?$")
+# Text that alternates between two fonts has no blanks between.
+ALTERNATING = {"BI", "BR", "IB", "IR", "RB", "RI"}
+ESCAPES = {r"\-": "-", r"\(aq": "'", r"\(dq": '"', r"\e": "\\", r"\&": "", r"\ ": " "}
+ESCAPE = re.compile(r"\\(?:f\[?[A-Z]{1,2}\]|f[BIRP]|\(\w\w|.)")
 
 
 def expand(path):
@@ -43,9 +52,69 @@ def expand(path):
     return ["".join(choice) for choice in itertools.product(*parts)]
 
 
+class Block:
+    """A code block: the line it begins with, its language, the file that it shows, its lines."""
+
+    def __init__(self, line, language, shown):
+        self.line = line
+        self.language = language
+        self.shown = shown
+        self.lines = []
+
+    def numbered(self):
+        return enumerate(self.lines, self.line + 1)
+
+
+def read_markdown(text):
+    """The blocks of a Markdown file, and (line, code) of each of its code spans."""
+    blocks, spans = [], []
+    block = shown = None
+    for line, content in enumerate(text.split("\n"), 1):
+        fence = FENCE.match(content)
+        if fence and block is None:
+            block = Block(line, fence["language"], shown)
+            blocks.append(block)
+        elif fence:
+            block = None
+        elif block is not None:
+            block.lines.append(content)
+        else:
+            spans += [(line, span["code"]) for span in SPAN.finditer(content)]
+        mark = SHOWN.fullmatch(content.strip())
+        shown = mark["path"] if mark and block is None else None
+    return blocks, spans
+
+
+def plain(text):
+    """A text of a manual page without its fonts."""
+    return ESCAPE.sub(lambda match: ESCAPES.get(match[0], ""), text)
+
+
+def read_manual(text):
+    """(line, text, is it an example, its bold text) of each line of a manual page."""
+    example = False
+    for line, content in enumerate(text.split("\n"), 1):
+        macro = MACRO.match(content)
+        bold = " ".join(re.findall(r"\\f\[?B\]?(.*?)(?=\\f|$)", content))
+        if content.startswith((".nf", ".EX")):
+            example = True
+        elif content.startswith((".fi", ".EE")):
+            example = False
+        elif macro and macro["name"] not in ("TH", "SH", "SS"):
+            arguments = macro["arguments"] or ""
+            words = [quoted or word for quoted, word in re.findall(r'"([^"]*)"|(\S+)', arguments)]
+            if "B" in macro["name"]:
+                bold = " ".join(words)
+            between = "" if macro["name"] in ALTERNATING else " "
+            yield line, plain(between.join(words)), example, plain(bold)
+        elif not content.startswith("."):
+            yield line, plain(content), example, plain(bold)
+
+
 class Documents:
-    def __init__(self, project):
+    def __init__(self, project, programs):
         self.project = project
+        self.usages = Usages(project, programs)
         tops = sorted({name.split("/")[0] for name in project.files if "/" in name})
         self.path = re.compile(r"(?<![\w/$}.~-])(?:\./)?(?P<path>(?:%s)/[\w./*<>{},-]*[\w*>}/])"
                                % "|".join(map(re.escape, tops)))
@@ -56,11 +125,13 @@ class Documents:
         if project.has("CMakePresets.json"):
             presets = json.loads(project.read("CMakePresets.json"))
             self.presets = {preset["name"] for preset in presets["configurePresets"]}
-        cmake = "\n".join(project.read(name) for name in project.files
-                          if name.endswith(("CMakeLists.txt", ".cmake")))
-        self.programs = set(re.findall(r"(?:add_executable|qv_\w+)\(\s*([\w-]+)", cmake))
-        self.code = "\n".join(project.read(name) for name in project.sources())
-        self.words = set(re.findall(r"\w+", self.code))
+        sources = project.sources(".cpp", ".h", ".c")
+        self.words = {word for name in sources for word in re.findall(r"\w+", project.read(name))}
+        # Names of files count: a class may have several sources.
+        self.words |= {os.path.splitext(os.path.basename(name))[0] for name in project.files}
+
+    def report(self, name, line, text):
+        self.project.report(name, line, "docs", text)
 
     def exists(self, pattern):
         pattern = pattern.rstrip("/")
@@ -68,38 +139,116 @@ class Documents:
                 any(fnmatch.fnmatchcase(name, pattern)
                     for name in itertools.chain(self.project.files, self.folders)))
 
-    def check_code(self, name, line, code):
-        report = self.project.report
+    def check_names(self, name, line, code):
+        """Presets, programs by their paths, classes and files, wherever in a text they stand."""
         for match in PROGRAM.finditer(code):
-            if match["name"] not in self.programs:
-                report(name, line, "docs", f"{match[0]}: no target of the build is called so")
+            if match["name"] not in self.usages.programs:
+                self.report(name, line, f"{match[0]}: no target of the build is called so")
             if re.fullmatch(r"[\w-]+", match["preset"]) and match["preset"] not in self.presets:
-                report(name, line, "docs", f"{match[0]}: no preset is called so")
-            for option in OPTION.finditer(code, match.end()):
-                if f'"{option["option"]}' not in self.code:
-                    report(name, line, "docs", f"{match['name']} knows no {option['option']}")
+                self.report(name, line, f"{match[0]}: no preset is called so")
         for match in PRESET.finditer(code):
             if match["name"] not in self.presets:
-                report(name, line, "docs", f"{match['name']}: no preset is called so")
+                self.report(name, line, f"{match['name']}: no preset is called so")
         for match in CLASS.finditer(code):
             if match[0] not in self.words:
-                report(name, line, "docs", f"{match[0]}: the sources know no such name")
+                self.report(name, line, f"{match[0]}: the sources know no such name")
         for match in self.path.finditer(code):
             for pattern in expand(match["path"]):
                 if not self.exists(pattern):
-                    report(name, line, "docs", f"{match['path']}: no such file")
-            self.check_options(name, line, code, match)
+                    self.report(name, line, f"{match['path']}: no such file")
 
-    def check_options(self, name, line, code, match):
-        """Options that follow a script's name, up to the next command."""
-        script = match["path"]
-        if not script.startswith("scripts/") or not self.project.has(script):
-            return
-        arguments = re.split(r"[;|&]| -- ", code[match.end():])[0]
-        text = self.project.read(script)
-        for option in OPTION.finditer(arguments):
-            if option["option"] not in text:
-                self.project.report(name, line, "docs", f"{script} knows no {option['option']}")
+    def usage_of(self, word):
+        """The usage of a command of the project; None for others."""
+        path = os.path.normpath(word)
+        if re.fullmatch(r"scripts/[\w-]+|\.ci/\w+", path):
+            return self.usages.script(path) if self.project.has(path) else None
+        program = os.path.basename(path)
+        return self.usages.program(program) if program in self.usages.programs else None
+
+    def check_line(self, name, line, code, is_shell):
+        """The commands of a line. Where it need not be shell, those that begin with one of ours."""
+        try:
+            commands = list(commands_in(code))
+        except ValueError:  # a quotation without an end: no shell
+            commands = []
+        if not is_shell:
+            commands = [words for words in commands[:1] if words and self.usage_of(words[0])]
+        for words in commands:
+            self.check_command(name, line, words)
+
+    def check_command(self, name, line, words):
+        if words and "/" not in words[0] and words[0] not in OTHERS and not self.usage_of(words[0]):
+            self.report(name, line, f"{words[0]}: no command is called so")
+        # A command may be handed to another one, with its arguments.
+        for place, word in enumerate(words):
+            usage = self.usage_of(word) if place == 0 or "/" in word else None
+            if usage:
+                for fault in faults(usage, words[place + 1:]):
+                    self.report(name, line, f"{word} knows no {fault}")
+                return
+
+    def check_shell(self, name, block):
+        """Lines of shell; one that ends in the middle of a command goes on in the next."""
+        begun, text = None, ""
+        for line, content in block.numbered():
+            begun = begun or line
+            text += content
+            if text.endswith("\\"):
+                text = text[:-1]
+                continue
+            try:
+                shlex.split(text, comments=True)
+            except ValueError:
+                text += "\n"
+                continue
+            self.check_line(name, begun, text, True)
+            begun, text = None, ""
+        if begun:
+            self.report(name, begun, "a command without an end")
+
+    def check_shown(self, name, block):
+        if not self.project.has(block.shown):
+            self.report(name, block.line, f"{block.shown}: no such file")
+        elif "\n".join(block.lines) + "\n" != self.project.read(block.shown):
+            self.report(name, block.line, f"is not what {block.shown} holds")
+
+    def check_markdown(self, name):
+        text = self.project.read(name)
+        blocks, spans = read_markdown(text)
+        for line, code in spans:
+            self.check_names(name, line, code)
+            self.check_line(name, line, code, False)
+        for block in blocks:
+            for line, code in block.numbered():
+                self.check_names(name, line, code)
+                if block.language != "sh":
+                    self.check_line(name, line, code, False)
+            if block.language == "sh":
+                self.check_shell(name, block)
+            if block.shown:
+                self.check_shown(name, block)
+        for line, content in enumerate(text.split("\n"), 1):
+            self.check_links(name, line, content)
+
+    def check_manual(self, name, program):
+        known = None
+        if program in self.usages.programs:
+            complete = self.usages.all_options(program)
+            known = complete if complete is not None else self.usages.program(program).options
+        named = set()
+        for line, text, example, bold in read_manual(self.project.read(name)):
+            self.check_names(name, line, text)
+            if example:
+                self.check_line(name, line, text, False)
+            elif known is not None:
+                options = OPTION.findall(bold)
+                named.update(options)
+                for option in options:
+                    if option not in known:
+                        self.report(name, line, f"{program} knows no {option}")
+        if program in self.usages.asked:
+            for option in sorted(known - named):
+                self.report(name, 1, f"says nothing of {option}, which {program} knows")
 
     def check_links(self, name, line, content):
         for match in LINK.finditer(content):
@@ -108,20 +257,24 @@ class Documents:
                 continue
             path = os.path.normpath(os.path.join(os.path.dirname(name), target))
             if not self.exists(path):
-                self.project.report(name, line, "docs", f"link to {target}: no such file")
+                self.report(name, line, f"link to {target}: no such file")
+
+
+def add_arguments(parser):
+    parser.add_argument("--programs", metavar="DIR", help="ask the programs that are built in DIR")
 
 
 def main():
-    project, _ = open_project(__doc__)
-    documents = Documents(project)
+    project, arguments = open_project(__doc__, add_arguments)
+    documents = Documents(project, arguments.programs)
     for name in project.files:
-        if not name.endswith(".md") or os.path.basename(name) in SKIPPED:
-            continue
-        text = project.read(name)
-        for line, code in code_of(text):
-            documents.check_code(name, line, code)
-        for line, content in enumerate(text.split("\n"), 1):
-            documents.check_links(name, line, content)
+        manual = MANUAL.fullmatch(name)
+        if name.endswith(".md") and os.path.basename(name) not in SKIPPED:
+            documents.check_markdown(name)
+        elif manual:
+            documents.check_manual(name, manual["program"])
+    if arguments.programs and not documents.usages.asked:
+        sys.exit(f"{arguments.programs}: none of the programs that documents name is built there")
     project.finish()
 
 

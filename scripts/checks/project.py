@@ -95,6 +95,15 @@ def without_comments(text):
     return _TOKEN.sub(lambda m: _blank(m[0]) if m["comment"] else m[0], text)
 
 
+def literals(text):
+    """The texts of C++'s string literals, as they are written."""
+    for match in _TOKEN.finditer(text):
+        if match["string"]:
+            yield match["string"][1:-1]
+        elif match[0].startswith("R"):
+            yield match[0].split("(", 1)[1].rsplit(")", 1)[0]
+
+
 def without_comments_and_strings(text):
     """C++ with comments and the contents of literals blanked, but for include lines."""
     lines = without_comments(text)

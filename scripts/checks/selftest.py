@@ -31,6 +31,29 @@ SCRIPT = """#!/usr/bin/env bash
 set -euo pipefail
 echo "usage: scripts/tool [--loud]"
 """
+# A program with subcommands: its sources, what it says when it is built, its manual page.
+TOOL_SOURCE = """#include <CLI/CLI.hpp>
+
+const char* const kWords[] = {"--help,-h", "--json", "look", "--all"};
+CLI::App app;
+"""
+TOOL = """#!/bin/sh
+case $1 in
+  look) printf 'usage: thingctl look\\n\\nOptions:\\n  --all  everything\\n' ;;
+  *) printf 'Options:\\n  -h,--help\\n  --json\\n\\nSubcommands:\\n  look   looks at it, and\\n         goes on\\n' ;;
+esac
+"""
+PAGE = """.TH THINGCTL 1
+.SH OPTIONS
+.TP
+.BR \\-h ", " \\-\\-help
+Not \\fB\\-\\-json\\fR.
+.TP
+.B \\-\\-all
+.nf
+thingctl look \\-\\-all
+.fi
+"""
 PRESETS = '{"configurePresets": [{"name": "dev"}]}\n'
 
 # A project without faults; each fault below is laid over it.
@@ -50,11 +73,17 @@ GOOD = {
         '#include "platform/linux/bus/QVBusThing.h"\n\nint main(int argc, char** argv) {\n'
         '  return argc > 1 && argv[1][0] == \'-\' ? 1 : 0;\n}\n',
     "tests/unit/QVThingTest.cpp": '#include "platform/QVThing.h"\n\n#include <gtest/gtest.h>\n',
+    "tools/CMakeLists.txt": "add_executable(thingctl main.cpp)\n",
+    "tools/main.cpp": TOOL_SOURCE,
+    "tools/thingctl.1": PAGE,
+    "build/dev/bin/thingctl": TOOL,
     "scripts/tool": SCRIPT,
     "README.md":
         "# Thing\n\nSee [the header](platform/QVThing.h), `platform/*.h`, `QVThing` and\n"
-        "`platform/linux/bus/QVBusThing.{h,cpp}`.\n\n```\ncmake --preset dev\nscripts/tool --loud\n"
-        "build/dev/bin/thingd\n```\n",
+        "`platform/linux/bus/QVBusThing.{h,cpp}`. `thingctl COMMAND --json`.\n\n```sh\n"
+        "cmake --preset dev\nscripts/tool --loud\nKEY=value build/dev/bin/thingd 2>/dev/null\n"
+        "echo 'one\ntwo' | thingctl --json look \\\n  --all -- --gone\n```\n\n<!-- tools/CMakeLists.txt -->\n"
+        "```cmake\nadd_executable(thingctl main.cpp)\n```\n",
 }
 
 
@@ -150,6 +179,22 @@ FAULTS = [
         "Run `build/dev/bin/goned`.", "Run `build/slow/bin/thingd`.", "Run `build/dev/bin/thingd --gone`.",
         "See `platform/linux/bus/QVBusThing.{h,c}`.")],
     fault("docs", "docs", "README.md:2", "README.md", "```\nscripts/gone\n```\n"),
+    *[fault("docs", "docs", "README.md:3", "README.md", f"# Thing\n```{text}\n```\n") for text in (
+        "sh\ngonectl look", "sh\ntrue; echo | thingctl look", "sh\nthingctl gone",
+        "sh\nthingctl look --gone", "sh\nthingctl look -g", "\nthingctl --gone",
+        "sh\nsudo A=b thingctl --gone >/dev/null", "sh\necho 'no end", "sh\nscripts/tool \\\n  --quiet",
+        "sh\necho $(thingctl gone)",
+        "sh\nthingctl $(echo a) --gone")],
+    *[fault("docs", "docs", "README.md:3", "README.md", f"# Thing\n<!-- {file} -->\n```\nother\n```\n")
+      for file in ("tools/CMakeLists.txt", "tools/gone.cpp")],
+    *[fault("docs", "docs", "tools/thingctl.1:2", "tools/thingctl.1", f".TH THINGCTL 1\n{text}\n.fi\n")
+      for text in (".B \\-\\-gone", ".BI \\-\\-gone= N", "With \\fB\\-\\-gone\\fR.", "See platform/gone.h.")],
+    fault("docs", "docs", "tools/thingctl.1:3", "tools/thingctl.1",
+          ".TH THINGCTL 1\n.nf\nthingctl look \\-\\-gone\n.fi\n"),
+    # What a built program says is more exact than its sources.
+    fault("docs --programs build/dev/bin", "docs", "README.md:1", "README.md", "`thingctl --all look`\n"),
+    fault("docs --programs build/dev/bin", "docs", "tools/thingctl.1:1", "tools/thingctl.1",
+          PAGE.replace(".B \\-\\-all\n", "")),
 ]
 
 TIDY_FAULTS = [
@@ -188,8 +233,10 @@ class Sandbox:
              "command": f"c++ -std=c++20 -I{self.root} -c {name}"} for name in sources])})
 
     def run(self, check):
-        answer = subprocess.run([sys.executable, os.path.join(CHECKS, f"{check}.py"), "--root", self.root],
-                                capture_output=True, text=True)
+        name, *arguments = check.split()
+        answer = subprocess.run(
+            [sys.executable, os.path.join(CHECKS, f"{name}.py"), "--root", self.root, *arguments],
+            cwd=self.root, capture_output=True, text=True)
         return answer.returncode, answer.stdout, answer.stderr
 
     def __enter__(self):
@@ -243,7 +290,8 @@ class SelfTest:
 
 def main():
     test = SelfTest()
-    for check in ("format", "layering", "words", "files", "programs", "docs"):
+    for check in ("format", "layering", "words", "files", "programs", "docs",
+                  "docs --programs build/dev/bin"):
         test.passes(check)
     faults = list(FAULTS)
     if "--fast" not in sys.argv[1:]:

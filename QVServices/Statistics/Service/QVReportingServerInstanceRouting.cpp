@@ -3,6 +3,7 @@
 #include "QVServices/Statistics/QVReportingCountwiseBridge.h"
 #include "QVServices/Statistics/QVReportingJoulewellUtility.h"
 #include "QVServices/Statistics/QVReportingVocabulary.h"
+#include "QVServices/Statistics/Service/QVReportingPayloads.h"
 #include "QVServices/Statistics/Service/QVReportingServer.h"
 #include "QVServices/Statistics/Service/QVReportingServerInstance.h"
 #include "platform/QVPlatform.h"
@@ -91,6 +92,7 @@ void QVReportingServerInstance::route(const QVDictionary& message, uint32_t cate
 void QVReportingServerInstance::routeToListed(const QVDictionary& message, uint32_t category,
                                               uint16_t type,
                                               const std::vector<int64_t>& reporterIDs) const {
+  const QVDictionary payload = QVReportingNormalisedPayload(message);
   for (const int64_t reporterID : reporterIDs) {
     if (reporterID == 0) continue;
     const auto session = findReportingSessionForID(reporterID, true);
@@ -98,7 +100,7 @@ void QVReportingServerInstance::routeToListed(const QVDictionary& message, uint3
     // Here the sinks come first, on the broadcast path the session does; readers of the event
     // stores rely on both orders.
     handToSinks(message, category, type, *session);
-    session->sendMessage(message, category, type, {});
+    session->sendMessage(message, payload, category, type);
   }
 }
 
@@ -123,8 +125,9 @@ void QVReportingServerInstance::routeToAllStarted(
         message, category, type, kQVReportingServiceTypeStandalone, delegate.getDefaults(), {});
     return;
   }
+  const QVDictionary payload = QVReportingNormalisedPayload(message);
   for (const auto& session : active) {
-    session->sendMessage(message, category, type, {});
+    session->sendMessage(message, payload, category, type);
     handToSinks(message, category, type, *session);
   }
 }

@@ -71,6 +71,11 @@ class QVReportingSession final : public QVReportingSessionInformation,
   void sendMessage(const QVDictionary& message, uint32_t category, uint16_t type, bool sync,
                    SendReply reply);
 
+  // The same for one session of many: `payload` is the message's normalised payload, made once for
+  // all of them.
+  void sendMessage(const QVDictionary& message, const QVDictionary& payload, uint32_t category,
+                   uint16_t type);
+
   // Sends a message that belongs to no session, on the shared background queue, for alarms after a
   // random delay of up to 59 s. `userInfo` is ignored. The reply (may be empty) gets the outcome.
   static void sendSingleMessage(const QVDictionary& message, uint32_t category, uint16_t type,

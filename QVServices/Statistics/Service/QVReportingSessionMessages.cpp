@@ -90,15 +90,20 @@ void QVReportingSession::sendMessage(const QVDictionary& message, uint32_t categ
 
 void QVReportingSession::sendMessage(const QVDictionary& message, uint32_t category, uint16_t type,
                                      [[maybe_unused]] bool sync, SendReply reply) {
+  sendMessage(message, QVReportingNormalisedPayload(message), category, type);
+  if (reply) reply(std::nullopt);
+}
+
+void QVReportingSession::sendMessage(const QVDictionary& message, const QVDictionary& payload,
+                                     uint32_t category, uint16_t type) {
   log().verbose(scope(), kSendFunction, "sending message for session owned by ", reporterID_);
-  Message outgoing{QVReportingNormalisedPayload(message), message, category, type, false};
+  Message outgoing{payload, message, category, type, false};
   record(outgoing.payload, nextIdentifier(category, type));
   platform().tracePoints->mark(kTraceMessageSent);
   outgoing.started = started_;
   beaconQueue_->async([self = shared_from_this(), outgoing = std::move(outgoing)] {
     self->sendOnBeaconQueue(outgoing);
   });
-  if (reply) reply(std::nullopt);
 }
 
 void QVReportingSession::makeEmptyPayloadArrays() {

@@ -99,6 +99,27 @@ TEST_F(QVReportingRoutingTest, SendsTwiceToASessionThatIsListedTwice) {
   EXPECT_THAT(takeBeaconStory(), SizeIs(2));
 }
 
+TEST_F(QVReportingRoutingTest, ReplacesBlanksOnceForAllSessions) {
+  QVTestClient& client = clientWithStartedSession(42, 7);
+  client.create(8);
+  client.start(8);
+  runUntilIdle();
+  for (const bool listed : {true, false}) {
+    platform_.beacon().forgetEvents();
+    const QVDictionary message{{"buffer size", 512}};
+    if (listed) {
+      client.send(message, {7, 8});
+    } else {
+      client.sendToAll(message);
+    }
+    runUntilIdle();
+    const auto events = platform_.beacon().events();
+    ASSERT_THAT(events, SizeIs(2));
+    EXPECT_EQ(QVText(events[0].payload), R"({"buffer_size":512})");
+    EXPECT_EQ(events[0].payload.begin(), events[1].payload.begin()) << "the same block";
+  }
+}
+
 TEST_F(QVReportingRoutingTest, ReachesAListedSessionThatIsNotStarted) {
   QVTestClient& client = clientWithSession(42, 7, 3);
   client.send({{"a", 1}}, {7});
