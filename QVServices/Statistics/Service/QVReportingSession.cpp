@@ -61,10 +61,10 @@ std::shared_ptr<QVReportingSession> QVReportingSession::initWithID(
   return session;
 }
 
-QVReportingSession::QVReportingSession(int64_t reporterID, std::vector<int32_t> processIdentifiers,
+QVReportingSession::QVReportingSession(int64_t reporterID, std::vector<int32_t> processes,
                                        std::size_t maximumBytes)
     : reporterID_(reporterID),
-      processIdentifiers_(std::move(processIdentifiers)),
+      processIdentifiers_(std::move(processes)),
       userInfo_(std::make_shared<QVReportingUserInfo>()),
       beaconQueue_(platform().queues->makeSerialQueue("net.quillon.quietvox.session.beacon",
                                                       QVQualityOfService::utility, 0)),

@@ -120,8 +120,7 @@ class QVReportingSession final : public QVReportingSessionInformation,
   struct Message;
   struct MessageIdentifier;
 
-  QVReportingSession(int64_t reporterID, std::vector<int32_t> processIdentifiers,
-                     std::size_t maximumBytes);
+  QVReportingSession(int64_t reporterID, std::vector<int32_t> processes, std::size_t maximumBytes);
 
   void addUserInformation(const QVDictionary& entries, const QVLogSite& site);
   void setUpBeaconSession(std::optional<std::string_view> name, uint16_t type, bool startFlag);
