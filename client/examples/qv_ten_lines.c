@@ -9,7 +9,7 @@ int main(void) {
   quietvox_session_start(session);
   QuietVoxPayload* const message = quietvox_payload_new();
   quietvox_payload_set_int(message, "frames", 48000);
-  quietvox_payload_set_text(message, "route", "Speaker");
+  quietvox_payload_set_string(message, "route", "Speaker");
   quietvox_session_send(session, message, QUIETVOX_COMPONENT_SESSION | QUIETVOX_KIND_PLAYBACK,
                         QUIETVOX_TYPE_START);
   quietvox_payload_free(message);
