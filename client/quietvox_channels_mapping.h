@@ -53,8 +53,11 @@ static inline int quietvox_channels_check(const char* const* names, size_t count
 static inline int quietvox_channels_map(QuietVoxChannels* channels, int descriptor) {
   struct stat status;
   void* mapped;
-  // Takes the space now: later, a full disk would end the program.
-  const int full = posix_fallocate(descriptor, 0, (off_t)channels->bytes);
+  int full;
+  // Takes the space now: later, a full disk would end the program. A signal may cut it short.
+  do {
+    full = posix_fallocate(descriptor, 0, (off_t)channels->bytes);
+  } while (full == EINTR);
   if (full != 0) return -full;
   if (fstat(descriptor, &status) != 0) return -errno;
   mapped = mmap(NULL, channels->bytes, PROT_READ | PROT_WRITE, MAP_SHARED, descriptor, 0);

@@ -31,7 +31,8 @@ enum class QVQualityOfService : uint32_t {
 // that ran it. Work that was enqueued is run even when the last handle to the queue goes before:
 // the handle may go on a thread of the queue itself, and nothing joins there.
 // Failures: an exception that escapes an item is caught, logged once at error level on the default
-// log, and the queue goes on.
+// log, and the queue goes on. Enqueueing throws where there is no memory for it; a serial queue may
+// run the item all the same, with the next one.
 class QVWorkQueue {
  public:
   virtual ~QVWorkQueue() = default;

@@ -30,7 +30,7 @@ void QVAsioRunLoop::run() {
       waits_->run();
       return;
     } catch (...) {
-      QVLogException(log_, __func__, "run loop", threadName_);
+      QVLogException(log_, "-[QVAsioRunLoop run]", "run loop", threadName_);
     }
   }
 }

@@ -27,7 +27,7 @@ class QVAsioRunLoopThreads::Handle final : public QVRunLoopThread {
       try {
         body(loop);
       } catch (...) {
-        QVLogException(log, __func__, "thread", name_);
+        QVLogException(log, "-[QVAsioRunLoopThreads startThread:body:]", "thread", name_);
       }
     }
     body = nullptr;
@@ -63,7 +63,8 @@ std::shared_ptr<QVRunLoopThread> QVAsioRunLoopThreads::startThread(std::string_v
       shared->run(std::move(body), log);
     });
   } catch (const std::system_error& failure) {
-    log_.error(nullptr, __func__, "no thread for ", name, ": ", failure.what());
+    log_.error(nullptr, "-[QVAsioRunLoopThreads startThread:body:]", "no thread for ", name, ": ",
+               failure.what());
     threads_.pop_back();
     return nullptr;
   }

@@ -1,5 +1,6 @@
 #include "platform/linux/QVAsioSerialQueue.h"
 
+#include "platform/linux/QVLogException.h"
 #include "platform/linux/QVRunWorkItem.h"
 #include "platform/linux/QVWakeUpBatch.h"
 
@@ -23,10 +24,15 @@ void QVAsioSerialQueue::async(QVWorkItem item) {
     enqueued_.push_back(std::move(item));
     if (std::exchange(isScheduled_, true)) return;
   }
-  if (auto* const wakeUps = QVWakeUpBatch::current()) {
-    wakeUps->add([self = shared_from_this()] { self->submit(); });
-  } else {
-    submit();
+  try {
+    if (auto* const wakeUps = QVWakeUpBatch::current()) {
+      wakeUps->add([self = shared_from_this()] { self->submitLater(); });
+    } else {
+      submit();
+    }
+  } catch (...) {
+    unschedule();
+    throw;
   }
 }
 
@@ -34,8 +40,23 @@ void QVAsioSerialQueue::asyncAfter(QVDuration delay, QVWorkItem item) {
   timers_.enqueueAfter(delay, shared_from_this(), std::move(item));
 }
 
+// At the end of a batch of wake-ups there is nobody left to be told of a failure.
+void QVAsioSerialQueue::submitLater() noexcept {
+  try {
+    submit();
+  } catch (...) {
+    unschedule();
+    QVLogException(log_, "-[QVAsioSerialQueue submit]", "work queue", label_);
+  }
+}
+
+void QVAsioSerialQueue::unschedule() noexcept {
+  const QVMutexLock lock(mutex_);
+  isScheduled_ = false;
+}
+
 void QVAsioSerialQueue::submit() {
-  QVWorkItem task = [self = shared_from_this()] { self->runBatch(); };
+  QVWorkItem task = [self = shared_from_this()] { self->run(); };
   if (executor_.submit(task)) return;
   // Destroyed after the lock, because an item may hold whatever enqueues again on its way out.
   std::vector<QVWorkItem> refused;
@@ -44,7 +65,21 @@ void QVAsioSerialQueue::submit() {
   isScheduled_ = false;
 }
 
-void QVAsioSerialQueue::runBatch() {
+void QVAsioSerialQueue::run() {
+  while (runBatch()) {
+    // Behind the executor's other tasks, so that a busy queue does not keep a thread to itself.
+    try {
+      submit();
+      return;
+    } catch (...) {
+      // For want of memory: then the thread is kept.
+      QVLogException(log_, "-[QVAsioSerialQueue run]", "work queue", label_);
+    }
+  }
+}
+
+// Are there more items?
+bool QVAsioSerialQueue::runBatch() {
   {
     const QVMutexLock lock(mutex_);
     batch_.swap(enqueued_);
@@ -60,18 +95,13 @@ void QVAsioSerialQueue::runBatch() {
     }
     batch_.clear();
   }
-  {
-    const QVMutexLock lock(mutex_);
-    if (enqueued_.empty()) {
-      isScheduled_ = false;
-      // Still under the lock: the next task may begin right after it.
-      keepOrFree(batch_);
-      keepOrFree(enqueued_);
-      return;
-    }
-  }
-  // Behind the executor's other tasks, so that a busy queue does not keep a thread to itself.
-  submit();
+  const QVMutexLock lock(mutex_);
+  if (!enqueued_.empty()) return true;
+  isScheduled_ = false;
+  // Still under the lock: the next task may begin right after it.
+  keepOrFree(batch_);
+  keepOrFree(enqueued_);
+  return false;
 }
 
 void QVAsioSerialQueue::keepOrFree(std::vector<QVWorkItem>& items) const {

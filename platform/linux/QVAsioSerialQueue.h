@@ -20,6 +20,9 @@
 // Ownership: a submitted task holds the queue, so a handle may go at any time. Executor, timers and
 // log outlive every use but the destruction of the queue; once the executor is closed, items are
 // destroyed at once by whoever enqueues them.
+// Failures: async() throws std::bad_alloc where there is no memory for the item or for the task. In
+// the second case the items stay, and the next one submits the queue again; within a batch of
+// wake-ups that is one error line.
 // States: idle (buffer empty) -> scheduled (submitted or running) -> idle.
 class QVAsioSerialQueue final : public QVWorkQueue,
                                 public std::enable_shared_from_this<QVAsioSerialQueue> {
@@ -34,7 +37,10 @@ class QVAsioSerialQueue final : public QVWorkQueue,
 
  private:
   void submit();
-  void runBatch();
+  void submitLater() noexcept;
+  void unschedule() noexcept;
+  void run();
+  bool runBatch();
   void keepOrFree(std::vector<QVWorkItem>& items) const;
 
   const std::string label_;

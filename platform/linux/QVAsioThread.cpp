@@ -33,10 +33,15 @@ bool QVAsioThread::submit(QVWorkItem& task) {
   const QVMutexLock lock(mutex_);
   if (guard_ == nullptr) return false;
   ledger_.enter();
-  asio::post(*context_, [this, work = std::move(task)]() mutable {
-    QVRunWorkItem(work, name_, log_);
+  try {
+    asio::post(*context_, [this, work = std::move(task)]() mutable {
+      QVRunWorkItem(work, name_, log_);
+      ledger_.leave();
+    });
+  } catch (...) {
     ledger_.leave();
-  });
+    throw;
+  }
   return true;
 }
 

@@ -24,9 +24,6 @@ constexpr int kNiceness = 5;
 
 constexpr const char* kThreadName = "qv-watch";
 
-// How long to wait for memory where there was none.
-constexpr int kRetryMilliseconds = 1000;
-
 // Events read at a time: some hundred with short names, one at least with the longest.
 constexpr std::size_t kEventBytes = 4096;
 static_assert(kEventBytes >= sizeof(inotify_event) + NAME_MAX + 1);
@@ -58,6 +55,7 @@ struct QVDirectoryWatcher::Watch {
 struct QVDirectoryWatcher::News {
   std::vector<std::shared_ptr<Watch>> changed;
   std::vector<std::pair<QVLogLevel, std::string>> lines;
+  bool lacksDirectories = false;
 
   void add(const std::shared_ptr<Watch>& watch) {
     if (std::ranges::find(changed, watch) == changed.end()) changed.push_back(watch);
@@ -65,9 +63,14 @@ struct QVDirectoryWatcher::News {
   void add(const Directory& directory) {
     for (const auto& watch : directory.watches) add(watch);
   }
+  void addReturn(const std::string& path) {
+    lines.emplace_back(QVLogLevel::standard,
+                       QVText(path, " was deleted or moved away: it is there again"));
+  }
 };
 
-QVDirectoryWatcher::QVDirectoryWatcher(QVLog& log) : log_(log) {}
+QVDirectoryWatcher::QVDirectoryWatcher(QVLog& log, std::chrono::milliseconds firstRetry)
+    : log_(log), firstRetry_(firstRetry) {}
 
 QVDirectoryWatcher::~QVDirectoryWatcher() {
   std::thread thread;
@@ -76,7 +79,8 @@ QVDirectoryWatcher::~QVDirectoryWatcher() {
     thread.swap(thread_);
   }
   if (thread.joinable()) {
-    end_.ring();
+    isEnding_ = true;
+    bell_.ring();
     thread.join();
   }
   if (inotify_ >= 0) close(inotify_);
@@ -87,10 +91,14 @@ QVDirectoryWatcher::Token QVDirectoryWatcher::watch(File file, Callback callback
   const QVMutexLock lock(mutex_);
   if (!start(reason)) return kNoToken;
   Directory& directory = directories_[file.directory];
-  if (directory.descriptor < 0) directory.descriptor = follow(file.directory, reason);
   if (directory.descriptor < 0) {
-    if (directory.watches.empty()) directories_.erase(file.directory);
-    return kNoToken;
+    directory.descriptor = follow(file.directory, reason);
+    if (directory.descriptor < 0) {
+      if (directory.watches.empty()) directories_.erase(file.directory);
+      return kNoToken;
+    }
+    directory.isRegained = !directory.watches.empty();
+    if (directory.isRegained) bell_.ring();
   }
   directory.watches.push_back(std::make_shared<Watch>(++lastToken_, std::move(file.name),
                                                       file.kind == Kind::posts ? kPosts : kContents,
@@ -148,13 +156,21 @@ int QVDirectoryWatcher::follow(const std::string& directory, std::string& reason
 void QVDirectoryWatcher::run() {
   QVPrepareThread(kThreadName, kNiceness);
   bool isBehind = false;
+  bool lacksDirectories = false;
+  std::chrono::milliseconds pause = firstRetry_;
   for (;;) {
-    std::array<pollfd, 2> waits{{{end_.descriptor(), POLLIN, 0}, {inotify_, POLLIN, 0}}};
-    poll(waits.data(), waits.size(), isBehind ? kRetryMilliseconds : -1);
-    if (waits[0].revents != 0) return;
+    std::array<pollfd, 2> waits{{{bell_.descriptor(), POLLIN, 0}, {inotify_, POLLIN, 0}}};
+    if (!lacksDirectories) pause = firstRetry_;
+    const auto limit = isBehind ? firstRetry_ : pause;
+    const int count = poll(waits.data(), waits.size(),
+                           isBehind || lacksDirectories ? static_cast<int>(limit.count()) : -1);
+    if (count == 0) pause = std::min<std::chrono::milliseconds>(2 * pause, kLongestRetry);
+    bell_.hush();
+    if (isEnding_) return;
     try {
-      tell(readNews(isBehind));
-      isBehind = false;
+      const News news = readNews(isBehind);
+      lacksDirectories = news.lacksDirectories;
+      isBehind = !tell(news);
     } catch (...) {
       // For want of memory: what was read is lost, so all are told of once there is some.
       QVLogException(log_, "-[QVDirectoryWatcher run]", "thread", kThreadName);
@@ -163,18 +179,22 @@ void QVDirectoryWatcher::run() {
   }
 }
 
-void QVDirectoryWatcher::tell(const News& news) {
+// Have all callbacks heard of it?
+bool QVDirectoryWatcher::tell(const News& news) {
   for (const auto& [level, text] : news.lines) {
     log_.write(nullptr, level, "-[QVDirectoryWatcher followAnew:]", text);
   }
+  bool isTold = true;
   for (const auto& watch : news.changed) {
     if (watch->isOver) continue;
     try {
       watch->callback();
     } catch (...) {
       QVLogException(log_, "-[QVDirectoryWatcher tell:]", "the callback for", watch->name);
+      isTold = false;
     }
   }
+  return isTold;
 }
 
 QVDirectoryWatcher::News QVDirectoryWatcher::readNews(bool isBehind) {
@@ -183,6 +203,7 @@ QVDirectoryWatcher::News QVDirectoryWatcher::readNews(bool isBehind) {
   News news;
   const QVMutexLock lock(mutex_);
   if (isBehind) addAll(news);
+  regain(news);
   for (ssize_t offset = 0; offset < length;) {
     inotify_event event;
     const char* const begin = buffer.data() + offset;
@@ -191,6 +212,8 @@ QVDirectoryWatcher::News QVDirectoryWatcher::readNews(bool isBehind) {
     take(event.wd, event.mask, {name, strnlen(name, event.len)}, news);
     offset += static_cast<ssize_t>(sizeof event + event.len);
   }
+  news.lacksDirectories = std::ranges::any_of(
+      directories_, [](const auto& entry) { return entry.second.descriptor < 0; });
   return news;
 }
 
@@ -220,14 +243,29 @@ void QVDirectoryWatcher::addAll(News& news) const {
 void QVDirectoryWatcher::followAnew(const std::string& path, Directory& directory, News& news) {
   // Refused where the directory is gone, which is as good.
   inotify_rm_watch(inotify_, directory.descriptor);
+  directory.descriptor = -1;
   std::string reason;
   directory.descriptor = follow(path, reason);
   if (directory.descriptor >= 0) {
-    news.lines.emplace_back(QVLogLevel::standard,
-                            QVText(path, " was deleted or moved away: it is there again"));
+    news.addReturn(path);
   } else {
     news.lines.emplace_back(QVLogLevel::error,
                             QVText("cannot watch a directory any more: ", reason));
   }
   news.add(directory);
+}
+
+// Follows the directories that could not be followed before, where they can be by now.
+void QVDirectoryWatcher::regain(News& news) {
+  for (auto& [path, directory] : directories_) {
+    std::string reason;
+    if (directory.descriptor < 0) {
+      directory.descriptor = follow(path, reason);
+      directory.isRegained = directory.descriptor >= 0;
+    }
+    if (!directory.isRegained) continue;
+    news.addReturn(path);
+    news.add(directory);
+    directory.isRegained = false;
+  }
 }

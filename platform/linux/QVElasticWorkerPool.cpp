@@ -4,7 +4,7 @@
 #include "platform/linux/QVThreads.h"
 
 #include <algorithm>
-#include <system_error>
+#include <exception>
 #include <utility>
 
 namespace {
@@ -28,8 +28,9 @@ QVElasticWorkerPool::~QVElasticWorkerPool() {
 bool QVElasticWorkerPool::submit(QVWorkItem& task) {
   const QVMutexLock lock(mutex_);
   if (closed_) return false;
-  ledger_.enter();
+  // From here on the worker that takes it accounts for it; nobody does before the lock is dropped.
   ready_.push_back(std::move(task));
+  ledger_.enter();
   sendForWorker();
   return true;
 }
@@ -67,10 +68,18 @@ void QVElasticWorkerPool::addWorker() {
     ++workerCount_;
     workerIsComing_ = true;
     lacksThreads_ = false;
-  } catch (const std::system_error& error) {
-    // The log takes no lock of ours and never waits.
-    if (!lacksThreads_) log_.error(nullptr, __func__, "no thread for ", name_, ": ", error.what());
-    lacksThreads_ = true;
+  } catch (const std::exception& failure) {
+    if (!lacksThreads_) lacksThreads_ = sayWhyThereIsNoThread(failure.what());
+  }
+}
+
+// False where there is no memory even for that. The log takes no lock of ours and never waits.
+bool QVElasticWorkerPool::sayWhyThereIsNoThread(std::string_view reason) const noexcept {
+  try {
+    log_.error(nullptr, "-[QVElasticWorkerPool addWorker]", "no thread for ", name_, ": ", reason);
+    return true;
+  } catch (const std::exception&) {
+    return false;
   }
 }
 

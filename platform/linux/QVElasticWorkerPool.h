@@ -10,6 +10,7 @@
 #include <cstddef>
 #include <deque>
 #include <string>
+#include <string_view>
 #include <thread>
 #include <vector>
 
@@ -64,6 +65,7 @@ class QVElasticWorkerPool final : public QVWorkExecutor {
 
   void sendForWorker() QV_REQUIRES(mutex_);
   void addWorker() QV_REQUIRES(mutex_);
+  bool sayWhyThereIsNoThread(std::string_view reason) const noexcept;
   void work();
   bool rest(QVMutexLock& lock) QV_REQUIRES(mutex_);
   std::thread retire() QV_REQUIRES(mutex_);

@@ -34,7 +34,13 @@ struct QVInotifyNotifications::Registration {
   static void post(const std::shared_ptr<Registration>& self) {
     const QVMutexLock lock(self->mutex);
     if (self->isOver || std::exchange(self->isEnqueued, true)) return;
-    self->queue->async([self] { self->deliver(); });
+    try {
+      self->queue->async([self] { self->deliver(); });
+    } catch (...) {
+      // The watcher tells of the post again.
+      self->isEnqueued = false;
+      throw;
+    }
   }
 
   void deliver() {

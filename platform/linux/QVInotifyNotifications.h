@@ -20,7 +20,8 @@
 // Threads: as QVNotifications; posts arrive on the watcher's thread. Nothing is enqueued once the
 // object is destroyed; deliveries that are enqueued may outlive it. Log and watcher outlive it.
 // Failures: a name that can name no file is kStatusInvalidName, a directory that cannot be made or
-// watched kStatusFailed; one error line says which and why.
+// watched kStatusFailed; one error line says which and why. A delivery that cannot be enqueued is
+// an error line of the watcher, and is tried again as it says.
 class QVInotifyNotifications final : public QVNotifications {
  public:
   QVInotifyNotifications(QVLog& log, std::shared_ptr<QVDirectoryWatcher> watcher,

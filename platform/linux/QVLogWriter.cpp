@@ -99,7 +99,7 @@ void QVLogWriter::writeBatch(std::vector<QVLogLine>& batch, std::size_t lostCoun
   if (lostCount > 0) {
     QVLogLine lost;
     lost.level = QVLogLevel::error;
-    lost.function = __func__;
+    lost.function = "-[QVLogWriter writeBatch:lostCount:]";
     lost.file = "QVLogWriter.cpp";
     lost.line = __LINE__;
     lost.text = QVText(lostCount, " log lines were lost, the log's queue was full");

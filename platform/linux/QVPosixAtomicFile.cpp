@@ -42,8 +42,8 @@ bool sync(int descriptor) {
 
 }  // namespace
 
-QVPosixAtomicFile::QVPosixAtomicFile(const std::string& path, int directory)
-    : path_(path), directory_(directory) {
+QVPosixAtomicFile::QVPosixAtomicFile(const std::string& path, QVDescriptor directory)
+    : path_(path), directory_(std::move(directory)) {
   open();
 }
 
@@ -52,15 +52,17 @@ QVPosixAtomicFile::~QVPosixAtomicFile() {
 }
 
 void QVPosixAtomicFile::open() {
-  if (!check(directory_ >= 0)) return;
-  for (int i = 0; i < kNames && file_ < 0; ++i) {
+  if (!check(directory_.isOpen())) return;
+  // First: what needs memory once there is a file would leave it behind.
+  buffer_ = std::make_unique_for_overwrite<char[]>(kBufferBytes);
+  for (int i = 0; i < kNames && !file_.isOpen(); ++i) {
     temporaryName_ = arbitraryName();
-    file_ = ::openat(directory_, temporaryName_.c_str(),
-                     O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kMode);
-    if (file_ < 0 && errno != EEXIST) break;
+    file_ = QVDescriptor(::openat(directory_.get(), temporaryName_.c_str(),
+                                  O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kMode));
+    if (!file_.isOpen() && errno != EEXIST) break;
   }
-  if (file_ < 0) temporaryName_.clear();
-  if (check(file_ >= 0)) buffer_ = std::make_unique_for_overwrite<char[]>(kBufferBytes);
+  if (!file_.isOpen()) temporaryName_.clear();
+  check(file_.isOpen());
 }
 
 void QVPosixAtomicFile::write(std::string_view bytes) {
@@ -79,7 +81,7 @@ void QVPosixAtomicFile::write(std::string_view bytes) {
 
 void QVPosixAtomicFile::writeOut(std::string_view bytes) {
   while (!bytes.empty()) {
-    const ssize_t count = ::write(file_, bytes.data(), bytes.size());
+    const ssize_t count = ::write(file_.get(), bytes.data(), bytes.size());
     if (count < 0 && errno == EINTR) continue;
     if (!check(count >= 0)) return;
     bytes.remove_prefix(static_cast<std::size_t>(count));
@@ -92,18 +94,19 @@ void QVPosixAtomicFile::handOn() {
   if (written_ - handedOn_ < kHandOnBytes) return;
   // Nothing is waited for. Where the call is refused, or what it began fails, the syncing at the
   // end does it all, or says so.
-  static_cast<void>(::sync_file_range(file_, static_cast<off_t>(handedOn_),
+  static_cast<void>(::sync_file_range(file_.get(), static_cast<off_t>(handedOn_),
                                       static_cast<off_t>(written_ - handedOn_),
                                       SYNC_FILE_RANGE_WRITE));
-  static_cast<void>(::posix_fadvise(file_, 0, static_cast<off_t>(handedOn_), POSIX_FADV_DONTNEED));
+  static_cast<void>(
+      ::posix_fadvise(file_.get(), 0, static_cast<off_t>(handedOn_), POSIX_FADV_DONTNEED));
   handedOn_ = written_;
 }
 
 std::optional<QVError> QVPosixAtomicFile::commit() {
   if (!failure_) writeOut({buffer_.get(), std::exchange(used_, 0)});
-  if (!failure_) check(sync(file_));
-  if (!failure_) check(::close(std::exchange(file_, -1)) == 0);
-  if (!failure_ && check(::renameat(directory_, temporaryName_.c_str(), directory_,
+  if (!failure_) check(sync(file_.get()));
+  if (!failure_) check(::close(file_.release()) == 0);
+  if (!failure_ && check(::renameat(directory_.get(), temporaryName_.c_str(), directory_.get(),
                                     path_.filename().c_str()) == 0)) {
     temporaryName_.clear();
   }
@@ -118,9 +121,9 @@ bool QVPosixAtomicFile::check(bool succeeded) {
 
 void QVPosixAtomicFile::abandon() {
   if (!temporaryName_.empty()) {
-    ::unlinkat(directory_, std::exchange(temporaryName_, {}).c_str(), 0);
+    ::unlinkat(directory_.get(), std::exchange(temporaryName_, {}).c_str(), 0);
   }
-  if (file_ >= 0) ::close(std::exchange(file_, -1));
-  if (directory_ >= 0) ::close(std::exchange(directory_, -1));
+  file_ = {};
+  directory_ = {};
   buffer_.reset();
 }

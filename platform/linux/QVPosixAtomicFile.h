@@ -1,6 +1,7 @@
 #pragma once
 
 #include "platform/QVFileSystem.h"
+#include "platform/linux/QVDescriptor.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -24,9 +25,8 @@ class QVPosixAtomicFile final : public QVAtomicFile {
   // What is held back to be written at once, in bytes.
   static constexpr std::size_t kBufferBytes = std::size_t{64} * 1024;
 
-  // `directory` is a descriptor of the path's directory, which this closes; below 0 there is none,
-  // and errno says why.
-  QVPosixAtomicFile(const std::string& path, int directory);
+  // `directory` is the path's; where it is not open, errno says why.
+  QVPosixAtomicFile(const std::string& path, QVDescriptor directory);
   ~QVPosixAtomicFile() override;
   QVPosixAtomicFile(const QVPosixAtomicFile&) = delete;
   QVPosixAtomicFile& operator=(const QVPosixAtomicFile&) = delete;
@@ -44,8 +44,8 @@ class QVPosixAtomicFile final : public QVAtomicFile {
   void abandon();
 
   const std::filesystem::path path_;
-  int directory_;
-  int file_ = -1;
+  QVDescriptor directory_;
+  QVDescriptor file_;
   std::string temporaryName_;  // empty once there is no such file
   std::unique_ptr<char[]> buffer_;
   std::size_t used_ = 0;

@@ -14,20 +14,11 @@ namespace {
 // Directories are passed through: that takes no permission to read them.
 constexpr int kDirectoryFlags = O_PATH | O_DIRECTORY | O_CLOEXEC;
 
-void closeKeepingErrno(int descriptor) {
-  const int number = errno;
-  ::close(descriptor);
-  errno = number;
-}
-
 // Of a directory that has just been made, so that what it stands for is what is changed. Nobody got
 // in before: mkdir() takes the umask from permissions, so they come after it.
 bool setPermissions(int parent, const char* name, mode_t permissions) {
-  const int made = ::openat(parent, name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
-  if (made < 0) return false;
-  const bool changed = ::fchmod(made, permissions) == 0;
-  closeKeepingErrno(made);
-  return changed;
+  const QVDescriptor made(::openat(parent, name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  return made.isOpen() && ::fchmod(made.get(), permissions) == 0;
 }
 
 // Makes one directory. False, with errno set, where it cannot be; another may have been faster.
@@ -41,34 +32,32 @@ bool isLink(int parent, const char* name) {
   return ::fstatat(parent, name, &status, AT_SYMLINK_NOFOLLOW) == 0 && S_ISLNK(status.st_mode);
 }
 
-// A descriptor of the directory of that name, which is no link; below 0, with errno set, where
-// there is none.
-int openChild(int parent, const std::string& name) {
+// The directory of that name, which is no link; not open, with errno set, where there is none.
+QVDescriptor openChild(int parent, const std::string& name) {
   if (name.empty() || name == "." || name == ".." || name.find('\0') != std::string::npos) {
     errno = EINVAL;
-    return -1;
+    return {};
   }
-  const int child = ::openat(parent, name.c_str(), kDirectoryFlags | O_NOFOLLOW);
+  QVDescriptor child(::openat(parent, name.c_str(), kDirectoryFlags | O_NOFOLLOW));
   // The kernel says "not a directory" of a link, too.
-  if (child < 0 && errno == ENOTDIR) errno = isLink(parent, name.c_str()) ? ELOOP : ENOTDIR;
+  if (!child.isOpen() && errno == ENOTDIR) errno = isLink(parent, name.c_str()) ? ELOOP : ENOTDIR;
   return child;
 }
 
 // The root, whose path is the administrator's, links and all.
-int openRoot(const std::string& root, std::optional<uint32_t> permissions, std::string& failed) {
+QVDescriptor openRoot(const std::string& root, std::optional<uint32_t> permissions,
+                      std::string& failed) {
   failed = root;
-  int directory = ::open(root.c_str(), kDirectoryFlags);
-  if (directory >= 0 || errno != ENOENT || !permissions) return directory;
+  QVDescriptor directory(::open(root.c_str(), kDirectoryFlags));
+  if (directory.isOpen() || errno != ENOENT || !permissions) return directory;
   for (std::size_t end = 0; end != std::string::npos;) {
     end = root.find('/', end + 1);
     failed = root.substr(0, end);
-    directory = ::open(failed.c_str(), kDirectoryFlags);
-    if (directory < 0) {
-      if (errno != ENOENT || !makeDirectory(AT_FDCWD, failed.c_str(), *permissions)) return -1;
-      directory = ::open(failed.c_str(), kDirectoryFlags);
-      if (directory < 0) return -1;
-    }
-    if (end != std::string::npos) ::close(directory);
+    directory = QVDescriptor(::open(failed.c_str(), kDirectoryFlags));
+    if (directory.isOpen()) continue;
+    if (errno != ENOENT || !makeDirectory(AT_FDCWD, failed.c_str(), *permissions)) return {};
+    directory = QVDescriptor(::open(failed.c_str(), kDirectoryFlags));
+    if (!directory.isOpen()) return {};
   }
   return directory;
 }
@@ -84,22 +73,22 @@ std::optional<std::string_view> partBelow(std::string_view root, std::string_vie
 
 }  // namespace
 
-int QVPosixFileSystem::openDirectory(std::string_view below, std::optional<uint32_t> permissions,
-                                     std::string& failed) const {
-  int directory = openRoot(diagnosticLogRoot_, permissions, failed);
-  for (bool isLast = below.empty(); directory >= 0 && !isLast;) {
+QVDescriptor QVPosixFileSystem::openDirectory(std::string_view below,
+                                              std::optional<uint32_t> permissions,
+                                              std::string& failed) const {
+  QVDescriptor directory = openRoot(diagnosticLogRoot_, permissions, failed);
+  for (bool isLast = below.empty(); directory.isOpen() && !isLast;) {
     const std::size_t end = below.find('/');
     const std::string name(below.substr(0, end));
     isLast = end == std::string_view::npos;
     below.remove_prefix(isLast ? below.size() : end + 1);
     failed.append("/").append(name);
-    int child = openChild(directory, name);
-    if (child < 0 && errno == ENOENT && permissions &&
-        makeDirectory(directory, name.c_str(), *permissions)) {
-      child = openChild(directory, name);
+    QVDescriptor child = openChild(directory.get(), name);
+    if (!child.isOpen() && errno == ENOENT && permissions &&
+        makeDirectory(directory.get(), name.c_str(), *permissions)) {
+      child = openChild(directory.get(), name);
     }
-    closeKeepingErrno(directory);
-    directory = child;
+    directory = std::move(child);
   }
   return directory;
 }
@@ -109,9 +98,7 @@ std::optional<QVError> QVPosixFileSystem::createDirectory(const std::string& pat
   const auto below = partBelow(diagnosticLogRoot_, path);
   if (!below) return QVMakePosixError(path, EINVAL);
   std::string failed;
-  const int directory = openDirectory(*below, permissions, failed);
-  if (directory < 0) return QVMakePosixError(failed);
-  ::close(directory);
+  if (!openDirectory(*below, permissions, failed).isOpen()) return QVMakePosixError(failed);
   return std::nullopt;
 }
 
@@ -119,12 +106,12 @@ std::unique_ptr<QVAtomicFile> QVPosixFileSystem::makeAtomicFile(const std::strin
   const std::size_t slash = path.rfind('/');
   const auto below = partBelow(
       diagnosticLogRoot_, std::string_view(path).substr(0, slash == std::string::npos ? 0 : slash));
-  int directory = -1;
+  QVDescriptor directory;
   if (below) {
     std::string failed;
     directory = openDirectory(*below, std::nullopt, failed);
   } else {
     errno = EINVAL;
   }
-  return std::make_unique<QVPosixAtomicFile>(path, directory);
+  return std::make_unique<QVPosixAtomicFile>(path, std::move(directory));
 }

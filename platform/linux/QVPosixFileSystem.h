@@ -1,6 +1,7 @@
 #pragma once
 
 #include "platform/QVFileSystem.h"
+#include "platform/linux/QVDescriptor.h"
 
 #include <string>
 #include <string_view>
@@ -21,11 +22,11 @@ class QVPosixFileSystem final : public QVFileSystem {
   std::unique_ptr<QVAtomicFile> makeAtomicFile(const std::string& path) override;
 
  private:
-  // A descriptor of the directory that lies `below` the root; below 0, with errno set, where it
-  // cannot be opened, and then `failed` is the path of the part that failed. Missing parts are made
-  // where there are permissions for them.
-  int openDirectory(std::string_view below, std::optional<uint32_t> permissions,
-                    std::string& failed) const;
+  // The directory that lies `below` the root; not open, with errno set, where it cannot be opened,
+  // and then `failed` is the path of the part that failed. Missing parts are made where there are
+  // permissions for them.
+  QVDescriptor openDirectory(std::string_view below, std::optional<uint32_t> permissions,
+                             std::string& failed) const;
 
   const std::string diagnosticLogRoot_;
 };

@@ -23,19 +23,15 @@ QVRegularFile::QVRegularFile(const std::string& path, Links links) {
   const int flags =
       O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY | (links == Links::refuse ? O_NOFOLLOW : 0);
   do {
-    descriptor_ = ::open(path.c_str(), flags);
-  } while (descriptor_ < 0 && errno == EINTR);
+    descriptor_ = QVDescriptor(::open(path.c_str(), flags));
+  } while (!descriptor_.isOpen() && errno == EINTR);
   struct stat status {};
-  if (descriptor_ < 0 || ::fstat(descriptor_, &status) != 0) {
+  if (!descriptor_.isOpen() || ::fstat(descriptor_.get(), &status) != 0) {
     // A device without a driver, or a socket.
     error_ = errno == ENXIO || errno == ENODEV ? kIrregular : errno;
   } else if (!S_ISREG(status.st_mode)) {
     error_ = kIrregular;
   }
-}
-
-QVRegularFile::~QVRegularFile() {
-  if (descriptor_ >= 0) ::close(descriptor_);
 }
 
 int QVRegularFile::read(std::size_t maximumBytes, std::string& contents) const {
@@ -47,19 +43,20 @@ int QVRegularFile::read(std::size_t maximumBytes, std::string& contents) const {
 
 int QVRegularFile::readBeginning(std::size_t bytes, std::string& contents) const {
   struct stat status {};
-  if (::fstat(descriptor_, &status) != 0) return errno;
-  // A byte more than the file says, so that its end shows in the same read.
-  const std::size_t announced = static_cast<std::size_t>(std::max<off_t>(status.st_size, 0)) + 1;
-  std::size_t step = std::max(announced, kStepBytes);
+  if (::fstat(descriptor_.get(), &status) != 0) return errno;
+  const auto announced = static_cast<std::size_t>(std::max<off_t>(status.st_size, 0));
+  // Room for a byte more than the file says: so one that grew since is read on to its end, and one
+  // that did not takes a single read.
+  std::size_t step = std::max(announced + 1, kStepBytes);
   std::size_t length = 0;
   while (length < bytes) {
     contents.resize(std::min(bytes, length + step));
-    const ssize_t count = ::pread(descriptor_, contents.data() + length, contents.size() - length,
-                                  static_cast<off_t>(length));
+    const ssize_t count = ::pread(descriptor_.get(), contents.data() + length,
+                                  contents.size() - length, static_cast<off_t>(length));
     if (count < 0 && errno == EINTR) continue;
     if (count < 0) return errno;
-    if (count == 0) break;
     length += static_cast<std::size_t>(count);
+    if (count == 0 || length == announced) break;
     step = kStepBytes;
   }
   contents.resize(length);

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "platform/linux/QVDescriptor.h"
+
 #include <cstddef>
 #include <string>
 #include <string_view>
@@ -15,9 +17,6 @@ class QVRegularFile {
   enum class Links { follow, refuse };
 
   QVRegularFile(const std::string& path, Links links);
-  ~QVRegularFile();
-  QVRegularFile(const QVRegularFile&) = delete;
-  QVRegularFile& operator=(const QVRegularFile&) = delete;
 
   // Why the file cannot be read, an error number; kIrregular where it is no regular file, 0 where
   // it is open. Nothing may be read where it is not.
@@ -37,5 +36,5 @@ class QVRegularFile {
 
  private:
   int error_ = 0;
-  int descriptor_ = -1;
+  QVDescriptor descriptor_;
 };

@@ -22,15 +22,17 @@ constexpr const char* kPath = "/net/hadess/SensorProxy";
 constexpr const char* kInterface = "net.hadess.SensorProxy";
 constexpr const char* kPropertiesInterface = "org.freedesktop.DBus.Properties";
 constexpr const char* kProperty = "AccelerometerOrientation";
+constexpr const char* kBus = "org.freedesktop.DBus";
 constexpr const char* kUsualBus = "unix:path=/run/dbus/system_bus_socket";
 
 constexpr const char* kOwnerMatch =
     "type='signal',sender='org.freedesktop.DBus',interface='org.freedesktop.DBus',"
     "member='NameOwnerChanged',arg0='net.hadess.SensorProxy'";
-// Whoever sends it: what matters is who the owner is.
+// The bus keeps what others broadcast away; what they send to the service alone still comes.
 constexpr const char* kChangeMatch =
-    "type='signal',path='/net/hadess/SensorProxy',interface='org.freedesktop.DBus.Properties',"
-    "member='PropertiesChanged',arg0='net.hadess.SensorProxy'";
+    "type='signal',sender='net.hadess.SensorProxy',path='/net/hadess/SensorProxy',"
+    "interface='org.freedesktop.DBus.Properties',member='PropertiesChanged',"
+    "arg0='net.hadess.SensorProxy'";
 
 // Messages taken in one go: whoever floods the connection does not keep the thread from ending.
 constexpr int kMostMessages = 64;
@@ -44,6 +46,11 @@ int32_t orientationIn(sd_bus_message* message) {
     return QVOrientation::kUndefined;
   }
   return QVOrientation::orientationNamed(word);
+}
+
+bool isFrom(sd_bus_message* message, std::string_view name) {
+  const char* const sender = sd_bus_message_get_sender(message);
+  return sender != nullptr && name == sender;
 }
 
 // Why a call failed; nothing where it did not.
@@ -83,9 +90,9 @@ struct QVSensorProxyOrientation::Dispatch {
       result = sd_bus_message_append(call, types, arguments...);
     }
     if (result >= 0) {
-      result =
-          sd_bus_call_async(self.bus_, &self.call_, call, to<Handle>, &self,
-                            static_cast<uint64_t>(std::chrono::microseconds(kAnswerLimit).count()));
+      result = sd_bus_call_async(
+          self.bus_, &self.call_, call, to<Handle>, &self,
+          static_cast<uint64_t>(std::chrono::microseconds(self.options_.answerLimit).count()));
     }
     sd_bus_message_unref(call);
     return result;
@@ -102,7 +109,7 @@ QVSensorProxyOrientation::QVSensorProxyOrientation(QVLog& log, QVSensorProxyOpti
     : log_(log),
       options_(std::move(options)),
       registrations_(registrations),
-      retry_(options_.firstRetry) {}
+      pause_(options_.firstRetry) {}
 
 // The daemon takes a lost connection for a release as well: so the answer is not waited for.
 QVSensorProxyOrientation::~QVSensorProxyOrientation() {
@@ -112,10 +119,8 @@ QVSensorProxyOrientation::~QVSensorProxyOrientation() {
 
 QVSensorProxyOrientation::Rest QVSensorProxyOrientation::rest() const {
   Rest rest;
-  if (bus_ == nullptr) {
-    if (period_ != QVOrientationRegistrations::kNoDemand) rest.end = retryAt_;
-    return rest;
-  }
+  rest.end = retryAt_;
+  if (bus_ == nullptr) return rest;
   const int events = sd_bus_get_events(bus_);
   uint64_t limit = 0;
   if (events < 0 || sd_bus_get_timeout(bus_, &limit) < 0) {
@@ -125,17 +130,17 @@ QVSensorProxyOrientation::Rest QVSensorProxyOrientation::rest() const {
   rest.descriptor = sd_bus_get_fd(bus_);
   rest.events = static_cast<short>(events);
   // Both count the kernel's monotonic time.
-  if (limit != UINT64_MAX) rest.end = Clock::time_point(std::chrono::microseconds(limit));
+  if (limit != UINT64_MAX) {
+    const Clock::time_point end{std::chrono::microseconds(limit)};
+    rest.end = std::min(rest.end.value_or(end), end);
+  }
   return rest;
 }
 
 void QVSensorProxyOrientation::work() {
   followDemand();
   if (bus_ != nullptr) process();
-  if (bus_ == nullptr && period_ != QVOrientationRegistrations::kNoDemand &&
-      Clock::now() >= retryAt_) {
-    connect();
-  }
+  if (retryAt_ && Clock::now() >= *retryAt_) retry();
 }
 
 void QVSensorProxyOrientation::followDemand() {
@@ -145,21 +150,26 @@ void QVSensorProxyOrientation::followDemand() {
   period_ = period;
   if (period == QVOrientationRegistrations::kNoDemand) {
     value_.reset();
+    retryAt_.reset();
     release();
   } else if (begins) {
-    retry_ = options_.firstRetry;
-    retryAt_ = Clock::now();
-    // The daemon takes calls in their order: so the release is over before.
-    if (state_ == State::releasing) {
-      if (const int result = claim(); result < 0) lose(result);
-    }
+    pause_ = options_.firstRetry;
+    // The daemon takes calls in their order: so a release under way is over before.
+    retry();
   } else {
     tell();
   }
 }
 
-void QVSensorProxyOrientation::connect() {
-  if (const int result = open(); result < 0) lose(result);
+// Demand has begun, or the pause after a failure is over.
+void QVSensorProxyOrientation::retry() {
+  retryAt_.reset();
+  if (const int result = bus_ == nullptr ? open() : claim(); result < 0) lose(result);
+}
+
+void QVSensorProxyOrientation::retryLater() {
+  retryAt_ = Clock::now() + pause_;
+  pause_ = std::min<std::chrono::milliseconds>(2 * pause_, kLongestRetry);
 }
 
 int QVSensorProxyOrientation::open() {
@@ -205,10 +215,10 @@ void QVSensorProxyOrientation::close() {
 void QVSensorProxyOrientation::lose(int error) {
   close();
   if (period_ == QVOrientationRegistrations::kNoDemand) return;
-  note("the system bus: " + std::generic_category().message(-error));
-  retryAt_ = Clock::now() + retry_;
-  retry_ = std::min<std::chrono::milliseconds>(2 * retry_, kLongestRetry);
+  // First, so that a want of memory in what follows does not end the attempts.
+  retryLater();
   value_ = QVOrientation::kUndefined;
+  note("the system bus: " + std::generic_category().message(-error));
   tell();
 }
 
@@ -239,14 +249,16 @@ void QVSensorProxyOrientation::release() {
 
 void QVSensorProxyOrientation::finishClaim(sd_bus_message* reply) {
   forgetCall();
-  retry_ = options_.firstRetry;
   if (const auto failure = failureOf(reply)) {
     state_ = State::unclaimed;
     value_ = QVOrientation::kUndefined;
+    // Where there is no daemon, and none that the bus could start, it tells when one appears.
+    if (sd_bus_message_is_method_error(reply, SD_BUS_ERROR_SERVICE_UNKNOWN) <= 0) retryLater();
     note(*failure);
     return;
   }
   state_ = State::claimed;
+  pause_ = options_.firstRetry;
   trouble_.clear();
   const char* const sender = sd_bus_message_get_sender(reply);
   owner_ = sender == nullptr ? "" : sender;
@@ -273,6 +285,8 @@ void QVSensorProxyOrientation::handleOwner(sd_bus_message* signal) {
   const char* name = nullptr;
   const char* before = nullptr;
   const char* now = nullptr;
+  // Anybody may send the like to the service alone.
+  if (!isFrom(signal, kBus)) return;
   if (state_ == State::releasing || sd_bus_message_read(signal, "sss", &name, &before, &now) < 0) {
     return;
   }
@@ -281,14 +295,19 @@ void QVSensorProxyOrientation::handleOwner(sd_bus_message* signal) {
     owner_.clear();
     state_ = State::unclaimed;
     value_ = QVOrientation::kUndefined;
+    retryAt_.reset();
   }
   // A claim under way is that which made the bus start the daemon.
-  if (*now != '\0' && state_ == State::unclaimed && claim() < 0) state_ = State::unclaimed;
+  if (*now == '\0' || state_ != State::unclaimed) return;
+  retryAt_.reset();
+  pause_ = options_.firstRetry;
+  if (claim() >= 0) return;
+  state_ = State::unclaimed;
+  retryLater();
 }
 
 void QVSensorProxyOrientation::handleChange(sd_bus_message* signal) {
-  const char* const sender = sd_bus_message_get_sender(signal);
-  if (state_ != State::claimed || sender == nullptr || owner_ != sender) return;
+  if (state_ != State::claimed || !isFrom(signal, owner_)) return;
   const char* name = nullptr;
   if (sd_bus_message_skip(signal, "s") < 0 ||
       sd_bus_message_enter_container(signal, SD_BUS_TYPE_ARRAY, "{sv}") < 0) {

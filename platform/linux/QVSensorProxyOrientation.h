@@ -13,8 +13,11 @@ struct sd_bus_slot;
 
 struct QVSensorProxyOptions {
   std::string busAddress;
-  // After the connection to the bus failed or was lost; doubles with each failure in a row.
+  // After the connection to the bus failed or was lost, or a claim was refused or not answered;
+  // doubles with each failure in a row.
   std::chrono::milliseconds firstRetry = std::chrono::seconds(1);
+  // For an answer of the daemon, which the bus may have to start first.
+  std::chrono::milliseconds answerLimit = std::chrono::seconds(25);
 };
 
 // The device's orientation, as the daemon net.hadess.SensorProxy tells it on the system bus. The
@@ -22,15 +25,16 @@ struct QVSensorProxyOptions {
 //
 // While there is no answer to the claim yet, nothing is known. Where there is no bus, no daemon, or
 // it refuses the claim or says something that names no orientation, the value is "undefined". A
-// daemon that appears (again) is claimed (again); a lost bus is connected again after a pause. Only
-// the daemon that granted the claim is listened to.
+// daemon that appears (again) is claimed (again); after a pause, one that refused or did not answer
+// is claimed again, and a lost bus is connected again. Only the daemon that granted the claim is
+// listened to, and only the bus about who that is.
 //
 // Made and worked by QVLinuxOrientation, on its thread, which sleeps in between until there is
 // something to do. Nothing here waits. The registrations outlive it.
 //
 //                 demand                    granted
 //   disconnected --------> claiming <----+ ---------> claimed
-//        ^                  |  refused   | daemon        | daemon leaves
+//        ^                  |  refused   | daemon, pause | daemon leaves
 //        |                  +-------> unclaimed <--------+
 //        | answered                      |               |
 //        +--------- releasing <----------+---------------+ demand ends
@@ -40,8 +44,6 @@ struct QVSensorProxyOptions {
 class QVSensorProxyOrientation {
  public:
   static constexpr std::chrono::minutes kLongestRetry{1};
-  // For an answer of the daemon, which the bus may have to start first.
-  static constexpr std::chrono::seconds kAnswerLimit{25};
 
   QVSensorProxyOrientation(QVLog& log, QVSensorProxyOptions options,
                            QVOrientationRegistrations& registrations);
@@ -68,7 +70,8 @@ class QVSensorProxyOrientation {
   struct Dispatch;
 
   void followDemand();
-  void connect();
+  void retry();
+  void retryLater();
   int open();
   void process();
   void close();
@@ -90,11 +93,12 @@ class QVSensorProxyOrientation {
   QVOrientationRegistrations::Period period_ = QVOrientationRegistrations::kNoDemand;
   State state_ = State::disconnected;
   sd_bus* bus_ = nullptr;
-  sd_bus_slot* call_ = nullptr;   // the call under way
-  std::string owner_;             // the daemon's own name on the bus, once it granted the claim
-  std::optional<int32_t> value_;  // where something is known
-  std::string trouble_;           // what was noted last
-  bool isOutOfMemory_ = false;    // since the handling of a message
-  std::chrono::milliseconds retry_;
-  std::chrono::steady_clock::time_point retryAt_;
+  sd_bus_slot* call_ = nullptr;      // the call under way
+  std::string owner_;                // the daemon's own name on the bus, once it granted the claim
+  std::optional<int32_t> value_;     // where something is known
+  std::string trouble_;              // what was noted last
+  bool isOutOfMemory_ = false;       // since the handling of a message
+  std::chrono::milliseconds pause_;  // before the next attempt that fails is repeated
+  // When to connect, or where that is done to claim, again.
+  std::optional<std::chrono::steady_clock::time_point> retryAt_;
 };

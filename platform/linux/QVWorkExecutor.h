@@ -11,6 +11,7 @@ class QVWorkExecutor {
  public:
   virtual ~QVWorkExecutor() = default;
   // Moves from `task` and answers true; answers false and leaves it once the executor is closed.
+  // Throws std::bad_alloc where there is no memory for it: then it is not run.
   [[nodiscard]] virtual bool submit(QVWorkItem& task) = 0;
   // Takes no more tasks, runs those taken, ends the threads. Not from one of its own tasks.
   virtual void close() = 0;

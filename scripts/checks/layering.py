@@ -71,7 +71,7 @@ _PLATFORM = r"platform/\w+\.h"
 _ANY = r".*"
 # Of the other adapters the wire code, and with it the client, uses these headers, which need no
 # source: it is linked without the rest.
-_SHARED_WITH_BUS = r"platform/linux/(QVThreadAnnotations|QVWakeUpBatch)\.h"
+_SHARED_WITH_BUS = r"platform/linux/(QVDescriptor|QVThreadAnnotations|QVWakeUpBatch)\.h"
 
 # The first folder that a file lies in decides.
 LAYERS = [

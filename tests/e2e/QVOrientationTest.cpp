@@ -7,13 +7,17 @@
 
 #include <filesystem>
 #include <fstream>
+#include <string>
+#include <vector>
 
 #include <gmock/gmock.h>
 
 namespace {
 
 using ::testing::AllOf;
+using ::testing::Each;
 using ::testing::ElementsAre;
+using ::testing::EndsWith;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
 using ::testing::MatchesRegex;
@@ -42,6 +46,16 @@ class QVOrientationTest : public QVEndToEndTest {
       found.push_back(text.substr(0, time) + "..." + text.substr(text.find(',', time)));
     }
     return found;
+  }
+  // Has the service a thread for it? It has from the first session that listens on.
+  bool followsOrientation() {
+    const auto process = std::filesystem::path("/proc") / std::to_string(service().pid());
+    for (const auto& thread : std::filesystem::directory_iterator(process / "task")) {
+      std::string name;
+      std::getline(std::ifstream(thread.path() / "comm") >> std::ws, name);
+      if (name == "qv-orientation") return true;
+    }
+    return false;
   }
   std::vector<std::string> summaries() const {
     return store().rows("SELECT payload FROM beacon_message WHERE category = 65535");
@@ -105,8 +119,9 @@ TEST_F(QVOrientationTest, IsRecordedOfTheDevice) {
   EXPECT_EQ(log().count("mode=device orientation=\"normal\""), 1U);
 }
 
-TEST_F(QVOrientationTest, IsNotRecordedOfOtherSessionsDevicesAndBuilds) {
+TEST_F(QVOrientationTest, IsNotRecordedOfOtherDevicesAndBuilds) {
   turnUI("normal");
+  std::size_t sessions = 0;
   for (const char* device :
        {R"({"InternalBuild": true, "DeviceClassNumber": 6})", R"({"DeviceClassNumber": 1})"}) {
     configure(device);
@@ -114,19 +129,37 @@ TEST_F(QVOrientationTest, IsNotRecordedOfOtherSessionsDevicesAndBuilds) {
     auto client = connectClient();
     client.create(7, kTelephony);
     client.start(7);
+    // A session that listens does so before it is stored.
+    expectStored("SELECT * FROM beacon_session", ++sessions);
+    EXPECT_FALSE(followsOrientation()) << device;
     client.stop(7);
     endService();
     forgetService();
     EXPECT_FALSE(readings.haveHappened()) << device;
   }
+}
+
+TEST_F(QVOrientationTest, IsNotRecordedOfOtherSessions) {
   configure(R"({"InternalBuild": true})");
+  turnUI("normal");
   QVFileReadings readings(file());
   auto client = connectClient();
   client.create(7, kGeneric);
   client.start(7);
+  client.create(8, kTelephony);
+  client.start(8);
+  ASSERT_TRUE(readings.await());
+  EXPECT_TRUE(followsOrientation());
+  turnUI("left-up");
+  expectLogged("mode=ui orientation=\"left-up\"");
+  // With the next change the last one has been told to all.
+  turnUI("right-up");
+  expectLogged("mode=ui orientation=\"right-up\"");
   client.stop(7);
+  client.stop(8);
   endService();
-  EXPECT_FALSE(readings.haveHappened());
+  EXPECT_THAT(changes(), Each(EndsWith("id=\"QVReportingService 8\"")));
+  EXPECT_THAT(changes(), SizeIs(2));
 }
 
 TEST_F(QVOrientationTest, EndsWithTheServiceWhereASessionWasNotStopped) {

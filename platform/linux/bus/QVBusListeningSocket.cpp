@@ -1,5 +1,7 @@
 #include "platform/linux/bus/QVBusListeningSocket.h"
 
+#include "platform/linux/QVDescriptor.h"
+
 #include <cerrno>
 #include <cstring>
 #include <system_error>
@@ -24,21 +26,6 @@ std::string withReason(const std::string& text, int number = errno) {
   return text + ": " + std::generic_category().message(number);
 }
 
-// A descriptor for the length of a scope.
-class Descriptor {
- public:
-  explicit Descriptor(int descriptor) : descriptor_(descriptor) {}
-  ~Descriptor() {
-    if (descriptor_ >= 0) ::close(descriptor_);
-  }
-  Descriptor(const Descriptor&) = delete;
-  Descriptor& operator=(const Descriptor&) = delete;
-  int get() const { return descriptor_; }
-
- private:
-  const int descriptor_;
-};
-
 int makeSocket() {
   return ::socket(AF_UNIX, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0);
 }
@@ -61,7 +48,7 @@ bool clearPath(const std::string& path, const sockaddr_un& address, std::string&
     error = path + " is no socket; it is left alone";
     return false;
   }
-  const Descriptor probe(makeSocket());
+  const QVDescriptor probe(makeSocket());
   // EAGAIN: somebody listens and is busy.
   if (::connect(probe.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0 ||
       errno == EAGAIN) {
@@ -124,8 +111,8 @@ std::unique_ptr<QVBusListeningSocket> QVBusListeningSocket::bind(const std::stri
 
   // Between the look at the path and our own listening nobody else of us may do the same.
   const auto directoryPath = directoryOf(path);
-  const Descriptor directory(::open(directoryPath.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  if (directory.get() < 0 || ::flock(directory.get(), LOCK_EX) != 0) {
+  const QVDescriptor directory(::open(directoryPath.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  if (!directory.isOpen() || ::flock(directory.get(), LOCK_EX) != 0) {
     error = withReason("cannot use the directory " + directoryPath);
     return nullptr;
   }

@@ -50,6 +50,11 @@ class Reader {
   std::vector<std::pair<std::string, std::string>> channels(const QVDictionary& named) {
     std::vector<std::pair<std::string, std::string>> channels;
     for (const QVDictionaryEntry& channel : named) {
+      if (channels.size() == QVChannelConfiguration::kMaximumChannels) {
+        log_.error(nullptr, kFunction, "channels of entry ", number_, " of ", path_,
+                   " beyond the first ", channels.size(), " are left out");
+        break;
+      }
       if (channel.value.isString()) {
         channels.emplace_back(channel.key, channel.value.string());
       } else {

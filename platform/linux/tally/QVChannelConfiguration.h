@@ -23,6 +23,9 @@
 struct QVChannelConfiguration {
   // Entries of a file, far above any machine's sound cards; what is beyond is left out.
   static constexpr std::size_t kMaximumEntries = 256;
+  // Channels that an entry names, far above the lines of such a file; what is beyond, in the order
+  // of the names, is left out.
+  static constexpr std::size_t kMaximumChannels = 1024;
 
   static std::vector<QVKernelTextSource::Description> read(QVLog& log, const std::string& path);
 };

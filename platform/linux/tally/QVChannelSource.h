@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <optional>
 #include <string>
@@ -31,6 +32,10 @@ struct QVChannelReadings {
 // Threads: any, at once: a source does not change.
 class QVChannelSource {
  public:
+  // Channels of a set, each of which costs every started session 16 bytes: what a source has beyond
+  // these need not be read, but that there are more.
+  static constexpr std::size_t kMaximumChannels = 4096;
+
   virtual ~QVChannelSource() = default;
 
   virtual const std::string& group() const = 0;

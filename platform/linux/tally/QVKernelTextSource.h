@@ -2,6 +2,8 @@
 
 #include "platform/linux/tally/QVChannelSource.h"
 
+#include <functional>
+#include <map>
 #include <optional>
 #include <string>
 #include <utility>
@@ -22,13 +24,17 @@ class QVKernelTextSource final : public QVChannelSource {
     bool operator==(const Description&) const = default;
   };
 
-  explicit QVKernelTextSource(Description description) : description_(std::move(description)) {}
+  explicit QVKernelTextSource(Description description);
 
-  const std::string& group() const override { return description_.group; }
+  const std::string& group() const override { return group_; }
   int read(QVChannelReadings& readings) const override;
 
  private:
   void addChannels(std::string_view line, QVChannelReadings& readings) const;
 
-  const Description description_;
+  const std::string group_;
+  const std::optional<std::string> subgroup_;
+  const std::string file_;
+  // The configured names by the keys of their lines, those of a key in ascending order.
+  std::optional<std::multimap<std::string, std::string, std::less<>>> names_;  // constant
 };

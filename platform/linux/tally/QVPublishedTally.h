@@ -19,8 +19,9 @@
 // of the places in them.
 //
 // A sample reads each of its files once. A channel is known again by group, subgroup and name, and
-// by its place among equal ones: a publisher may replace its file. A file that is gone or bad is
-// an error, whose code is the system's error number; what the other files hold comes with it.
+// by its place among equal ones: a publisher may replace its file. A file that is gone is
+// left out, without an error; a bad one is an error, whose code is the system's error number. What
+// the other files hold comes with it.
 //
 // Threads: any, at once: it keeps what the configuration said, and nothing else. Names beginning
 // with "." are files in the making, and no groups. The log is used in the constructor alone.
@@ -28,9 +29,8 @@ class QVPublishedTally final : public QVTally {
  public:
   // Entries of the directory that are looked at; one for each driver, and far above their number.
   static constexpr std::size_t kMaximumFiles = 1024;
-  // Channels of a set, each of which costs every started session 16 bytes. What is beyond is left
-  // out, with the error E2BIG.
-  static constexpr std::size_t kMaximumChannels = 4096;
+  // Channels of a set. What is beyond is left out, with the error E2BIG.
+  static constexpr std::size_t kMaximumChannels = QVChannelSource::kMaximumChannels;
 
   QVPublishedTally(QVLog& log, std::string directory, const std::string& configuration);
   ~QVPublishedTally() override;

@@ -9,6 +9,7 @@
 #include <filesystem>
 #include <fstream>
 #include <optional>
+#include <stdexcept>
 #include <string>
 
 #include <gmock/gmock.h>
@@ -70,6 +71,22 @@ TEST_F(QVAsioRunLoopThreadsTest, CollectsThreadsThatHaveEndedWhenTheNextOneStart
     ASSERT_TRUE(thread->isFinished());
     EXPECT_LE(threadCount(), 1U);
   }
+}
+
+TEST_F(QVAsioRunLoopThreadsTest, NamesTheOperationsWhoseWorkFailed) {
+  const auto timer = threads_->makeTimer(0s, [] { throw std::runtime_error("timer"); });
+  threads_->startThread("qv-test", [&](QVRunLoop& loop) {
+    loop.attach(timer);
+    loop.run();
+    throw std::runtime_error("body");
+  });
+  threads_.reset();
+  EXPECT_THAT(
+      log_.renderings(),
+      testing::ElementsAre(
+          "3[default] -[QVAsioRunLoop run]: exception in run loop qv-test: timer",
+          "3[default] -[QVAsioRunLoopThreads startThread:body:]: exception in thread qv-test: "
+          "body"));
 }
 
 TEST_F(QVAsioRunLoopThreadsTest, NamesThreadsAsTheKernelCanHoldIt) {

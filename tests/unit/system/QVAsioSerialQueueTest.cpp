@@ -6,7 +6,9 @@
 #include <chrono>
 #include <deque>
 #include <memory>
+#include <new>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include <gmock/gmock.h>
@@ -20,6 +22,7 @@ class ManualExecutor final : public QVWorkExecutor {
  public:
   bool submit(QVWorkItem& task) override {
     if (isClosed_) return false;
+    if (std::exchange(refuses_, false)) throw std::bad_alloc();
     tasks_.push_back(std::move(task));
     ++submitCount_;
     return true;
@@ -31,11 +34,14 @@ class ManualExecutor final : public QVWorkExecutor {
     tasks_.pop_front();
     task();
   }
+  // The next task finds no memory.
+  void refuseOne() { refuses_ = true; }
   int submitCount() const { return submitCount_; }
   std::size_t taskCount() const { return tasks_.size(); }
 
  private:
   bool isClosed_ = false;
+  bool refuses_ = false;
   int submitCount_ = 0;
   std::deque<QVWorkItem> tasks_;
 };
@@ -119,6 +125,50 @@ TEST_F(QVAsioSerialQueueTest, DestroysItemsOfAClosedExecutor) {
   EXPECT_EQ(queue.use_count(), 1);
   queue->async([capture] {});
   EXPECT_EQ(capture.use_count(), 1);
+}
+
+TEST_F(QVAsioSerialQueueTest, GoesOnWhereItCouldNotBeSubmitted) {
+  const auto queue = makeQueue();
+  executor_.refuseOne();
+  EXPECT_THROW(queue->async(note("a")), std::bad_alloc);
+  EXPECT_EQ(executor_.taskCount(), 0U);
+  queue->async(note("b"));
+  ASSERT_EQ(executor_.taskCount(), 1U);
+  executor_.runOne();
+  EXPECT_THAT(ran_, ElementsAre("a", "b"));
+}
+
+TEST_F(QVAsioSerialQueueTest, GoesOnWhereItCouldNotBeSubmittedAfterABatch) {
+  const auto queue = makeQueue();
+  const auto other = makeQueue();
+  {
+    const QVWakeUpBatch wakeUps;
+    queue->async(note("a"));
+    other->async(note("other"));
+    executor_.refuseOne();
+  }
+  EXPECT_THAT(log_.renderings(), ElementsAre("3[default] -[QVAsioSerialQueue submit]: exception in "
+                                             "work queue queue: std::bad_alloc"));
+  queue->async(note("b"));
+  while (executor_.taskCount() > 0) executor_.runOne();
+  EXPECT_THAT(ran_, ElementsAre("other", "a", "b"));
+}
+
+TEST_F(QVAsioSerialQueueTest, RunsOnWhereItCouldNotSubmitItselfAgain) {
+  const auto queue = makeQueue();
+  queue->async([this, queue] {
+    ran_.emplace_back("a");
+    queue->async(note("b"));
+    executor_.refuseOne();
+  });
+  executor_.runOne();
+  EXPECT_THAT(ran_, ElementsAre("a", "b"));
+  EXPECT_THAT(log_.renderings(), ElementsAre("3[default] -[QVAsioSerialQueue run]: exception in "
+                                             "work queue queue: std::bad_alloc"));
+  queue->async(note("c"));
+  ASSERT_EQ(executor_.taskCount(), 1U);
+  executor_.runOne();
+  EXPECT_THAT(ran_, ElementsAre("a", "b", "c"));
 }
 
 TEST_F(QVAsioSerialQueueTest, WakesAnotherQueueOnceForAllItemsOfABatch) {

@@ -38,6 +38,7 @@ class HoldingSink final : public QVLogSink {
     const std::lock_guard lock(mutex);
     for (const QVLogLine& line : lines) {
       texts.push_back(line.text);
+      functions.emplace_back(line.function);
       levels.push_back(line.level);
     }
   }
@@ -48,6 +49,7 @@ class HoldingSink final : public QVLogSink {
   QVEvent release;
   std::mutex mutex;
   std::vector<std::string> texts;
+  std::vector<std::string> functions;
   std::vector<QVLogLevel> levels;
 };
 
@@ -95,6 +97,7 @@ TEST_F(QVSystemLogTest, CountsTheLinesThatFindNoRoom) {
   ASSERT_EQ(sink_->texts.size(), 1 + kRoom + 1);
   EXPECT_EQ(sink_->texts[kRoom], QVText(kRoom - 1)) << "the last that found room";
   EXPECT_EQ(sink_->texts.back(), "10 log lines were lost, the log's queue was full");
+  EXPECT_EQ(sink_->functions.back(), "-[QVLogWriter writeBatch:lostCount:]");
   EXPECT_EQ(sink_->levels.back(), QVLogLevel::error);
   log_->info(nullptr, "f", "room again");
   log_->flush();

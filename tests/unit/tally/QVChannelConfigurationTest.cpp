@@ -133,4 +133,19 @@ TEST_F(QVChannelConfigurationTest, LimitsEntries) {
               ElementsAre(line("entries of " + path() + " beyond the first 256 are left out")));
 }
 
+TEST_F(QVChannelConfigurationTest, LimitsTheChannelsOfAnEntry) {
+  std::string channels;
+  for (std::size_t i = 0; i < QVChannelConfiguration::kMaximumChannels; ++i) {
+    channels += "\"a" + std::to_string(i) + R"(": "key", )";
+  }
+  const auto descriptions = read(R"([{"group": "a", "file": "/f", "channels": {)" + channels +
+                                 R"("b": "key"}}, {"group": "b", "file": "/f", "channels": {)" +
+                                 channels.substr(0, channels.size() - 2) + "}}]");
+  ASSERT_THAT(descriptions, SizeIs(2));
+  EXPECT_EQ(descriptions[0].channels, descriptions[1].channels);
+  EXPECT_THAT(descriptions[0].channels, testing::Optional(SizeIs(1024)));
+  EXPECT_THAT(log_.renderings(), ElementsAre(line("channels of entry 1 of " + path() +
+                                                  " beyond the first 1024 are left out")));
+}
+
 }  // namespace

@@ -127,6 +127,32 @@ TEST_F(QVChannelSourcesTest, FollowsALinkThatTheAdministratorNamed) {
   EXPECT_THAT(contents(), ElementsAre("(null) frames 1"));
 }
 
+TEST_F(QVChannelSourcesTest, FindsSeveralNamesOfALineAndSeveralLinesOfAName) {
+  write("b: 1\nother: 2\na: 3\nb: 4\n");
+  EXPECT_EQ(readDescribed(
+                {.group = {},
+                 .subgroup = {},
+                 .file = path(),
+                 .channels = {{{"first", "b"}, {"none", "c"}, {"second", "a"}, {"third", "b"}}}}),
+            0);
+  EXPECT_THAT(contents(), ElementsAre("(null) first 1", "(null) third 1", "(null) second 3",
+                                      "(null) first 4", "(null) third 4"));
+}
+
+TEST_F(QVChannelSourcesTest, ReadsNoMoreChannelsThanASetHoldsAndALineHas) {
+  std::string lines;
+  for (std::size_t i = 0; i < 2 * QVChannelSource::kMaximumChannels; ++i) lines += "k 1\n";
+  write(lines);
+  EXPECT_EQ(readText(path()), 0);
+  EXPECT_EQ(readings_->channels.size(), QVChannelSource::kMaximumChannels + 1);
+  EXPECT_EQ(readDescribed({.group = {},
+                           .subgroup = {},
+                           .file = path(),
+                           .channels = {{{"a", "k"}, {"b", "k"}, {"c", "k"}}}}),
+            0);
+  EXPECT_EQ(readings_->channels.size(), QVChannelSource::kMaximumChannels + 2);
+}
+
 TEST_F(QVChannelSourcesTest, RefusesFilesThatAreTooLarge) {
   write(kFrames.bytes());
   std::filesystem::resize_file(path(), QVMMVFormat::kMaximumBytes);

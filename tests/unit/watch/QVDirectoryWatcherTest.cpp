@@ -4,14 +4,18 @@
 #include "tests/unit/watch/QVOccurrences.h"
 
 #include <atomic>
+#include <chrono>
 #include <filesystem>
 #include <fstream>
 #include <memory>
+#include <new>
 #include <stdexcept>
 #include <thread>
+#include <utility>
 
 #include <fcntl.h>
 #include <gmock/gmock.h>
+#include <sys/resource.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -50,6 +54,21 @@ class QVDirectoryWatcherTest : public testing::Test {
   void write(const std::string& name, const std::string& text) const {
     std::ofstream(path(name)) << text;
   }
+  // The directory is gone, and its parent too.
+  void loseParent() const {
+    const std::filesystem::path moved = root_.path() / "moved";
+    std::filesystem::rename(root_.runtime(), moved);
+    // Only what happens to the directory itself is heard of.
+    std::filesystem::remove_all(moved / "notify");
+  }
+  std::string cannotWatch() const {
+    return QVText('3', kFunction, "cannot watch a directory any more: ", directory_.string(),
+                  ": No such file or directory");
+  }
+  std::string isThereAgain() const {
+    return QVText('5', kFunction, directory_.string(),
+                  " was deleted or moved away: it is there again");
+  }
   static mode_t modeOf(const std::filesystem::path& path) {
     struct stat status {};
     EXPECT_EQ(::stat(path.c_str(), &status), 0);
@@ -62,7 +81,7 @@ class QVDirectoryWatcherTest : public testing::Test {
   QVTemporaryRoot root_;
   const std::filesystem::path directory_ = root_.runtime() / "notify";
   QVFakeLog log_;
-  QVDirectoryWatcher watcher_{log_};
+  QVDirectoryWatcher watcher_{log_, std::chrono::milliseconds(10)};
   int markerCount_ = 0;
 };
 
@@ -103,6 +122,24 @@ TEST_F(QVDirectoryWatcherTest, SaysWhyADirectoryCannotBeWatched) {
   touch("name");
   EXPECT_TRUE(occurrences_.await(1));
   EXPECT_THAT(log_.renderings(), IsEmpty());
+}
+
+TEST_F(QVDirectoryWatcherTest, SaysThatThereAreNoDescriptorsLeft) {
+  rlimit before{};
+  ASSERT_EQ(::getrlimit(RLIMIT_NOFILE, &before), 0);
+  const rlimit none{.rlim_cur = 0, .rlim_max = before.rlim_max};
+  ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &none), 0);
+  std::string reason;
+  const Token token = watcher_.watch(
+      {directory_, "name", Kind::posts}, [] {}, reason);
+  ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &before), 0);
+  EXPECT_EQ(token, QVDirectoryWatcher::kNoToken);
+  EXPECT_EQ(reason, "inotify: Too many open files");
+
+  // Once there are, it watches.
+  watch("name", Kind::posts, occurrences_);
+  touch("name");
+  EXPECT_TRUE(occurrences_.await(1));
 }
 
 // ---- What is told of
@@ -261,6 +298,21 @@ TEST_F(QVDirectoryWatcherTest, TellsTheOthersWhereACallbackFails) {
   EXPECT_TRUE(occurrences_.await(before + 1));
 }
 
+TEST_F(QVDirectoryWatcherTest, TellsAgainWhereACallbackFailed) {
+  std::string reason;
+  ASSERT_NE(watcher_.watch(
+                {directory_, "file", Kind::posts},
+                [this, isFirst = true]() mutable {
+                  if (std::exchange(isFirst, false)) throw std::bad_alloc();
+                  occurrences_.happen();
+                },
+                reason),
+            QVDirectoryWatcher::kNoToken);
+  // One event, and no other after it.
+  std::filesystem::create_symlink("elsewhere", path("file"));
+  EXPECT_TRUE(occurrences_.await(1));
+}
+
 // ---- The life of a watch
 
 TEST_F(QVDirectoryWatcherTest, TellsNothingOnceAWatchHasEnded) {
@@ -400,9 +452,7 @@ TEST_F(QVDirectoryWatcherTest, MakesADeletedDirectoryAnewAndTellsEveryWatchOnce)
   settle();
   EXPECT_EQ(occurrences_.count(), 1U);
   EXPECT_EQ(others_.count(), 1U);
-  EXPECT_THAT(log_.renderings(),
-              ElementsAre(QVText('5', kFunction, directory_.string(),
-                                 " was deleted or moved away: it is there again")));
+  EXPECT_THAT(log_.renderings(), ElementsAre(isThereAgain()));
   touch("file");
   EXPECT_TRUE(occurrences_.await(2));
 }
@@ -415,9 +465,7 @@ TEST_F(QVDirectoryWatcherTest, MakesAMovedDirectoryAnewAndForgetsTheOldOne) {
   std::ofstream(moved / "file").flush();
   settle();
   EXPECT_EQ(occurrences_.count(), 1U);
-  EXPECT_THAT(log_.renderings(),
-              ElementsAre(QVText('5', kFunction, directory_.string(),
-                                 " was deleted or moved away: it is there again")));
+  EXPECT_THAT(log_.renderings(), ElementsAre(isThereAgain()));
   touch("file");
   EXPECT_TRUE(occurrences_.await(2));
 }
@@ -433,21 +481,55 @@ TEST_F(QVDirectoryWatcherTest, FollowsADirectoryThatWasPutInTheOldOnesPlace) {
   EXPECT_TRUE(occurrences_.await(2));
 }
 
-TEST_F(QVDirectoryWatcherTest, SaysWhenADirectoryCannotBeMadeAnew) {
+TEST_F(QVDirectoryWatcherTest, MakesADirectoryAnewOnceItsParentIsThere) {
   watch("file", Kind::posts, occurrences_);
-  const std::filesystem::path moved = root_.path() / "moved";
-  std::filesystem::rename(root_.runtime(), moved);
-  // Only what happens to the directory itself is heard of.
-  std::filesystem::remove_all(moved / "notify");
-  ASSERT_TRUE(occurrences_.await(1));
-  EXPECT_THAT(log_.renderings(),
-              ElementsAre(QVText('3', kFunction, "cannot watch a directory any more: ",
-                                 directory_.string(), ": No such file or directory")));
-  // The next watch follows it again, for those who waited as well.
+  watch("other", Kind::contents, others_);
+  loseParent();
+  ASSERT_TRUE(others_.await(1));
+  EXPECT_THAT(log_.renderings(), ElementsAre(cannotWatch()));
+  // All are told of what they may have missed.
   std::filesystem::create_directory(root_.runtime());
-  watch("other", Kind::posts, others_);
-  touch("file");
   EXPECT_TRUE(occurrences_.await(2));
+  EXPECT_TRUE(others_.await(2));
+  settle();
+  EXPECT_EQ(occurrences_.count(), 2U);
+  EXPECT_THAT(log_.renderings(), ElementsAre(cannotWatch(), isThereAgain()));
+  touch("file");
+  EXPECT_TRUE(occurrences_.await(3));
+}
+
+TEST_F(QVDirectoryWatcherTest, GivesUpADirectoryThatNobodyWatchesAnyMore) {
+  const Token token = watch("file", Kind::posts, occurrences_);
+  loseParent();
+  ASSERT_TRUE(occurrences_.await(1));
+  watcher_.unwatch(token);
+  std::filesystem::create_directory(root_.runtime());
+  std::string reason;
+  ASSERT_NE(watcher_.watch(
+                {root_.state(), "file", Kind::posts}, [this] { others_.happen(); }, reason),
+            QVDirectoryWatcher::kNoToken);
+  std::ofstream(root_.state() / "file").flush();
+  EXPECT_TRUE(others_.await(1));
+  EXPECT_FALSE(std::filesystem::exists(directory_));
+}
+
+TEST_F(QVDirectoryWatcherTest, TellsOfADirectoryThatANewWatchRegained) {
+  QVDirectoryWatcher watcher(log_, std::chrono::minutes(10));
+  std::string reason;
+  ASSERT_NE(watcher.watch(
+                {directory_, "file", Kind::posts}, [this] { occurrences_.happen(); }, reason),
+            QVDirectoryWatcher::kNoToken);
+  loseParent();
+  ASSERT_TRUE(occurrences_.await(1));
+  EXPECT_THAT(log_.renderings(), ElementsAre(cannotWatch()));
+  std::filesystem::create_directory(root_.runtime());
+  ASSERT_NE(watcher.watch(
+                {directory_, "other", Kind::posts}, [this] { others_.happen(); }, reason),
+            QVDirectoryWatcher::kNoToken);
+  EXPECT_TRUE(occurrences_.await(2));
+  EXPECT_THAT(log_.renderings(), ElementsAre(cannotWatch(), isThereAgain()));
+  touch("file");
+  EXPECT_TRUE(occurrences_.await(3));
 }
 
 TEST_F(QVDirectoryWatcherTest, IsUsedByManyThreads) {

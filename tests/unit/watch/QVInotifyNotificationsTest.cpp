@@ -8,6 +8,8 @@
 #include <filesystem>
 #include <fstream>
 #include <mutex>
+#include <new>
+#include <thread>
 #include <utility>
 
 #include <gmock/gmock.h>
@@ -24,12 +26,18 @@ class QVHeldQueue final : public QVWorkQueue {
  public:
   void async(QVWorkItem item) override {
     const std::lock_guard lock(mutex_);
+    if (std::exchange(refuses_, false)) throw std::bad_alloc();
     items_.push_back(std::move(item));
     changed_.notify_all();
   }
   void asyncAfter(QVDuration, QVWorkItem item) override { async(std::move(item)); }
   std::string_view label() const override { return "held"; }
 
+  // The next item finds no memory.
+  void refuseOne() {
+    const std::lock_guard lock(mutex_);
+    refuses_ = true;
+  }
   std::size_t count() const {
     const std::lock_guard lock(mutex_);
     return items_.size();
@@ -55,6 +63,7 @@ class QVHeldQueue final : public QVWorkQueue {
   mutable std::mutex mutex_;
   std::condition_variable changed_;
   std::deque<QVWorkItem> items_;
+  bool refuses_ = false;
 };
 
 class QVInotifyNotificationsTest : public testing::Test {
@@ -89,7 +98,8 @@ class QVInotifyNotificationsTest : public testing::Test {
   const std::filesystem::path directory_ = root_.runtime() / "notify";
   QVFakeLog log_;
   const std::shared_ptr<QVHeldQueue> queue_ = std::make_shared<QVHeldQueue>();
-  const std::shared_ptr<QVDirectoryWatcher> watcher_ = std::make_shared<QVDirectoryWatcher>(log_);
+  const std::shared_ptr<QVDirectoryWatcher> watcher_ =
+      std::make_shared<QVDirectoryWatcher>(log_, std::chrono::milliseconds(10));
   std::unique_ptr<QVInotifyNotifications> notifications_ =
       std::make_unique<QVInotifyNotifications>(log_, watcher_, directory_);
   std::vector<int32_t> delivered_;
@@ -126,6 +136,43 @@ TEST_F(QVInotifyNotificationsTest, DeliversAPostThatComesWhileADeliveryRuns) {
   EXPECT_EQ(deliveries, 2);
   settle();
   EXPECT_EQ(queue_->count(), 0U);
+}
+
+// What posters write may be read before it is there: then another delivery follows.
+TEST_F(QVInotifyNotificationsTest, ShowsTheLastContentsToWhomPostersRace) {
+  constexpr int kPosts = 500;
+  int seen = 0;
+  int32_t token = 0;
+  ASSERT_EQ(
+      notifications_->registerDispatch(
+          "name", token, queue_, [&](int32_t) { std::ifstream(directory_ / "name") >> seen; }),
+      QVNotifications::kStatusOK);
+  std::thread poster([this] {
+    for (int i = 1; i <= kPosts; ++i) {
+      if (i % 2 == 0) {
+        std::ofstream(directory_ / "name") << i;
+      } else {
+        std::ofstream(directory_ / "new") << i;
+        std::filesystem::rename(directory_ / "new", directory_ / "name");
+      }
+    }
+  });
+  bool comes = true;
+  while (seen != kPosts && comes) comes = queue_->runOne();
+  poster.join();
+  EXPECT_EQ(seen, kPosts);
+}
+
+TEST_F(QVInotifyNotificationsTest, DeliversAPostThatCouldNotBeEnqueuedAtOnce) {
+  const int32_t token = add("name");
+  queue_->refuseOne();
+  // One event, and no other after it.
+  std::filesystem::create_symlink("elsewhere", directory_ / "name");
+  EXPECT_TRUE(queue_->runOne());
+  EXPECT_THAT(delivered_, ElementsAre(token));
+  EXPECT_THAT(log_.renderings(),
+              ElementsAre("3[default] -[QVDirectoryWatcher tell:]: exception in the callback for "
+                          "name: std::bad_alloc"));
 }
 
 TEST_F(QVInotifyNotificationsTest, FoldsEachRegistrationByItself) {

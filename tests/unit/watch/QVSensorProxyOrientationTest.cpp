@@ -12,8 +12,11 @@
 #include <csignal>
 #include <cstdlib>
 #include <filesystem>
+#include <functional>
 #include <memory>
 #include <optional>
+#include <string>
+#include <vector>
 
 #include <gmock/gmock.h>
 #include <poll.h>
@@ -45,6 +48,20 @@ class QVSensorProxyOrientationTest : public testing::Test {
     sensor_ = std::make_unique<QVTestSensor>(QVTestSensor::scripted(address()));
   }
   std::string address() const { return QVTestBus::address(root_.path()); }
+  void makeOrientation(const QVSensorProxyOptions& options) {
+    orientation_ = nullptr;
+    orientation_ =
+        std::make_unique<QVLinuxOrientation>(log_, std::make_shared<QVDirectoryWatcher>(log_),
+                                             root_.runtime() / "ui-orientation", options);
+  }
+  // A signal that somebody who is not the daemon sends to the service alone, which claimed.
+  void forge(const std::vector<std::string>& signal) const {
+    std::vector<std::string> command{"busctl", "--address=" + address(),
+                                     "--destination=" + sensor_->claimants().at(0), "emit"};
+    command.insert(command.end(), signal.begin(), signal.end());
+    const auto emitted = QVSubprocess::run(command);
+    ASSERT_EQ(emitted.status, 0) << emitted.text;
+  }
 
   void add(const std::string& callbackID = "id") { add(callbackID, heard_); }
   void add(const std::string& callbackID, QVHeardValues& heard) {
@@ -66,6 +83,16 @@ class QVSensorProxyOrientationTest : public testing::Test {
     EXPECT_THAT(sensor_->claimants(), SizeIs(1));
   }
   void turn(const std::string& orientation) const { sensor_->turn(orientation); }
+  // Works on the test's thread; the limit only ends a test that has failed.
+  static void workUntil(QVSensorProxyOrientation& sensor, const std::function<bool()>& isOver) {
+    const auto limit = std::chrono::steady_clock::now() + std::chrono::minutes(1);
+    for (sensor.work(); !isOver(); sensor.work()) {
+      ASSERT_LT(std::chrono::steady_clock::now(), limit);
+      const auto rest = sensor.rest();
+      pollfd event{rest.descriptor, rest.events, 0};
+      ::poll(&event, 1, rest.end ? 1 : 60'000);
+    }
+  }
 
   QVHeardValues heard_;
   QVTemporaryRoot root_;
@@ -205,14 +232,32 @@ TEST_F(QVSensorProxyOrientationTest, ListensToNobodyButTheDaemon) {
   startBus();
   startSensor("normal");
   addAndSettle();
-  const auto emitted = QVSubprocess::run(
-      {"busctl", "--address=" + address(), "--destination=" + sensor_->claimants().at(0), "emit",
-       "/net/hadess/SensorProxy", "org.freedesktop.DBus.Properties", "PropertiesChanged",
-       "sa{sv}as", "net.hadess.SensorProxy", "1", "AccelerometerOrientation", "s", "left-up", "0"});
-  EXPECT_EQ(emitted.status, 0) << emitted.text;
+  forge({"/net/hadess/SensorProxy", "org.freedesktop.DBus.Properties", "PropertiesChanged",
+         "sa{sv}as", "net.hadess.SensorProxy", "1", "AccelerometerOrientation", "s", "left-up",
+         "0"});
   ASSERT_TRUE(monitor_->await("string \"left-up\""));
   turn("right-up");
   EXPECT_THAT(heard_.await(1), ElementsAre(kRightUp));
+}
+
+TEST_F(QVSensorProxyOrientationTest, BelievesTheBusAloneWhoOwnsTheDaemonsName) {
+  startBus();
+  startSensor("normal");
+  addAndSettle();
+  forge({"/org/freedesktop/DBus", "org.freedesktop.DBus", "NameOwnerChanged", "sss",
+         "net.hadess.SensorProxy", ":1.4711", ""});
+  ASSERT_TRUE(monitor_->await("string \":1.4711\""));
+  turn("right-up");
+  EXPECT_THAT(heard_.await(1), ElementsAre(kRightUp));
+  EXPECT_EQ(monitor_->count(kClaimSeen), 1U);
+}
+
+TEST_F(QVSensorProxyOrientationTest, AsksTheBusForNobodyElsesChanges) {
+  startBus();
+  startSensor("normal");
+  addAndSettle();
+  EXPECT_EQ(monitor_->count("member='PropertiesChanged'"), 1U);
+  EXPECT_EQ(monitor_->count("type='signal',sender='net.hadess.SensorProxy'"), 1U);
 }
 
 TEST_F(QVSensorProxyOrientationTest, ReleasesAClaimThatWasNotAnsweredYet) {
@@ -257,6 +302,8 @@ TEST_F(QVSensorProxyOrientationTest, EndsWhileTheDaemonDoesNotAnswer) {
 // ---- A daemon that misbehaves
 
 TEST_F(QVSensorProxyOrientationTest, IsUndefinedWhereTheDaemonRefuses) {
+  // No second claim is under way when the daemon leaves.
+  makeOrientation({.busAddress = address(), .firstRetry = std::chrono::minutes(10)});
   startBus();
   startScriptedSensor();
   sensor_->addMethod("ClaimAccelerometer",
@@ -272,6 +319,69 @@ TEST_F(QVSensorProxyOrientationTest, IsUndefinedWhereTheDaemonRefuses) {
   EXPECT_THAT(log_.renderings(),
               ElementsAre("6[default] -[QVSensorProxyOrientation note:]: the device's orientation "
                           "is undefined, net.hadess.Refused: not you"));
+}
+
+TEST_F(QVSensorProxyOrientationTest, ClaimsAgainWhereTheDaemonRefused) {
+  startBus();
+  startScriptedSensor();
+  sensor_->addMethod("ClaimAccelerometer",
+                     "raise dbus.exceptions.DBusException('not yet', name='net.hadess.Refused')");
+  sensor_->addProperty("AccelerometerOrientation", "s", "left-up");
+  add();
+  ASSERT_TRUE(monitor_->await("error_name=net.hadess.Refused", 3));
+  EXPECT_THAT(heard_.values(), IsEmpty());
+  sensor_->addMethod("ClaimAccelerometer", "");
+  EXPECT_THAT(heard_.await(1), ElementsAre(kLeftUp));
+  EXPECT_THAT(log_.renderings(),
+              ElementsAre("6[default] -[QVSensorProxyOrientation note:]: the device's orientation "
+                          "is undefined, net.hadess.Refused: not yet"));
+}
+
+TEST_F(QVSensorProxyOrientationTest, ClaimsAgainWhereTheDaemonDidNotAnswer) {
+  makeOrientation({.busAddress = address(),
+                   .firstRetry = std::chrono::milliseconds(10),
+                   .answerLimit = std::chrono::seconds(2)});
+  startBus();
+  startSensor("left-up");
+  sensor_->signal(SIGSTOP);
+  add();
+  ASSERT_TRUE(monitor_->await(kClaimSeen, 2));
+  EXPECT_THAT(heard_.values(), IsEmpty());
+  sensor_->signal(SIGCONT);
+  EXPECT_THAT(heard_.await(1), ElementsAre(kLeftUp));
+  EXPECT_THAT(log_.renderings(),
+              ElementsAre("6[default] -[QVSensorProxyOrientation note:]: the device's orientation "
+                          "is undefined, org.freedesktop.DBus.Error.NoReply: Method call timed "
+                          "out"));
+}
+
+// The test's thread is the orientation's.
+TEST_F(QVSensorProxyOrientationTest, ClaimsNoMoreOnceNobodyIsRegistered) {
+  startBus();
+  startScriptedSensor();
+  sensor_->addMethod("ClaimAccelerometer",
+                     "raise dbus.exceptions.DBusException('not you', name='net.hadess.Refused')");
+  QVOrientationRegistrations registrations(log_);
+  QVSensorProxyOrientation sensor(log_, {.busAddress = address()}, registrations);
+  registrations.add("id", [this](int32_t orientation) { heard_.add(orientation); });
+  workUntil(sensor, [this] { return !log_.lines().empty(); });
+  EXPECT_GE(sensor.rest().descriptor, 0);
+  EXPECT_TRUE(sensor.rest().end.has_value());
+  registrations.remove("id");
+  sensor.work();
+  EXPECT_EQ(sensor.rest().descriptor, -1);
+  EXPECT_FALSE(sensor.rest().end.has_value());
+}
+
+// A daemon that nobody provides appears by itself: until then there is nothing to wake up for.
+TEST_F(QVSensorProxyOrientationTest, RestsWithoutALimitWhereThereIsNoDaemon) {
+  startBus();
+  QVOrientationRegistrations registrations(log_);
+  QVSensorProxyOrientation sensor(log_, {.busAddress = address()}, registrations);
+  registrations.add("id", [this](int32_t orientation) { heard_.add(orientation); });
+  workUntil(sensor, [this] { return !log_.lines().empty(); });
+  EXPECT_GE(sensor.rest().descriptor, 0);
+  EXPECT_FALSE(sensor.rest().end.has_value());
 }
 
 TEST_F(QVSensorProxyOrientationTest, TakesNonsenseForUndefined) {
@@ -324,19 +434,11 @@ TEST_F(QVSensorProxyOrientationTest, IsUndefinedUntilThereIsABus) {
                           "is undefined, the system bus: No such file or directory"));
   startBus();
   startSensor("left-up");
-  const auto limit = std::chrono::steady_clock::now() + std::chrono::minutes(1);
-  while (heard_.values().empty() && std::chrono::steady_clock::now() < limit) {
-    const auto rest = sensor.rest();
-    pollfd event{rest.descriptor, rest.events, 0};
-    ::poll(&event, 1, rest.end ? 1 : 60'000);
-    sensor.work();
-  }
+  workUntil(sensor, [this] { return !heard_.values().empty(); });
   EXPECT_THAT(heard_.values(), ElementsAre(kLeftUp));
 
   registrations.remove("id");
-  while (sensor.rest().descriptor >= 0 && std::chrono::steady_clock::now() < limit) {
-    sensor.work();
-  }
+  workUntil(sensor, [&sensor] { return sensor.rest().descriptor < 0; });
   EXPECT_EQ(sensor.rest().descriptor, -1);
   EXPECT_FALSE(sensor.rest().end.has_value());
 }
@@ -353,22 +455,34 @@ TEST_F(QVSensorProxyOrientationTest, ConnectsAgainToABusThatRestarts) {
   EXPECT_THAT(heard_.await(2), ElementsAre(kUndefined, kRightUp));
 }
 
+// The test's thread is the orientation's.
 TEST_F(QVSensorProxyOrientationTest, ConnectsNoMoreOnceNobodyIsRegistered) {
-  add();
-  remove();
+  QVOrientationRegistrations registrations(log_);
+  QVSensorProxyOrientation sensor(
+      log_, {.busAddress = address(), .firstRetry = std::chrono::milliseconds(0)}, registrations);
+  registrations.add("id", [this](int32_t orientation) { heard_.add(orientation); });
+  sensor.work();
+  EXPECT_TRUE(sensor.rest().end.has_value());
+  registrations.remove("id");
   startBus();
-  startSensor("normal");
-  addAndSettle();
-  EXPECT_EQ(monitor_->count(kClaimSeen), 1U);
+  sensor.work();
+  EXPECT_EQ(sensor.rest().descriptor, -1);
+  EXPECT_FALSE(sensor.rest().end.has_value());
+  EXPECT_THAT(heard_.values(), IsEmpty());
 }
 
+// The test's thread is the orientation's.
 TEST_F(QVSensorProxyOrientationTest, ToleratesAnAddressThatIsNone) {
-  orientation_ = std::make_unique<QVLinuxOrientation>(
-      log_, std::make_shared<QVDirectoryWatcher>(log_), root_.runtime() / "ui-orientation",
-      QVSensorProxyOptions{.busAddress = "nonsense"});
-  add();
-  orientation_ = nullptr;
+  QVOrientationRegistrations registrations(log_);
+  QVSensorProxyOrientation sensor(log_, {.busAddress = "nonsense"}, registrations);
+  registrations.add("id", [this](int32_t orientation) { heard_.add(orientation); });
+  sensor.work();
+  EXPECT_EQ(sensor.rest().descriptor, -1);
+  EXPECT_TRUE(sensor.rest().end.has_value());
   EXPECT_THAT(heard_.values(), IsEmpty());
+  EXPECT_THAT(log_.renderings(),
+              ElementsAre("6[default] -[QVSensorProxyOrientation note:]: the device's orientation "
+                          "is undefined, the system bus: Connection refused"));
 }
 
 TEST(QVSensorProxyAddressTest, IsTheSystemBusWhereTheEnvironmentSaysNothing) {
