@@ -1,0 +1,92 @@
+// The commands that take part: send and session.
+
+#include "tools/qvctl/QVCommandLineState.h"
+#include "tools/qvctl/QVSendCommand.h"
+#include "tools/qvctl/QVSessionCommand.h"
+#include "tools/qvctl/QVSessionRunCommand.h"
+
+namespace {
+
+constexpr const char* kEntries = "KEY[:KIND]=VALUE...";
+
+void addMessage(CLI::App& command, QVSendCommand::Options& options) {
+  command.add_option("--category", options.category, "What it is about (Session.Generic)")
+      ->option_text("NAME");
+  command.add_option("--type", options.type, "Its message type (Generic)")->option_text("NAME");
+  command.add_option("--payload", options.json, "A JSON object, @FILE, or - for standard input")
+      ->option_text("JSON");
+  command.add_option("entries", options.entries, "What it says")->option_text(kEntries);
+}
+
+void addSetup(CLI::App& command, QVSessionSetup& setup) {
+  command.add_option("--service", setup.service, "Its service type (generic)")->option_text("NAME");
+  command.add_option("--set", setup.entries, "An entry of its configuration")
+      ->option_text("KEY[:KIND]=VALUE")
+      ->expected(1)
+      ->take_all();
+  command.add_option("--configuration", setup.configuration, "A JSON object, @FILE, or -")
+      ->option_text("JSON");
+}
+
+}  // namespace
+
+void QVCommandLine::addSessions() {
+  State& state = *state_;
+  const auto [send, sendOptions] =
+      state.add<QVSendCommand>(state.app, "send", "Send one message to sessions");
+  send->add_option("--session", sendOptions->sessions, "To these sessions")
+      ->option_text("ID,...")
+      ->delimiter(',');
+  send->add_flag("--all", sendOptions->toAll, "To every session that is started");
+  addMessage(*send, *sendOptions);
+
+  CLI::App& session = *state.app.add_subcommand("session", "A session of one's own, for scripts");
+  session.require_subcommand(1);
+  using Operation = QVSessionCommand::Operation;
+  const auto add = [&](Operation operation, const char* name, const char* description) {
+    const auto added = state.add<QVSessionCommand>(session, name, description);
+    added.second->operation = operation;
+    if (operation != Operation::create) {
+      added.first->add_option("id", added.second->reporterID, "The session")
+          ->option_text("ID")
+          ->required();
+    }
+    return added;
+  };
+  const auto [create, createOptions] = add(Operation::create, "create", "Create one, and keep it");
+  state.addJSON(*create);
+  create->add_option("id", createOptions->setup.reporterID, "Its ID; else one is chosen")
+      ->option_text("ID");
+  addSetup(*create, createOptions->setup);
+  create->add_flag("--start", createOptions->start, "Start it, too");
+  add(Operation::start, "start", "Start one");
+  {
+    const auto [command, options] =
+        state.add<QVSendCommand>(session, "send", "Send it one message");
+    command->add_option("id", options->sessions, "The session")
+        ->option_text("ID")
+        ->required()
+        ->expected(1);
+    addMessage(*command, *options);
+  }
+  add(Operation::stop, "stop", "Stop one that was created here");
+  add(Operation::destroy, "destroy", "Destroy one that was created here");
+
+  const auto [run, runOptions] = state.add<QVSessionRunCommand>(
+      session, "run", "Run a command, and report its life: run [OPTIONS] -- COMMAND [ARGUMENT...]");
+  run->add_option("--id", runOptions->setup.reporterID, "The session's ID")->option_text("ID");
+  addSetup(*run, runOptions->setup);
+  run->add_option("--category", runOptions->category, "Of its messages (Session.Generic)")
+      ->option_text("NAME");
+  run->add_flag("--anyway", runOptions->anyway, "Run it without the service, too");
+  run->prefix_command();
+  run->callback([&state, runCommand = run, options = runOptions] {
+    options->command = runCommand->remaining();
+    if (!options->command.empty() && options->command[0] == "--") {
+      options->command.erase(options->command.begin());
+    }
+    state.action = [options](const QVToolContext& context) {
+      return QVSessionRunCommand::run(context, *options);
+    };
+  });
+}
