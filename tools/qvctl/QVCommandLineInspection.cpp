@@ -17,21 +17,27 @@ constexpr const char* kFile = "Its number in the list (1, the latest), its name,
 void addFilter(CLI::App& command, QVEventFilter::Words& words) {
   command.add_option("--kind", words.kinds, "start, message, analytics, energy, stop, loss")
       ->option_text("KIND,...")
-      ->delimiter(',');
+      ->delimiter(',')
+      ->allow_extra_args(false);
   command.add_option("--session", words.sessions, "Of these sessions")
       ->option_text("ID,...")
-      ->delimiter(',');
+      ->delimiter(',')
+      ->allow_extra_args(false);
   command.add_option("--service", words.services, "Of sessions of these service types")
       ->option_text("NAME,...")
-      ->delimiter(',');
+      ->delimiter(',')
+      ->allow_extra_args(false);
   command.add_option("--category", words.categories, "Playback, Session or Session.Playback")
       ->option_text("NAME,...")
-      ->delimiter(',');
+      ->delimiter(',')
+      ->allow_extra_args(false);
   command.add_option("--type", words.types, "Of these message types")
       ->option_text("NAME,...")
-      ->delimiter(',');
+      ->delimiter(',')
+      ->allow_extra_args(false);
   command.add_option("--name", words.names, "Of these names, * and ? match anything")
-      ->option_text("PATTERN");
+      ->option_text("PATTERN")
+      ->allow_extra_args(false);
   command.add_option("--since", words.since, "From then on: a time, or how long ago")
       ->option_text("TIME");
 }
@@ -102,7 +108,8 @@ void QVCommandLine::addSummary() {
   const auto [plot, options] = add(Operation::plot, "plot", "Draw its numbers over its messages");
   plot->add_option("--key", options->keys, "These keys alone, * and ? match anything")
       ->option_text("PATTERN,...")
-      ->delimiter(',');
+      ->delimiter(',')
+      ->allow_extra_args(false);
   plot->add_option("--width", options->width, "Columns of the whole")->option_text("N");
   plot->add_option("--height", options->height, "Rows of each picture")->option_text("N");
   plot->add_flag("--ascii", options->ascii, "Draw with ASCII alone");

@@ -22,8 +22,7 @@ void addSetup(CLI::App& command, QVSessionSetup& setup) {
   command.add_option("--service", setup.service, "Its service type (generic)")->option_text("NAME");
   command.add_option("--set", setup.entries, "An entry of its configuration")
       ->option_text("KEY[:KIND]=VALUE")
-      ->expected(1)
-      ->take_all();
+      ->allow_extra_args(false);
   command.add_option("--configuration", setup.configuration, "A JSON object, @FILE, or -")
       ->option_text("JSON");
 }
@@ -36,7 +35,8 @@ void QVCommandLine::addSessions() {
       state.add<QVSendCommand>(state.app, "send", "Send one message to sessions");
   send->add_option("--session", sendOptions->sessions, "To these sessions")
       ->option_text("ID,...")
-      ->delimiter(',');
+      ->delimiter(',')
+      ->allow_extra_args(false);
   send->add_flag("--all", sendOptions->toAll, "To every session that is started");
   addMessage(*send, *sendOptions);
 
@@ -63,30 +63,21 @@ void QVCommandLine::addSessions() {
   {
     const auto [command, options] =
         state.add<QVSendCommand>(session, "send", "Send it one message");
-    command->add_option("id", options->sessions, "The session")
-        ->option_text("ID")
-        ->required()
-        ->expected(1);
+    const auto take = [to = options](int64_t id) { to->sessions = {id}; };
+    command->add_option_function<int64_t>("id", take, "The session")->option_text("ID")->required();
     addMessage(*command, *options);
   }
   add(Operation::stop, "stop", "Stop one that was created here");
   add(Operation::destroy, "destroy", "Destroy one that was created here");
 
-  const auto [run, runOptions] = state.add<QVSessionRunCommand>(
-      session, "run", "Run a command, and report its life: run [OPTIONS] -- COMMAND [ARGUMENT...]");
+  const auto [run, runOptions] =
+      state.add<QVSessionRunCommand>(session, "run", "Run a command, and report its life");
   run->add_option("--id", runOptions->setup.reporterID, "The session's ID")->option_text("ID");
   addSetup(*run, runOptions->setup);
   run->add_option("--category", runOptions->category, "Of its messages (Session.Generic)")
       ->option_text("NAME");
   run->add_flag("--anyway", runOptions->anyway, "Run it without the service, too");
-  run->prefix_command();
-  run->callback([&state, runCommand = run, options = runOptions] {
-    options->command = runCommand->remaining();
-    if (!options->command.empty() && options->command[0] == "--") {
-      options->command.erase(options->command.begin());
-    }
-    state.action = [options](const QVToolContext& context) {
-      return QVSessionRunCommand::run(context, *options);
-    };
-  });
+  run->add_option("command", runOptions->command, "What is run; behind --")
+      ->option_text("COMMAND [ARGUMENT...]")
+      ->required();
 }

@@ -4,6 +4,8 @@
 #include "tools/qvctl/QVTimeText.h"
 
 #include <string>
+#include <string_view>
+#include <vector>
 
 namespace {
 
@@ -38,17 +40,39 @@ Style styleOf(Kind kind) {
   }
 }
 
+// On a narrower terminal little would be left for the contents: then lines have the time of day
+// alone, and each day begins with its date.
+constexpr std::size_t kWideColumns = 130;
+constexpr std::size_t kDateBytes = std::string_view("2026-11-21").size();
+
+bool isNarrow(const QVToolOutput& output) {
+  return output.columns() > 0 && output.columns() < kWideColumns;
+}
+
+std::vector<QVTable::Column> columnsFor(const QVToolOutput& output) {
+  using Align = QVTable::Align;
+  if (isNarrow(output)) {
+    return {{"TIME", Align::left, 15},
+            {"KIND", Align::left, 9},
+            {"SESSION", Align::right, 7},
+            {"SERVICE", Align::left, 9},
+            {"CATEGORY", Align::left, 10},
+            {"TYPE", Align::left, 5},
+            {"CONTENTS"}};
+  }
+  return {{"TIME", Align::left, 26},
+          {"KIND", Align::left, 9},
+          {"SESSION", Align::right, 8},
+          {"SERVICE", Align::left, 13},
+          {"CATEGORY", Align::left, 16},
+          {"TYPE", Align::left, 8},
+          {"CONTENTS"}};
+}
+
 }  // namespace
 
 QVEventPrinter::QVEventPrinter(QVToolOutput& output, bool isInFull)
-    : output_(output),
-      table_(output, {{"TIME", QVTable::Align::left, 26},
-                      {"KIND", QVTable::Align::left, 9},
-                      {"SESSION", QVTable::Align::right, 8},
-                      {"SERVICE", QVTable::Align::left, 13},
-                      {"CATEGORY", QVTable::Align::left, 16},
-                      {"TYPE", QVTable::Align::left, 8},
-                      {"CONTENTS"}}) {
+    : output_(output), isNarrow_(isNarrow(output)), table_(output, columnsFor(output)) {
   if (isInFull) table_.showInFull();
 }
 
@@ -61,7 +85,14 @@ void QVEventPrinter::show(const QVStoredEvent& event) {
     output_.json(event.json());
     return;
   }
-  table_.show({QVLocalTimeText(event.time),
+  std::string time = QVLocalTimeText(event.time);
+  if (isNarrow_) {
+    const std::string date = time.substr(0, kDateBytes);
+    if (date != date_) output_.line(output_.painted(Style::title, date));
+    date_ = date;
+    time.erase(0, kDateBytes + 1);
+  }
+  table_.show({time,
                {std::string(QVStoredEvent::kindName(event.kind)), styleOf(event.kind)},
                event.session ? std::to_string(*event.session) : std::string(),
                event.service,

@@ -4,6 +4,8 @@
 #include "tools/qvctl/QVTable.h"
 #include "tools/qvctl/QVToolOutput.h"
 
+#include <string>
+
 // Shows events: a table for people, whose rows come one by one, or a line of JSON each.
 //
 // Threads: one at a time. The output outlives it.
@@ -17,5 +19,7 @@ class QVEventPrinter {
 
  private:
   QVToolOutput& output_;
+  const bool isNarrow_;
   QVTable table_;
+  std::string date_;  // of the last event, where lines have none
 };

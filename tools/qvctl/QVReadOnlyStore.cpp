@@ -5,6 +5,8 @@
 #include "tools/qvctl/QVToolFailure.h"
 
 #include <cerrno>
+#include <chrono>
+#include <thread>
 #include <utility>
 
 #include <sqlite3.h>
@@ -17,8 +19,10 @@ constexpr const char* kFileSystem = "quietvox-read-only";
 // How long a query waits for a service that locks its store, which it does as it starts and ends.
 constexpr int kBusyMilliseconds = 5000;
 
-// The service may open or close the store between our looking and our opening.
-constexpr int kAttempts = 5;
+// The service may open or close the store between our looking and our opening, and takes some
+// milliseconds for it: half a second in all.
+constexpr int kAttempts = 25;
+constexpr std::chrono::milliseconds kPause{20};
 
 sqlite3_vfs& usualFileSystem() {
   return *::sqlite3_vfs_find(nullptr);
@@ -74,6 +78,7 @@ std::unique_ptr<QVReadOnlyStore> QVReadOnlyStore::open(const std::filesystem::pa
       case Outcome::empty:
         return nullptr;
       case Outcome::failed:
+        std::this_thread::sleep_for(kPause);
         break;
     }
   }

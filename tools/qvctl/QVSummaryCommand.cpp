@@ -66,8 +66,9 @@ void drawColumn(QVToolOutput& output, const std::string& key, const QVSummaryFil
   const std::vector<std::string> rows = plot.draw(column, 1, all.messages);
   for (std::size_t i = 0; i < rows.size(); ++i) {
     std::string edge;
-    if (i == 0) edge = QVText(highest);
-    if (i + 1 == rows.size()) edge = QVText(lowest);
+    const bool isLevel = lowest == highest;
+    if (isLevel ? i == rows.size() / 2 : i == 0) edge = QVText(highest);
+    if (!isLevel && i + 1 == rows.size()) edge = QVText(lowest);
     std::string line = label(edge) + rows[i];
     line.erase(line.find_last_not_of(' ') + 1);
     output.line(line);

@@ -9,6 +9,9 @@ namespace {
 
 constexpr std::size_t kGap = 2;
 
+// The last column is not cut to less than this; the line is wrapped then.
+constexpr std::size_t kLeastColumns = 16;
+
 }  // namespace
 
 QVTable::QVTable(QVToolOutput& output, std::vector<Column> columns)
@@ -66,7 +69,7 @@ void QVTable::printRow(const Row& row, const std::vector<std::size_t>& widths) {
     const bool isLast = i + 1 == row.size();
     std::string text = row[i].text;
     const std::size_t end = output_.columns();
-    if (isLast && end > used && !isInFull_) text = QVClippedText(text, end - used);
+    if (isLast && end >= used + kLeastColumns && !isInFull_) text = QVClippedText(text, end - used);
     const std::size_t width = QVDisplayWidth(text);
     const std::size_t padding = widths[i] > width ? widths[i] - width : 0;
     const bool isRight = columns_[i].align == Align::right;

@@ -85,7 +85,7 @@ std::unique_ptr<QVTerminal> QVToolTest::terminal(
   all["LC_ALL"] = "C.UTF-8";
   for (const auto& [name, value] : more) all[name] = value;
   return std::make_unique<QVTerminal>(
-      QVTerminal::Options{.arguments = command(arguments), .environment = all});
+      QVTerminal::Options{.arguments = command(arguments), .environment = all, .columns = 160});
 }
 
 std::string QVToolTest::show(const Arguments& arguments,
@@ -111,11 +111,14 @@ QVToolTest::Arguments QVToolTest::withoutPrivilege() {
   return {"setpriv", "--bounding-set=-dac_override,-dac_read_search", "--inh-caps=-all"};
 }
 
-QVPeerClient QVToolTest::startSession(int64_t reporterID, uint16_t serviceType,
-                                      const QVDictionary& configuration) {
-  auto client = connectClient();
-  client.create(reporterID, serviceType);
-  if (!configuration.empty()) client.configure(configuration, reporterID);
-  client.start(reporterID);
-  return client;
+QVPeerClient& QVToolTest::client() {
+  service();
+  return client_ ? *client_ : client_.emplace(root_.socket());
+}
+
+void QVToolTest::startSession(int64_t reporterID, uint16_t serviceType,
+                              const QVDictionary& configuration) {
+  client().create(reporterID, serviceType);
+  if (!configuration.empty()) client().configure(configuration, reporterID);
+  client().start(reporterID);
 }

@@ -6,6 +6,7 @@
 
 #include <map>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -46,7 +47,11 @@ class QVToolTest : public QVEndToEndTest {
   // A program that turns itself into another one without root's right to pass over file modes.
   static Arguments withoutPrivilege();
 
-  // A client with a session of that service type, started.
-  QVPeerClient startSession(int64_t reporterID, uint16_t serviceType,
-                            const QVDictionary& configuration = {});
+  // This program's own connection to the service.
+  QVPeerClient& client();
+  // A session of it, of that service type, started.
+  void startSession(int64_t reporterID, uint16_t serviceType,
+                    const QVDictionary& configuration = {});
+
+  std::optional<QVPeerClient> client_;
 };

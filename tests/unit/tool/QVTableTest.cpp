@@ -54,7 +54,7 @@ TEST_F(QVTableTest, KeepsHostileTextInItsCell) {
   table.add({"a\nb\033[2J", "1"});
   table.print();
   EXPECT_EQ(text(),
-            "NAME          END\n"
+            "NAME         END\n"
             "a\\nb\\x1B[2J  1\n");
 }
 
