@@ -1,41 +1,41 @@
 # Completion of qvctl for bash. To be found by bash-completion under the name "qvctl", or sourced.
 
-# The commands below each command.
+# The commands below each command, and below the program.
 declare -gA _qvctl_commands=(
-  ['']='status sessions events watch send session reporting summary channels kill'
-  ['session']='create start send stop destroy run'
-  ['reporting']='on off show'
-  ['summary']='list show open plot'
+  ['qvctl']='status sessions events watch send session reporting summary channels kill'
+  ['qvctl session']='create start send stop destroy run'
+  ['qvctl reporting']='on off show'
+  ['qvctl summary']='list show open plot'
 )
 
 # The options of each command.
 declare -gA _qvctl_options=(
-  ['']='--help --version --socket --root --json'
-  ['status']='--help --socket --root --json --start'
-  ['sessions']='--help --socket --root --json --start'
-  ['events']='--help --socket --root --json --kind --session --service --category --type --name
+  ['qvctl']='--help --version --socket --root --json'
+  ['qvctl status']='--help --socket --root --json --start'
+  ['qvctl sessions']='--help --socket --root --json --start'
+  ['qvctl events']='--help --socket --root --json --kind --session --service --category --type --name
     --since --until --last --full'
-  ['watch']='--help --socket --root --json --kind --session --service --category --type --name
+  ['qvctl watch']='--help --socket --root --json --kind --session --service --category --type --name
     --since --count --for --full'
-  ['send']='--help --socket --root --session --all --category --type --payload'
-  ['session']='--help'
-  ['session create']='--help --socket --root --json --service --set --configuration --start'
-  ['session start']='--help --socket --root'
-  ['session send']='--help --socket --root --category --type --payload'
-  ['session stop']='--help --socket --root'
-  ['session destroy']='--help --socket --root'
-  ['session run']='--help --socket --root --id --service --set --configuration --category --anyway'
-  ['reporting']='--help'
-  ['reporting on']='--help --socket --root --json'
-  ['reporting off']='--help --socket --root --json'
-  ['reporting show']='--help --socket --root --json'
-  ['summary']='--help'
-  ['summary list']='--help --socket --root --json'
-  ['summary show']='--help --socket --root --json'
-  ['summary open']='--help --socket --root'
-  ['summary plot']='--help --socket --root --json --key --width --height --ascii'
-  ['channels']='--help --socket --root --json --group --interval --count'
-  ['kill']='--help --socket --root'
+  ['qvctl send']='--help --socket --root --session --all --category --type --payload'
+  ['qvctl session']='--help'
+  ['qvctl session create']='--help --socket --root --json --service --set --configuration --start'
+  ['qvctl session start']='--help --socket --root'
+  ['qvctl session send']='--help --socket --root --category --type --payload'
+  ['qvctl session stop']='--help --socket --root'
+  ['qvctl session destroy']='--help --socket --root'
+  ['qvctl session run']='--help --socket --root --id --service --set --configuration --category --anyway'
+  ['qvctl reporting']='--help'
+  ['qvctl reporting on']='--help --socket --root --json'
+  ['qvctl reporting off']='--help --socket --root --json'
+  ['qvctl reporting show']='--help --socket --root --json'
+  ['qvctl summary']='--help'
+  ['qvctl summary list']='--help --socket --root --json'
+  ['qvctl summary show']='--help --socket --root --json'
+  ['qvctl summary open']='--help --socket --root'
+  ['qvctl summary plot']='--help --socket --root --json --key --width --height --ascii'
+  ['qvctl channels']='--help --socket --root --json --group --interval --count'
+  ['qvctl kill']='--help --socket --root'
 )
 
 _qvctl_services='generic voxa telephony haptics alarms standalone soundautoconfig longformaudio
@@ -78,7 +78,7 @@ _qvctl_values() {
 }
 
 _qvctl() {
-  local current=${COMP_WORDS[COMP_CWORD]} command='' word values position
+  local current=${COMP_WORDS[COMP_CWORD]} command=qvctl word values position
   local -a _qvctl_places=()
   COMPREPLY=()
   for ((position = 1; position < COMP_CWORD; ++position)); do
@@ -92,7 +92,7 @@ _qvctl() {
       --socket | --root) _qvctl_places+=("$word" "${COMP_WORDS[position + 1]}") ;;
     esac
     if [[ " ${_qvctl_commands[$command]-} " == *" $word "* ]]; then
-      command=${command:+$command }$word
+      command="$command $word"
     fi
   done
 
@@ -105,9 +105,9 @@ _qvctl() {
     mapfile -t COMPREPLY < <(compgen -W "${_qvctl_options[$command]-}" -- "$current")
   elif [[ -n ${_qvctl_commands[$command]-} ]]; then
     mapfile -t COMPREPLY < <(compgen -W "${_qvctl_commands[$command]}" -- "$current")
-  elif [[ $command == session\ * && $command != *\ create && $command != *\ run ]]; then
+  elif [[ $command == qvctl\ session\ * && $command != *\ create && $command != *\ run ]]; then
     mapfile -t COMPREPLY < <(compgen -W "$(_qvctl_sessions)" -- "$current")
-  elif [[ $command == summary\ * && $command != *\ list ]]; then
+  elif [[ $command == qvctl\ summary\ * && $command != *\ list ]]; then
     mapfile -t COMPREPLY < <(compgen -W "$(_qvctl_ask summary list | sed 1d | sed 's/.* //')" -- "$current")
   fi
 }
