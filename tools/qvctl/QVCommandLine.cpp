@@ -4,20 +4,10 @@
 
 #include <iostream>
 
-namespace {
-
-constexpr const char* kFooter =
-    "Exit status: 0 done, 1 failed, 2 wrong usage, 3 the service is not running or cannot be\n"
-    "reached, 4 not permitted; session run: that of its command.\n"
-    "Names of service types, categories and message types, in any case, and their numbers are\n"
-    "taken alike: telephony or 2, Session.Playback or 0x08000003, Start or 1. See qvctl(1).";
-
-}  // namespace
-
 QVCommandLine::QVCommandLine() : state_(std::make_unique<State>()) {
   CLI::App& app = state_->app;
   app.name("qvctl");
-  app.footer(kFooter);
+  app.footer(State::kFooter);
   app.set_version_flag("--version", "qvctl " QV_VERSION, "Print the version and exit");
   app.set_help_flag("--help,-h", "Print this text and exit");
   app.require_subcommand(1);

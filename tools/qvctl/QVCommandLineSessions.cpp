@@ -7,15 +7,14 @@
 
 namespace {
 
-constexpr const char* kEntries = "KEY[:KIND]=VALUE...";
-
 void addMessage(CLI::App& command, QVSendCommand::Options& options) {
   command.add_option("--category", options.category, "What it is about (Session.Generic)")
       ->option_text("NAME");
   command.add_option("--type", options.type, "Its message type (Generic)")->option_text("NAME");
   command.add_option("--payload", options.json, "A JSON object, @FILE, or - for standard input")
       ->option_text("JSON");
-  command.add_option("entries", options.entries, "What it says")->option_text(kEntries);
+  command.add_option("entries", options.entries, "What it says")
+      ->option_text("KEY[:KIND]=VALUE...");
 }
 
 void addSetup(CLI::App& command, QVSessionSetup& setup) {
@@ -31,6 +30,7 @@ void addSetup(CLI::App& command, QVSessionSetup& setup) {
 
 void QVCommandLine::addSessions() {
   State& state = *state_;
+  const std::string footer = std::string(State::kEntries).append("\n\n").append(State::kFooter);
   const auto [send, sendOptions] =
       state.add<QVSendCommand>(state.app, "send", "Send one message to sessions");
   send->add_option("--session", sendOptions->sessions, "To these sessions")
@@ -39,6 +39,7 @@ void QVCommandLine::addSessions() {
       ->allow_extra_args(false);
   send->add_flag("--all", sendOptions->toAll, "To every session that is started");
   addMessage(*send, *sendOptions);
+  send->footer(footer);
 
   CLI::App& session = *state.app.add_subcommand("session", "A session of one's own, for scripts");
   session.require_subcommand(1);
@@ -59,6 +60,7 @@ void QVCommandLine::addSessions() {
       ->option_text("ID");
   addSetup(*create, createOptions->setup);
   create->add_flag("--start", createOptions->start, "Start it, too");
+  create->footer(footer);
   add(Operation::start, "start", "Start one");
   {
     const auto [command, options] =
@@ -66,6 +68,7 @@ void QVCommandLine::addSessions() {
     const auto take = [to = options](int64_t id) { to->sessions = {id}; };
     command->add_option_function<int64_t>("id", take, "The session")->option_text("ID")->required();
     addMessage(*command, *options);
+    command->footer(footer);
   }
   add(Operation::stop, "stop", "Stop one that was created here");
   add(Operation::destroy, "destroy", "Destroy one that was created here");
@@ -77,6 +80,7 @@ void QVCommandLine::addSessions() {
   run->add_option("--category", runOptions->category, "Of its messages (Session.Generic)")
       ->option_text("NAME");
   run->add_flag("--anyway", runOptions->anyway, "Run it without the service, too");
+  run->footer(footer);
   run->add_option("command", runOptions->command, "What is run; behind --")
       ->option_text("COMMAND [ARGUMENT...]")
       ->required();

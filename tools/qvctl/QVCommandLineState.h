@@ -19,6 +19,18 @@ struct QVCommandLine::State {
   bool json = false;
   Action action;
 
+  // Behind the options of every command.
+  static constexpr const char* kFooter =
+      "Exit status: 0 done, 1 failed, 2 wrong usage, 3 the service is not running or cannot be\n"
+      "reached, 4 not permitted; session run: that of its command.\n"
+      "Names of service types, categories and message types, in any case, and their numbers are\n"
+      "taken alike: telephony or 2, Session.Playback or 0x08000003, Start or 1. See qvctl(1).";
+  // And of those that take entries of messages or configurations.
+  static constexpr const char* kEntries =
+      "Entries: frames=480 is an integer, gain=1.5 a double, on=true a boolean, route=speaker a\n"
+      "string; KEY:KIND=VALUE gives the kind, int, uint, double, bool, string or json:\n"
+      "gain:double=1 name:string=5 device:json={\"a\":[1,2]}";
+
   // Options of every command.
   void addPlaces(CLI::App& command) {
     command.add_option("--socket", socket, "The service's socket")->option_text("PATH");

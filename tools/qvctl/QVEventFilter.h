@@ -17,14 +17,14 @@ class QVEventFilter {
  public:
   // As the command line has them. Failures: QVToolFailure, wrongUsage.
   struct Words {
-    std::vector<std::string> kinds;       // empty: all
-    std::vector<std::string> sessions;    // reporter IDs
-    std::vector<std::string> services;    // names or numbers
-    std::vector<std::string> categories;  // "Playback", "Session", "Session.Playback", numbers
-    std::vector<std::string> types;
-    std::vector<std::string> names;  // patterns with * and ?
-    std::string since;
-    std::string until;
+    std::vector<std::string> kinds = {};       // empty: all
+    std::vector<std::string> sessions = {};    // reporter IDs
+    std::vector<std::string> services = {};    // names or numbers
+    std::vector<std::string> categories = {};  // "Playback", "Session", "Session.Playback", numbers
+    std::vector<std::string> types = {};
+    std::vector<std::string> names = {};  // patterns with * and ?
+    std::string since = {};
+    std::string until = {};
   };
 
   QVEventFilter();

@@ -60,6 +60,8 @@ void QVEventFollower::readNew(const Receiver& receiver) {
     if (!reader_.filter().wants(kind)) continue;
     int64_t& after = after_[static_cast<std::size_t>(kind)];
     const int64_t last = reader_.range(kind).last;
+    // A table that was emptied, to keep the store within its limit, numbers its rows anew.
+    if (last < after) after = 0;
     while (after < last) {
       reader_.read(kind, after, last, events);
       after = std::min(last, after + QVEventRowReader::kRowsAtATime);

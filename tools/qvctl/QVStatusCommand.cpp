@@ -74,9 +74,11 @@ QVStatusCommand::Store QVStatusCommand::findStore() const {
       const auto bytes = std::filesystem::file_size(path.string() + suffix, missing);
       if (!missing) found.bytes += static_cast<int64_t>(bytes);
     }
-    // Rows are only added at one end and removed at the other: this counts them at once.
+    // Rows are added at one end and removed at the other. Each end is one look; counting them all,
+    // or asking for both at once, would read the whole table.
     const auto count = [&store](const char* table) {
-      return store->number(QVText("SELECT coalesce(max(id) + 1 - min(id), 0) FROM ", table));
+      const int64_t last = store->number(QVText("SELECT max(id) FROM ", table));
+      return last == 0 ? 0 : last + 1 - store->number(QVText("SELECT min(id) FROM ", table));
     };
     found.sessions = count("beacon_session");
     found.messages = count("beacon_message");
