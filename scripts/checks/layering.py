@@ -73,6 +73,9 @@ _ANY = r".*"
 # source: it is linked without the rest.
 _SHARED_WITH_BUS = r"platform/linux/(QVDescriptor|QVThreadAnnotations|QVWakeUpBatch)\.h"
 
+_SHARED_WITH_TOOLS = (r"platform/linux/(QVEventStoreSchema|QVJSONFile|QVJSONText|QVPosixAtomicFile|"
+                      r"QVRegularFile|QVServiceDirectories|tally/\w+)\.h")
+
 # The first folder that a file lies in decides.
 LAYERS = [
     Layer("platform/fake", [_PLATFORM, r"platform/fake/\w+\.h"]),
@@ -89,9 +92,11 @@ LAYERS = [
           system=True),
     Layer("daemon", [_PLATFORM, r"platform/linux/(\w+/)*\w+\.h", r"QVServices/.*\.h", r"daemon/.*\.h"],
           system=True),
-    # Of the core, the tools know the vocabulary alone.
+    # Of the core, the tools know the vocabulary alone; of the adapters those that read and write
+    # files, so that they are read in one way only.
     Layer("tools",
-          [r"tools/.*\.h", r"client/.*\.h", r"QVServices/Statistics/QVReportingVocabulary\.h"],
+          [_PLATFORM, r"tools/.*\.h", r"client/.*\.h",
+           r"QVServices/Statistics/QVReportingVocabulary\.h", _SHARED_WITH_TOOLS],
           system=True, libraries=["SQLite"]),
     Layer("tests", [_ANY], system=True, libraries=LIBRARIES),
     Layer("bench", [_ANY], system=True, libraries=LIBRARIES),

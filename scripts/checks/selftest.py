@@ -131,6 +131,9 @@ FAULTS = [
     fault("layering", "layering", "tools/main.cpp:1", "tools/main.cpp",
           '#include "QVServices/Statistics/Service/QVServe.h"\n',
           **{"QVServices/Statistics/Service/QVServe.h": HEADER}),
+    fault("layering", "layering", "tools/main.cpp:1", "tools/main.cpp",
+          '#include "platform/linux/QVReal.h"\n', **{"platform/linux/QVReal.h": HEADER}),
+    fault("layering", "layering", "tools/main.cpp:1", "tools/main.cpp", "#include <rapidjson/reader.h>\n"),
     fault("layering", "layering", "platform/other/QVOther.cpp:1", "platform/other/QVOther.cpp",
           '#include "platform/linux/bus/QVBusThing.h"\n'),
     # The core and the machine.
@@ -197,6 +200,115 @@ FAULTS = [
           PAGE.replace(".B \\-\\-all\n", "")),
 ]
 
+# A program with help, and what describes it; faults are laid over it in the same way.
+def help_text(options, commands=()):
+    lines = ["A tool", "Usage: tool", "", "Options:", *(f"  {option}  Text" for option in options)]
+    if commands:
+        lines += ["", "Subcommands:", *(f"  {command}  Text" for command in commands)]
+    return "\n".join(lines) + "\n"
+
+
+TOOL_MAN = """.Dd January 1, 2026
+.Dt TOOL 1
+.Os
+.Sh NAME
+.Nm tool
+.Nd looks at things
+.Sh OPTIONS
+.Bl -tag -width indent
+.It Fl h , Fl -help
+Help.
+.It Fl -version
+Version.
+.El
+.Sh COMMANDS
+.Ss look
+.Bl -tag -width indent
+.It Fl n , Fl -last Ar n
+The last.
+.El
+.Ss group list
+Lists, without
+.Fl -last .
+"""
+TOOL_BASH = """declare -gA _qvctl_commands=(
+  ['tool']='look group'
+  ['tool group']='list'
+)
+declare -gA _qvctl_options=(
+  ['tool']='--help --version'
+  ['tool look']='--help
+    --last'
+  ['tool group']='--help'
+  ['tool group list']='--help'
+)
+"""
+TOOL_ZSH = """_qvctl_places=('(- *)--help[text]')
+_qvctl_look() {
+  _arguments $_qvctl_places '(-n --last)'{-n,--last}'[text]:number:'
+}
+_qvctl_group() {
+  _qvctl_below group \\
+    'list:text'
+}
+_qvctl_group_list() {
+  _arguments $_qvctl_places
+}
+_qvctl_below() {
+  _arguments '(- *)--help[text]'
+}
+_qvctl() {
+  commands=(
+    'look:text'
+    'group:text'
+  )
+  _arguments $_qvctl_places '--version[text]'
+}
+"""
+TOOL_HELP = {
+    "": help_text(["-h,--help", "--version"], ["look", "group"]),
+    "look ": help_text(["-h,--help", "-n,--last N"]),
+    "group ": help_text(["-h,--help"], ["list"]),
+    "group list ": help_text(["-h,--help"]),
+}
+
+
+def tool_program(**changes):
+    texts = {**TOOL_HELP, **changes}
+    cases = "".join(f"'{command}--help') cat <<'END'\n{text}END\n;;\n" for command, text in texts.items())
+    return f"#!/usr/bin/env bash\ncase \"$*\" in\n{cases}*) exit 2 ;;\nesac\n"
+
+
+MAN = "tools/qvctl/qvctl.1"
+BASH = "tools/qvctl/completions/qvctl.bash"
+ZSH = "tools/qvctl/completions/_qvctl"
+TOOL = {"program": tool_program(), MAN: TOOL_MAN, BASH: TOOL_BASH, ZSH: TOOL_ZSH}
+
+MORE_OPTIONS = tool_program(**{"look ": help_text(["-h,--help", "-n,--last N", "--full"])})
+MORE_COMMANDS = tool_program(**{"group ": help_text(["-h,--help"], ["list", "show"]),
+                                "group show ": help_text(["-h,--help"])})
+
+TOOL_FAULTS = [
+    # What the program has and a description lacks.
+    *[fault("tool", "tool", place, "program", program) for program in (MORE_OPTIONS, MORE_COMMANDS)
+      for place in ((f"{MAN}:15", f"{BASH}:5", f"{ZSH}:2") if program == MORE_OPTIONS else
+                    (f"{MAN}:1", f"{BASH}:1", f"{ZSH}:5"))],
+    # What a description has and the program lacks.
+    fault("tool", "tool", f"{MAN}:15", MAN, TOOL_MAN.replace(".It Fl n ,", ".It Fl -gone\n.It Fl n ,")),
+    fault("tool", "tool", f"{MAN}:15", MAN, TOOL_MAN.replace("Fl n , ", "")),
+    fault("tool", "tool", f"{MAN}:7", MAN, TOOL_MAN.replace(".It Fl -version\nVersion.\n", "")),
+    fault("tool", "tool", f"{MAN}:1", MAN, TOOL_MAN + ".Ss gone\nText.\n"),
+    fault("tool", "tool", f"{BASH}:5", BASH, TOOL_BASH.replace("'--help --version'", "'--help --gone --version'")),
+    fault("tool", "tool", f"{BASH}:1", BASH, TOOL_BASH.replace("'look group'", "'look group gone'")),
+    fault("tool", "tool", f"{BASH}:5", BASH, TOOL_BASH.replace("  ['tool group']='--help'\n", "")),
+    fault("tool", "tool", f"{ZSH}:2", ZSH, TOOL_ZSH.replace("number:'", "number:' '--gone[text]'")),
+    fault("tool", "tool", f"{ZSH}:1", ZSH, TOOL_ZSH.replace("_qvctl_look()", "_qvctl_gone()")),
+    fault("tool", "tool", f"{ZSH}:5", ZSH, TOOL_ZSH.replace("'list:text'", "'list:text'\n    'gone:text'")),
+]
+# Only groff can tell.
+if shutil.which("groff"):
+    TOOL_FAULTS.append(fault("tool", "tool", f"{MAN}:19", MAN, TOOL_MAN.replace(".El\n.Ss group", ".\\\\*[gone]\n.El\n.Ss group")))
+
 TIDY_FAULTS = [
     fault("tidy", "tidy", f"{CORE}:7", CORE,
           "#include <string>\n#include <utility>\n\nstatic void take(std::string&&) {}\n"
@@ -234,6 +346,8 @@ class Sandbox:
 
     def run(self, check):
         name, *arguments = check.split()
+        if name == "tool":
+            arguments += ["--program", os.path.join(self.root, "program")]
         answer = subprocess.run(
             [sys.executable, os.path.join(CHECKS, f"{name}.py"), "--root", self.root, *arguments],
             cwd=self.root, capture_output=True, text=True)
@@ -254,8 +368,13 @@ class SelfTest:
         if not condition:
             self.failures.append(text)
 
+    @staticmethod
+    def good(check):
+        """The project without faults that the check's faults are laid over."""
+        return {"tidy": {}, "tool": TOOL}.get(check, GOOD)
+
     def finds(self, check, rule, place, files):
-        with Sandbox(files if check == "tidy" else {**GOOD, **files}) as sandbox:
+        with Sandbox({**self.good(check), **files}) as sandbox:
             sandbox.configure([CORE])
             status, out, error = sandbox.run(check)
         lines = out.splitlines()
@@ -265,7 +384,7 @@ class SelfTest:
                     f"it ends with {status} and says:\n  " + "\n  ".join(lines + [error]))
 
     def passes(self, check):
-        with Sandbox(GOOD) as sandbox:
+        with Sandbox(self.good(check)) as sandbox:
             status, out, error = sandbox.run(check)
         self.expect(status == 0 and not out, f"{check} finds fault with a good project:\n{out}{error}")
 
@@ -291,9 +410,9 @@ class SelfTest:
 def main():
     test = SelfTest()
     for check in ("format", "layering", "words", "files", "programs", "docs",
-                  "docs --programs build/dev/bin"):
+                  "docs --programs build/dev/bin", "tool"):
         test.passes(check)
-    faults = list(FAULTS)
+    faults = FAULTS + TOOL_FAULTS
     if "--fast" not in sys.argv[1:]:
         faults += TIDY_FAULTS
         test.keeps_clean_runs()

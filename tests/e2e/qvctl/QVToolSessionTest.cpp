@@ -1,0 +1,201 @@
+// qvctl send and session.
+
+#include "tests/e2e/qvctl/QVToolTest.h"
+
+#include <csignal>
+#include <filesystem>
+#include <fstream>
+
+#include <gmock/gmock.h>
+
+namespace {
+
+using ::testing::AllOf;
+using ::testing::ElementsAre;
+using ::testing::HasSubstr;
+using ::testing::SizeIs;
+using ::testing::StartsWith;
+
+constexpr uint16_t kTelephony = 2;
+
+class QVToolSessionTest : public QVToolTest {
+ protected:
+  std::vector<std::string> messages(int64_t session) const {
+    return store().rows("SELECT category, type, payload FROM beacon_message WHERE session_id = " +
+                        std::to_string(session) + " AND type <> 65535 ORDER BY id");
+  }
+};
+
+TEST_F(QVToolSessionTest, SendsToSessionsOfOthers) {
+  startSession(7, kTelephony);
+  EXPECT_EQ(run({"send", "--session", "7", "--category", "Session.Playback", "--type", "start",
+                 "frames=480", "gain:double=1", "name:string=5", "on=true",
+                 R"(device:json={"a":[1,2]})"}),
+            "");
+  EXPECT_EQ(run({"send", "--all", "--category", "0x40000007", "--type", "2", "--payload",
+                 R"({"b":[1.5]})"}),
+            "");
+  endService();
+  EXPECT_THAT(
+      messages(7),
+      ElementsAre(R"(3|1|{"device":{"a":[1,2]},"frames":480,"gain":1.0,"name":"5","on":true})",
+                  R"(7|2|{"b":[1.5]})"));
+}
+
+TEST_F(QVToolSessionTest, SendsToNobodyWhereThereIsNoSession) {
+  service();
+  const Output output = qvctl({"send", "--session", "7", "a=1"});
+  EXPECT_EQ(output.status, 1);
+  EXPECT_THAT(output.error, HasSubstr("no session 7"));
+}
+
+TEST_F(QVToolSessionTest, KeepsASessionForAScript) {
+  service();
+  const QVValue created = json({"session", "create", "7", "--service", "telephony", "--set",
+                                "HostApplicationDisplayID=net.example", "--set", "rate=48000"});
+  EXPECT_EQ(at(created, {"session"}), QVValue(7));
+  EXPECT_EQ(client().serviceType(7), kTelephony);
+  const auto keeper = static_cast<pid_t>(at(created, {"keeper"}).integerValue());
+  EXPECT_EQ(::kill(keeper, 0), 0);
+
+  EXPECT_EQ(run({"session", "start", "7"}), "");
+  EXPECT_EQ(run({"session", "send", "7", "frames=480"}), "");
+  EXPECT_EQ(run({"session", "stop", "7"}), "");
+  expectStored(
+      "SELECT id FROM beacon_session WHERE flushed_at IS NOT NULL AND user_info LIKE "
+      "'%net.example%telephony%48000%'",
+      1);
+  EXPECT_EQ(run({"session", "start", "7"}), "");
+  EXPECT_EQ(run({"session", "destroy", "7"}), "");
+  EXPECT_FALSE(client().isValid(7));
+  endService();
+  EXPECT_THAT(messages(7), ElementsAre(R"(1|0|{"frames":480})"));
+  EXPECT_EQ(store().number("SELECT count(*) FROM beacon_session WHERE flushed_at IS NULL"), 0);
+}
+
+TEST_F(QVToolSessionTest, ChoosesAnID) {
+  service();
+  const std::string id = run({"session", "create", "--start"});
+  const int64_t session = std::stoll(id);
+  EXPECT_TRUE(client().isValid(session));
+  EXPECT_EQ(run({"session", "destroy", std::to_string(session)}), "");
+  EXPECT_FALSE(client().isValid(session));
+}
+
+TEST_F(QVToolSessionTest, IsEndedWithItsKeeper) {
+  service();
+  const QVValue created = json({"session", "create", "7", "--start"});
+  EXPECT_TRUE(client().isValid(7));
+  ASSERT_EQ(::kill(static_cast<pid_t>(at(created, {"keeper"}).integerValue()), SIGTERM), 0);
+  expectLogged("destroying 7");
+}
+
+TEST_F(QVToolSessionTest, RefusesWhatTheServiceWouldTakeWithoutAWord) {
+  startSession(7, kTelephony);
+  EXPECT_THAT(qvctl({"session", "create", "7"}).error, HasSubstr("a session 7 already"));
+  EXPECT_EQ(qvctl({"session", "create", "7"}).status, 1);
+  EXPECT_EQ(qvctl({"session", "stop", "7"}).status, 1);
+  EXPECT_THAT(qvctl({"session", "stop", "7"}).error, HasSubstr("its own program"));
+  EXPECT_EQ(qvctl({"session", "destroy", "7"}).status, 1);
+  EXPECT_EQ(qvctl({"session", "start", "8"}).status, 1);
+  EXPECT_EQ(qvctl({"session", "create", "0"}).status, 2);
+  EXPECT_EQ(qvctl({"session", "create", "9", "--service", "nothing"}).status, 2);
+}
+
+TEST_F(QVToolSessionTest, SaysThatTheServiceDoesNotRun) {
+  for (const Arguments& arguments : {Arguments{"session", "create", "7"},
+                                     {"session", "start", "7"},
+                                     {"session", "stop", "7"},
+                                     {"session", "send", "7", "a=1"},
+                                     {"send", "--all", "a=1"},
+                                     {"session", "run", "--", "true"},
+                                     {"sessions"}}) {
+    const Output output = qvctl(arguments);
+    EXPECT_EQ(output.status, 3) << testing::PrintToString(arguments) << output.error;
+    EXPECT_THAT(output.error, AllOf(StartsWith("qvctl: "), HasSubstr(root_.socket().string())));
+  }
+}
+
+TEST_F(QVToolSessionTest, ReportsTheLifeOfACommand) {
+  service();
+  const std::string tool = QVDaemonProcess::program("qvctl").string();
+  const Output output = qvctl(
+      {"session", "run", "--id", "7", "--service", "haptics", "--", "sh", "-c",
+       "echo session $QUIETVOX_SESSION; echo wrong >&2; \"$0\" send from=inside; exit 5", tool});
+  EXPECT_EQ(output.status, 5);
+  EXPECT_EQ(output.out, "session 7\n");
+  EXPECT_EQ(output.error, "wrong\n");
+  endService();
+  const auto sent = messages(7);
+  ASSERT_THAT(sent, SizeIs(3));
+  EXPECT_EQ(sent[0], R"(1|1|{"command":"sh"})");
+  EXPECT_EQ(sent[1], R"(1|0|{"from":"inside"})");
+  const auto last = parseLines(sent[2].substr(4));
+  EXPECT_EQ(at(last[0], {"command"}), QVValue("sh"));
+  EXPECT_EQ(at(last[0], {"exit_status"}), QVValue(5));
+  EXPECT_GT(at(last[0], {"wall_seconds"}).doubleValue(), 0);
+  EXPECT_EQ(at(last[0], {"user_seconds"}).kind(), QVValue::Kind::real);
+  EXPECT_EQ(at(last[0], {"system_seconds"}).kind(), QVValue::Kind::real);
+  EXPECT_GT(at(last[0], {"max_resident_kib"}).integerValue(), 0);
+  EXPECT_TRUE(at(last[0], {"signal"}).isAbsent());
+  EXPECT_EQ(store().number("SELECT count(*) FROM beacon_session WHERE flushed_at IS NULL"), 0);
+}
+
+TEST_F(QVToolSessionTest, PassesSignalsOnToTheCommand) {
+  service();
+  const auto ran = terminal({"session", "run", "--id", "7", "--", "sh", "-c",
+                             "trap 'echo hung up' HUP; echo ready; read line; kill -KILL $$"});
+  ASSERT_TRUE(ran->await("ready"));
+  ran->signal(SIGHUP);
+  ASSERT_TRUE(ran->await("hung up"));
+  ran->type("\n");
+  EXPECT_EQ(ran->wait(), 128 + SIGKILL);
+  endService();
+  const auto last = parseLines(messages(7).back().substr(4));
+  EXPECT_EQ(at(last[0], {"signal"}), QVValue(SIGKILL));
+}
+
+TEST_F(QVToolSessionTest, GivesTheCommandItsStandardInput) {
+  service();
+  const auto ran = terminal({"session", "run", "--", "sh", "-c", "read line; echo got $line"});
+  ran->type("a line\n");
+  EXPECT_EQ(ran->wait(), 0);
+  EXPECT_THAT(ran->shown(), HasSubstr("got a line"));
+}
+
+TEST_F(QVToolSessionTest, IsInterruptedWithItsCommandOnce) {
+  service();
+  const auto ran = terminal({"session", "run", "--", "sh", "-c",
+                             "trap 'echo interrupted; exit 9' INT; echo ready; read line"});
+  ASSERT_TRUE(ran->await("ready"));
+  ran->type("\x03");
+  EXPECT_EQ(ran->wait(), 9);
+  EXPECT_THAT(ran->shown(), HasSubstr("interrupted"));
+}
+
+TEST_F(QVToolSessionTest, SaysThatThereIsNoSuchCommand) {
+  service();
+  EXPECT_EQ(qvctl({"session", "run", "--", "/nowhere/command"}).status, 127);
+  std::ofstream(root_.path() / "file") << "no program";
+  EXPECT_EQ(qvctl({"session", "run", "--", root_.path() / "file"}).status, 126);
+}
+
+TEST_F(QVToolSessionTest, RunsTheCommandAnyway) {
+  const Output output = qvctl({"session", "run", "--anyway", "--", "sh", "-c", "echo ran; exit 5"});
+  EXPECT_EQ(output.status, 5);
+  EXPECT_EQ(output.out, "ran\n");
+  EXPECT_THAT(output.error, HasSubstr("cannot reach the service"));
+}
+
+TEST_F(QVToolSessionTest, EndsWithItsCommandWhereTheServiceWentAway) {
+  service();
+  const auto ran = terminal({"session", "run", "--", "sh", "-c", "echo ready; read line; exit 5"});
+  ASSERT_TRUE(ran->await("ready"));
+  service().signal(SIGKILL);
+  ASSERT_EQ(service().wait(), -SIGKILL);
+  ran->type("\n");
+  EXPECT_EQ(ran->wait(), 5);
+  EXPECT_THAT(ran->shown(), HasSubstr("not reported"));
+}
+
+}  // namespace

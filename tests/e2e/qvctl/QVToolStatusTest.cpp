@@ -1,0 +1,237 @@
+// qvctl status, sessions, reporting, kill.
+
+#include "tests/e2e/qvctl/QVToolTest.h"
+
+#include <csignal>
+#include <filesystem>
+#include <fstream>
+
+#include <gmock/gmock.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
+
+namespace {
+
+using ::testing::AllOf;
+using ::testing::HasSubstr;
+using ::testing::IsEmpty;
+using ::testing::Not;
+using ::testing::SizeIs;
+
+constexpr uint16_t kTelephony = 2;
+
+class QVToolStatusTest : public QVToolTest {
+ protected:
+  // A session that is seen to be started: its row is in the store.
+  void startStoredSession(int64_t reporterID, uint16_t serviceType,
+                          const QVDictionary& configuration = {}) {
+    startSession(reporterID, serviceType, configuration);
+    expectStored("SELECT id FROM beacon_session WHERE session_id = " + std::to_string(reporterID),
+                 1);
+  }
+  std::filesystem::path preferences() const {
+    return root_.configuration() / "preferences/net.quillon.quietvox.json";
+  }
+};
+
+TEST_F(QVToolStatusTest, SaysThatTheServiceDoesNotRun) {
+  const Output output = qvctl({"status"});
+  EXPECT_EQ(output.status, 3);
+  EXPECT_THAT(output.out, HasSubstr("not running"));
+  const Output asJSON = qvctl({"status", "--json"});
+  EXPECT_EQ(asJSON.status, 3);
+  const auto values = parseLines(asJSON.out);
+  ASSERT_THAT(values, SizeIs(1));
+  EXPECT_EQ(at(values[0], {"running"}), QVValue(false));
+  EXPECT_EQ(at(values[0], {"store", "present"}), QVValue(false));
+  EXPECT_TRUE(at(values[0], {"reporting"}).isAbsent());
+}
+
+TEST_F(QVToolStatusTest, SaysHowTheServiceFares) {
+  startStoredSession(7, kTelephony);
+  client().sendMessage({{"frames", 480}}, {7});
+  expectStored("SELECT id FROM beacon_message", 1);
+  const QVValue status = json({"status"});
+  EXPECT_EQ(at(status, {"running"}), QVValue(true));
+  EXPECT_EQ(at(status, {"pid"}), QVValue(service().pid()));
+  EXPECT_EQ(at(status, {"socket"}), QVValue(root_.socket().string()));
+  EXPECT_EQ(at(status, {"sessions"}), QVValue(1));
+  EXPECT_EQ(at(status, {"reporting"}), QVValue(true));
+  EXPECT_EQ(at(status, {"reportingPreference"}), QVValue(true));
+  EXPECT_EQ(at(status, {"store", "messages"}), QVValue(1));
+  EXPECT_EQ(at(status, {"store", "losses"}), QVValue(QVDictionary{}));
+  EXPECT_GT(at(status, {"store", "bytes"}).integerValue(), 0);
+  // This program is the one client; qvctl does not count itself.
+  ASSERT_EQ(at(status, {"clients"}).array().size(), 1U);
+  EXPECT_EQ(at(at(status, {"clients"}).array()[0], {"pid"}), QVValue(::getpid()));
+}
+
+TEST_F(QVToolStatusTest, ShowsTheStatusOnATerminal) {
+  startStoredSession(7, kTelephony);
+  EXPECT_THAT(
+      show({"status"}),
+      AllOf(HasSubstr("\033[32mrunning, process " + std::to_string(service().pid())),
+            HasSubstr("qv_tool_e2e_tes"), HasSubstr("sessions   \033[0m1"), HasSubstr("losses")));
+  EXPECT_THAT(show({"status"}, {{"NO_COLOR", "1"}}), Not(HasSubstr("\033")));
+  EXPECT_THAT(show({"status"}, {{"TERM", "dumb"}}), Not(HasSubstr("\033")));
+  EXPECT_THAT(run({"status"}), Not(HasSubstr("\033")));
+}
+
+TEST_F(QVToolStatusTest, DoesNotStartTheServiceByAsking) {
+  sockaddr_un address{.sun_family = AF_UNIX, .sun_path = {}};
+  root_.socket().string().copy(address.sun_path, sizeof address.sun_path - 1);
+  const int listener = ::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
+  ASSERT_EQ(::bind(listener, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+  ASSERT_EQ(::listen(listener, 16), 0);
+  for (const Arguments& arguments :
+       {Arguments{"status"}, {"sessions"}, {"kill"}, {"reporting", "show"}}) {
+    const Output output = qvctl(arguments);
+    EXPECT_EQ(output.status, arguments[0] == "reporting" ? 0 : 3) << output.error;
+    EXPECT_LT(::accept(listener, nullptr, nullptr), 0) << arguments[0] << " connected";
+  }
+  EXPECT_THAT(qvctl({"status"}).out, HasSubstr("not running, starts on demand"));
+  EXPECT_THAT(qvctl({"sessions"}).error, HasSubstr("--start"));
+
+  startService({.inheritedSocket = listener});
+  EXPECT_EQ(at(json({"status"}), {"pid"}), QVValue(service().pid()));
+  EXPECT_EQ(json({"sessions"}), QVValue(QVArray{}));
+  ::close(listener);
+}
+
+TEST_F(QVToolStatusTest, KnowsASocketThatWasLeftBehind) {
+  service().signal(SIGKILL);
+  ASSERT_EQ(service().wait(), -SIGKILL);
+  ASSERT_TRUE(std::filesystem::exists(root_.socket()));
+  EXPECT_EQ(qvctl({"status"}).status, 3);
+  EXPECT_EQ(qvctl({"sessions"}).status, 3);
+}
+
+TEST_F(QVToolStatusTest, ListsSessions) {
+  startStoredSession(7, kTelephony, {{"HostApplicationDisplayID", "net.example.\033x"}});
+  client().create(-9, 4711);
+  const QVValue sessions = json({"sessions"});
+  ASSERT_EQ(sessions.array().size(), 2U);
+  const QVValue idle = sessions.array()[0];
+  EXPECT_EQ(at(idle, {"session"}), QVValue(-9));
+  EXPECT_EQ(at(idle, {"service"}), QVValue("4711"));
+  EXPECT_EQ(at(idle, {"started"}), QVValue(false));
+  const QVValue started = sessions.array()[1];
+  EXPECT_EQ(at(started, {"session"}), QVValue(7));
+  EXPECT_EQ(at(started, {"service"}), QVValue("telephony"));
+  EXPECT_EQ(at(started, {"serviceType"}), QVValue(kTelephony));
+  EXPECT_EQ(at(started, {"started"}), QVValue(true));
+  EXPECT_EQ(at(started, {"application"}), QVValue("net.example.\033x"));
+  EXPECT_EQ(at(started, {"owner", "pid"}), QVValue(::getpid()));
+  EXPECT_THAT(show({"sessions"}),
+              AllOf(HasSubstr("SESSION"), HasSubstr("telephony"), HasSubstr("net.example.\\x1Bx")));
+}
+
+TEST_F(QVToolStatusTest, EndsTheService) {
+  service();
+  EXPECT_EQ(run({"kill"}), "");
+  EXPECT_EQ(service().wait(), 2);
+  EXPECT_EQ(qvctl({"kill"}).status, 3);
+}
+
+TEST_F(QVToolStatusTest, SwitchesReportingOffAndOn) {
+  root_.configure("preferences/net.quillon.quietvox.json", R"({"device_name": "kitchen"})");
+  ASSERT_EQ(::chmod(preferences().c_str(), 0640), 0);
+  service();
+  EXPECT_EQ(json({"reporting", "off"}),
+            QVValue(QVDictionary{{"reportingPreference", false}, {"posted", true}}));
+  expectLogged("defaults {\"device_name\":\"kitchen\",\"disable_reporting\":true}");
+  EXPECT_EQ(json({"reporting", "show"}),
+            QVValue(QVDictionary{{"reportingPreference", false}, {"reporting", false}}));
+  EXPECT_THAT(show({"reporting", "show"}), HasSubstr("service     off"));
+  EXPECT_EQ(at(json({"status"}), {"reporting"}), QVValue(false));
+  struct stat status {};
+  ASSERT_EQ(::stat(preferences().c_str(), &status), 0);
+  EXPECT_EQ(status.st_mode & 07777U, 0640U);
+  const Output refused = qvctl({"send", "--all", "a=1"});
+  EXPECT_EQ(refused.status, 1);
+  EXPECT_THAT(refused.error, HasSubstr("reporting is switched off"));
+
+  EXPECT_EQ(run({"reporting", "on"}), "");
+  expectLogged("defaults {\"device_name\":\"kitchen\",\"disable_reporting\":false}");
+  EXPECT_EQ(at(json({"reporting", "show"}), {"reporting"}), QVValue(true));
+}
+
+TEST_F(QVToolStatusTest, WritesTheSwitchWhileTheServiceDoesNotRun) {
+  const Output output = qvctl({"reporting", "off"});
+  EXPECT_EQ(output.status, 0);
+  EXPECT_THAT(output.error, HasSubstr("does not run"));
+  EXPECT_EQ(json({"reporting", "show"}),
+            QVValue(QVDictionary{{"reportingPreference", false}, {"reporting", QVValue()}}));
+  struct stat status {};
+  ASSERT_EQ(::stat(preferences().c_str(), &status), 0);
+  EXPECT_EQ(status.st_mode & 07777U, 0644U);
+}
+
+TEST_F(QVToolStatusTest, LeavesABrokenPreferencesFileAlone) {
+  root_.configure("preferences/net.quillon.quietvox.json", "{\"device_name\": ");
+  const Output output = qvctl({"reporting", "off"});
+  EXPECT_EQ(output.status, 1);
+  EXPECT_THAT(output.error, HasSubstr("line 1"));
+  EXPECT_EQ(std::filesystem::file_size(preferences()), 16U);
+}
+
+TEST_F(QVToolStatusTest, ChangesNothingWhereItMayNotPost) {
+  service();
+  const auto notifications = root_.runtime() / "notify";
+  std::filesystem::permissions(notifications, std::filesystem::perms(0500));
+  const Output output = qvctl({"reporting", "off"}, withoutPrivilege());
+  EXPECT_EQ(output.status, 4);
+  EXPECT_THAT(output.error, AllOf(HasSubstr(notifications.string()), HasSubstr("ermission")));
+  EXPECT_FALSE(std::filesystem::exists(preferences()));
+  std::filesystem::permissions(notifications, std::filesystem::perms(0700));
+}
+
+TEST_F(QVToolStatusTest, SaysWhereItIsNotPermitted) {
+  service();
+  std::filesystem::permissions(root_.socket(), std::filesystem::perms(0));
+  for (const Arguments& arguments : {Arguments{"sessions"}, {"send", "--all", "a=1"}, {"kill"}}) {
+    const Output output = qvctl(arguments, withoutPrivilege());
+    EXPECT_EQ(output.status, 4) << arguments[0] << output.error;
+    EXPECT_THAT(output.error, HasSubstr("ermission denied"));
+  }
+  std::filesystem::permissions(root_.runtime(), std::filesystem::perms(0));
+  EXPECT_EQ(qvctl({"status"}, withoutPrivilege()).status, 4);
+  std::filesystem::permissions(root_.runtime(), std::filesystem::perms(0700));
+  std::filesystem::permissions(root_.socket(), std::filesystem::perms(0600));
+}
+
+TEST_F(QVToolStatusTest, SaysWhatIsWrongWithACommandLine) {
+  for (const Arguments& arguments : {Arguments{},
+                                     {"nothing"},
+                                     {"status", "--nothing"},
+                                     {"session"},
+                                     {"session", "start", "x"},
+                                     {"send", "a=1"},
+                                     {"send", "--all", "--session", "7", "a=1"},
+                                     {"send", "--all", "a"},
+                                     {"send", "--all", "--category", "Nothing", "a=1"},
+                                     {"events", "--kind", "nothing"},
+                                     {"events", "--since", "nothing"},
+                                     {"events", "--service", "nothing"},
+                                     {"watch", "--for", "nothing"},
+                                     {"channels", "--count", "2"},
+                                     {"channels", "--interval", "1us"},
+                                     {"session", "run", "--service", "nothing", "--", "true"}}) {
+    const Output output = qvctl(arguments);
+    EXPECT_EQ(output.status, 2) << testing::PrintToString(arguments) << output.error;
+    EXPECT_THAT(output.error, Not(IsEmpty()));
+    EXPECT_EQ(output.out, "");
+  }
+}
+
+TEST_F(QVToolStatusTest, LooksBelowAnotherRootDirectory) {
+  const Output output = qvctl({"status", "--json", "--root", "/nowhere"});
+  EXPECT_EQ(output.status, 3);
+  const auto values = parseLines(output.out);
+  ASSERT_THAT(values, SizeIs(1));
+  EXPECT_EQ(at(values[0], {"socket"}), QVValue("/nowhere/run/quietvox/reporting.socket"));
+  EXPECT_EQ(at(values[0], {"store", "path"}), QVValue("/nowhere/var/lib/quietvox/reporting.db"));
+}
+
+}  // namespace

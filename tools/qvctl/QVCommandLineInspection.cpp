@@ -1,0 +1,116 @@
+// The commands that look: status, sessions, events, watch, channels, summary.
+
+#include "tools/qvctl/QVChannelsCommand.h"
+#include "tools/qvctl/QVCommandLineState.h"
+#include "tools/qvctl/QVEventsCommand.h"
+#include "tools/qvctl/QVSessionsCommand.h"
+#include "tools/qvctl/QVStatusCommand.h"
+#include "tools/qvctl/QVSummaryCommand.h"
+#include "tools/qvctl/QVWatchCommand.h"
+
+namespace {
+
+constexpr const char* kStart = "Start a service that starts on demand";
+constexpr const char* kFull = "Do not cut lines at the terminal's width";
+constexpr const char* kFile = "Its number in the list (1, the latest), its name, or its path";
+
+void addFilter(CLI::App& command, QVEventFilter::Words& words) {
+  command.add_option("--kind", words.kinds, "start, message, analytics, energy, stop, loss")
+      ->option_text("KIND,...")
+      ->delimiter(',')
+      ->allow_extra_args(false);
+  command.add_option("--session", words.sessions, "Of these sessions")
+      ->option_text("ID,...")
+      ->delimiter(',')
+      ->allow_extra_args(false);
+  command.add_option("--service", words.services, "Of sessions of these service types")
+      ->option_text("NAME,...")
+      ->delimiter(',')
+      ->allow_extra_args(false);
+  command.add_option("--category", words.categories, "Playback, Session or Session.Playback")
+      ->option_text("NAME,...")
+      ->delimiter(',')
+      ->allow_extra_args(false);
+  command.add_option("--type", words.types, "Of these message types")
+      ->option_text("NAME,...")
+      ->delimiter(',')
+      ->allow_extra_args(false);
+  command.add_option("--name", words.names, "Of these names, * and ? match anything")
+      ->option_text("PATTERN")
+      ->allow_extra_args(false);
+  command.add_option("--since", words.since, "From then on: a time, or how long ago")
+      ->option_text("TIME");
+}
+
+}  // namespace
+
+void QVCommandLine::addInspection() {
+  State& state = *state_;
+  {
+    const auto [command, options] = state.add<QVStatusCommand>(
+        state.app, "status", "Whether the service runs, and how it fares");
+    state.addJSON(*command);
+    command->add_flag("--start", options->start, kStart);
+  }
+  {
+    const auto [command, options] =
+        state.add<QVSessionsCommand>(state.app, "sessions", "All sessions that there are");
+    state.addJSON(*command);
+    command->add_flag("--start", options->start, kStart);
+  }
+  {
+    const auto [command, options] =
+        state.add<QVEventsCommand>(state.app, "events", "What the store has kept");
+    state.addJSON(*command);
+    addFilter(*command, options->filter);
+    command->add_option("--until", options->filter.until, "Up to then")->option_text("TIME");
+    command->add_option("--last,-n", options->last, "The last N of them")->option_text("N");
+    command->add_flag("--full", options->full, kFull);
+  }
+  {
+    const auto [command, options] =
+        state.add<QVWatchCommand>(state.app, "watch", "What reaches the store, as it does");
+    state.addJSON(*command);
+    addFilter(*command, options->filter);
+    command->add_option("--count", options->count, "End after N of them")->option_text("N");
+    command->add_option("--for", options->duration, "End after so long")->option_text("DURATION");
+    command->add_flag("--full", options->full, kFull);
+  }
+  {
+    const auto [command, options] =
+        state.add<QVChannelsCommand>(state.app, "channels", "What drivers publish now");
+    state.addJSON(*command);
+    command->add_option("--group", options->group, "Of this group alone")->option_text("NAME");
+    command->add_option("--interval", options->interval, "Again and again, and what has grown")
+        ->option_text("DURATION");
+    command->add_option("--count", options->count, "End after N readings")->option_text("N");
+  }
+  addSummary();
+}
+
+void QVCommandLine::addSummary() {
+  State& state = *state_;
+  CLI::App& summary = *state.app.add_subcommand("summary", "The files that sessions leave");
+  summary.require_subcommand(1);
+  using Operation = QVSummaryCommand::Operation;
+  const auto add = [&](Operation operation, const char* name, const char* description) {
+    const auto added = state.add<QVSummaryCommand>(summary, name, description);
+    added.second->operation = operation;
+    if (operation != Operation::list) {
+      added.first->add_option("file", added.second->file, kFile)->option_text("FILE");
+    }
+    if (operation != Operation::open) state.addJSON(*added.first);
+    return added;
+  };
+  add(Operation::list, "list", "Which there are, the latest first");
+  add(Operation::show, "show", "Print one");
+  add(Operation::open, "open", "Open one in another program");
+  const auto [plot, options] = add(Operation::plot, "plot", "Draw its numbers over its messages");
+  plot->add_option("--key", options->keys, "These keys alone, * and ? match anything")
+      ->option_text("PATTERN,...")
+      ->delimiter(',')
+      ->allow_extra_args(false);
+  plot->add_option("--width", options->width, "Columns of the whole")->option_text("N");
+  plot->add_option("--height", options->height, "Rows of each picture")->option_text("N");
+  plot->add_flag("--ascii", options->ascii, "Draw with ASCII alone");
+}

@@ -1,0 +1,87 @@
+// The commands that take part: send and session.
+
+#include "tools/qvctl/QVCommandLineState.h"
+#include "tools/qvctl/QVSendCommand.h"
+#include "tools/qvctl/QVSessionCommand.h"
+#include "tools/qvctl/QVSessionRunCommand.h"
+
+namespace {
+
+void addMessage(CLI::App& command, QVSendCommand::Options& options) {
+  command.add_option("--category", options.category, "What it is about (Session.Generic)")
+      ->option_text("NAME");
+  command.add_option("--type", options.type, "Its message type (Generic)")->option_text("NAME");
+  command.add_option("--payload", options.json, "A JSON object, @FILE, or - for standard input")
+      ->option_text("JSON");
+  command.add_option("entries", options.entries, "What it says")
+      ->option_text("KEY[:KIND]=VALUE...");
+}
+
+void addSetup(CLI::App& command, QVSessionSetup& setup) {
+  command.add_option("--service", setup.service, "Its service type (generic)")->option_text("NAME");
+  command.add_option("--set", setup.entries, "An entry of its configuration")
+      ->option_text("KEY[:KIND]=VALUE")
+      ->allow_extra_args(false);
+  command.add_option("--configuration", setup.configuration, "A JSON object, @FILE, or -")
+      ->option_text("JSON");
+}
+
+}  // namespace
+
+void QVCommandLine::addSessions() {
+  State& state = *state_;
+  const std::string footer = std::string(State::kEntries).append("\n\n").append(State::kFooter);
+  const auto [send, sendOptions] =
+      state.add<QVSendCommand>(state.app, "send", "Send one message to sessions");
+  send->add_option("--session", sendOptions->sessions, "To these sessions")
+      ->option_text("ID,...")
+      ->delimiter(',')
+      ->allow_extra_args(false);
+  send->add_flag("--all", sendOptions->toAll, "To every session that is started");
+  addMessage(*send, *sendOptions);
+  send->footer(footer);
+
+  CLI::App& session = *state.app.add_subcommand("session", "A session of one's own, for scripts");
+  session.require_subcommand(1);
+  using Operation = QVSessionCommand::Operation;
+  const auto add = [&](Operation operation, const char* name, const char* description) {
+    const auto added = state.add<QVSessionCommand>(session, name, description);
+    added.second->operation = operation;
+    if (operation != Operation::create) {
+      added.first->add_option("id", added.second->reporterID, "The session")
+          ->option_text("ID")
+          ->required();
+    }
+    return added;
+  };
+  const auto [create, createOptions] = add(Operation::create, "create", "Create one, and keep it");
+  state.addJSON(*create);
+  create->add_option("id", createOptions->setup.reporterID, "Its ID; else one is chosen")
+      ->option_text("ID");
+  addSetup(*create, createOptions->setup);
+  create->add_flag("--start", createOptions->start, "Start it, too");
+  create->footer(footer);
+  add(Operation::start, "start", "Start one");
+  {
+    const auto [command, options] =
+        state.add<QVSendCommand>(session, "send", "Send it one message");
+    const auto take = [to = options](int64_t id) { to->sessions = {id}; };
+    command->add_option_function<int64_t>("id", take, "The session")->option_text("ID")->required();
+    addMessage(*command, *options);
+    command->footer(footer);
+  }
+  add(Operation::stop, "stop", "Stop one that was created here");
+  add(Operation::destroy, "destroy", "Destroy one that was created here");
+
+  const auto [run, runOptions] =
+      state.add<QVSessionRunCommand>(session, "run", "Run a command, and report its life");
+  run->add_option("--id", runOptions->setup.reporterID, "The session's ID")->option_text("ID");
+  addSetup(*run, runOptions->setup);
+  run->add_option("--category", runOptions->category, "Of its messages (Session.Generic)")
+      ->option_text("NAME");
+  run->add_flag("--anyway", runOptions->anyway, "Run it without the service, too");
+  run->footer(footer);
+  run->add_option("command", runOptions->command, "What is run; behind --")
+      ->option_text("COMMAND [ARGUMENT...]")
+      ->required();
+}

@@ -1,0 +1,56 @@
+#pragma once
+
+#include "tools/qvctl/QVCommandLine.h"
+
+#include <memory>
+#include <string>
+#include <utility>
+
+#include <CLI/App.hpp>
+#include <CLI/Config.hpp>
+#include <CLI/Formatter.hpp>
+
+// What QVCommandLine keeps: the parser, what it fills, and which command it found. Included by the
+// sources of QVCommandLine alone.
+struct QVCommandLine::State {
+  CLI::App app{"Controls and inspects the QuietVox reporting service."};
+  std::string socket;
+  std::string root;
+  bool json = false;
+  Action action;
+
+  // Behind the options of every command.
+  static constexpr const char* kFooter =
+      "Exit status: 0 done, 1 failed, 2 wrong usage, 3 the service is not running or cannot be\n"
+      "reached, 4 not permitted; session run: that of its command.\n"
+      "Names of service types, categories and message types, in any case, and their numbers are\n"
+      "taken alike: telephony or 2, Session.Playback or 0x08000003, Start or 1. See qvctl(1).";
+  // And of those that take entries of messages or configurations.
+  static constexpr const char* kEntries =
+      "Entries: frames=480 is an integer, gain=1.5 a double, on=true a boolean, route=speaker a\n"
+      "string; KEY:KIND=VALUE gives the kind, int, uint, double, bool, string or json:\n"
+      "gain:double=1 name:string=5 device:json={\"a\":[1,2]}";
+
+  // Options of every command.
+  void addPlaces(CLI::App& command) {
+    command.add_option("--socket", socket, "The service's socket")->option_text("PATH");
+    command.add_option("--root", root, "Root directory of the system that is looked at")
+        ->option_text("DIR");
+  }
+  void addJSON(CLI::App& command) {
+    command.add_flag("--json", json, "Print JSON, one value a line");
+  }
+  // A command that is carried out by Command::run(context, options).
+  template <class Command>
+  std::pair<CLI::App*, std::shared_ptr<typename Command::Options>> add(CLI::App& parent,
+                                                                       const char* name,
+                                                                       const char* description) {
+    CLI::App* const command = parent.add_subcommand(name, description);
+    addPlaces(*command);
+    auto options = std::make_shared<typename Command::Options>();
+    command->callback([this, options] {
+      action = [options](const QVToolContext& context) { return Command::run(context, *options); };
+    });
+    return {command, options};
+  }
+};

@@ -1,0 +1,15 @@
+#include "tools/qvctl/QVKillCommand.h"
+
+#include "tools/qvctl/QVServiceConnection.h"
+#include "tools/qvctl/QVServiceState.h"
+
+QVToolStatus QVKillCommand::run(const QVToolContext& context, const Options& /*options*/) {
+  const QVServiceState state = QVServiceState::find(context.places);
+  if (!state.isRunning() && state.kind != QVServiceState::Kind::unknown) {
+    throw QVToolFailure(QVToolStatus::notRunning,
+                        "the service is not running (" + context.places.socket.string() + ")");
+  }
+  QVServiceConnection service(context.places);
+  QVServiceConnection::answer(service.client().killServiceAndWait(QVServiceConnection::kTimeLimit));
+  return QVToolStatus::done;
+}

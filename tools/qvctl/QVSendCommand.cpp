@@ -1,0 +1,55 @@
+#include "tools/qvctl/QVSendCommand.h"
+
+#include "platform/QVText.h"
+#include "tools/qvctl/QVNames.h"
+#include "tools/qvctl/QVServiceConnection.h"
+#include "tools/qvctl/QVTypedValue.h"
+
+#include <charconv>
+#include <cstdlib>
+#include <string_view>
+
+namespace {
+
+void addSessionOfEnvironment(std::vector<int64_t>& sessions) {
+  // There is one thread so far.
+  const char* const value =
+      std::getenv(QVSendCommand::kSessionVariable);  // NOLINT(concurrency-mt-unsafe)
+  const std::string_view text = value == nullptr ? "" : value;
+  int64_t session = 0;
+  const auto [end, problem] = std::from_chars(text.data(), text.data() + text.size(), session);
+  if (problem == std::errc() && end == text.data() + text.size()) sessions.push_back(session);
+}
+
+}  // namespace
+
+QVToolStatus QVSendCommand::run(const QVToolContext& context, Options options) {
+  const auto wrong = [](const std::string& text) {
+    return QVToolFailure(QVToolStatus::wrongUsage, text);
+  };
+  if (options.sessions.empty() && !options.toAll) addSessionOfEnvironment(options.sessions);
+  if (options.sessions.empty() != options.toAll) {
+    throw wrong(options.toAll ? "either sessions or every session"
+                              : "to which session? --session ID, or --all");
+  }
+  const auto category = QVParseCategory(options.category);
+  if (!category) throw wrong(QVText("no category is called \"", options.category, "\""));
+  const auto type = QVParseMessageType(options.type);
+  if (!type) throw wrong(QVText("no message type is called \"", options.type, "\""));
+  const QVClientPayload payload = QVMakePayload(options.json, options.entries);
+
+  QVServiceConnection service(context.places);
+  // The service itself says nothing of a message to a session that there is not.
+  for (const int64_t session : options.sessions) {
+    if (!service.serviceType(session)) {
+      throw QVToolFailure(QVToolStatus::failed, QVText("there is no session ", session));
+    }
+  }
+  const QVClientTargets targets = options.toAll
+                                      ? QVClientTargets::everySession()
+                                      : QVClientTargets(std::span<const int64_t>(options.sessions));
+  QVServiceConnection::expectTaken(service.client().sendMessageAndWait(
+      payload, QVClientCategory(*category), static_cast<QVClientMessageType>(*type), targets,
+      QVServiceConnection::kTimeLimit));
+  return QVToolStatus::done;
+}

@@ -1,0 +1,102 @@
+#include "tools/qvctl/QVServiceState.h"
+
+#include "tools/qvctl/QVProcessTable.h"
+#include "tools/qvctl/QVToolFailure.h"
+#include "tools/qvctl/QVUnixSockets.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <iterator>
+#include <set>
+
+#include <sys/stat.h>
+
+namespace {
+
+constexpr const char* kServiceName = "quietvoxd";
+
+bool isService(pid_t pid) {
+  return QVProcessTable::name(pid) == kServiceName;
+}
+
+// The service among those that hold the listening socket; its manager may hold it as well.
+void findService(const std::vector<pid_t>& listeners, const std::vector<pid_t>& hidden,
+                 QVServiceState& state) {
+  using Kind = QVServiceState::Kind;
+  const auto seen = std::ranges::find_if(listeners, isService);
+  if (seen != listeners.end()) {
+    state.pid = *seen;
+  } else {
+    // One that may not be looked into is the one, if there is no other of that name.
+    std::vector<pid_t> candidates;
+    std::ranges::copy_if(hidden, std::back_inserter(candidates), isService);
+    if (candidates.size() == 1) state.pid = candidates[0];
+    if (candidates.size() > 1 && !state.isRunning()) state.kind = Kind::unknown;
+  }
+  if (state.pid == 0) return;
+  state.kind = Kind::running;
+  state.since = QVProcessTable::startTime(state.pid);
+}
+
+}  // namespace
+
+const char* QVServiceState::word() const {
+  switch (kind) {
+    case Kind::stopped:
+      return "not running";
+    case Kind::onDemand:
+      return "not running, starts on demand";
+    case Kind::running:
+      return "running";
+    default:
+      return "unknown";
+  }
+}
+
+std::string QVServiceState::complaint(const QVToolPlaces& places) const {
+  std::string text = "the service is not running";
+  if (kind == Kind::unknown) text = "whether the service runs is not to be seen";
+  text.append(" (").append(places.socket.string()).append(")");
+  return kind == Kind::onDemand ? text.append("; it starts on demand: --start") : text;
+}
+
+QVServiceState QVServiceState::find(const QVToolPlaces& places) {
+  QVServiceState state;
+  struct stat file {};
+  if (::stat(places.socket.c_str(), &file) != 0) {
+    if (errno == EACCES) throw QVToolFailure::ofSystem(places.socket.string(), errno);
+    state.kind = Kind::stopped;
+    return state;
+  }
+  const auto sockets = QVListUnixSockets();
+  if (!sockets) return state;
+  std::set<uint32_t> wanted;
+  std::vector<QVUnixSocket> connections;
+  uint32_t listener = 0;
+  for (const QVUnixSocket& socket : *sockets) {
+    // The kernel tells the lower half of an inode's number.
+    const bool isHere =
+        socket.fileDevice == file.st_dev && socket.fileInode == static_cast<uint32_t>(file.st_ino);
+    if (!isHere) continue;
+    if (socket.isListening) {
+      listener = socket.inode;
+      wanted.insert(listener);
+    } else if (socket.inode != 0) {
+      connections.push_back(socket);
+      wanted.insert(socket.peer);
+    }
+  }
+  state.kind = listener == 0 ? Kind::stopped : Kind::onDemand;
+  if (state.kind == Kind::stopped) return state;
+  if (!connections.empty()) state.kind = Kind::running;
+  std::vector<pid_t> hidden;
+  const auto holders = QVProcessTable::holders(wanted, hidden);
+  const auto listening = holders.find(listener);
+  findService(listening == holders.end() ? std::vector<pid_t>() : listening->second, hidden, state);
+  for (const QVUnixSocket& connection : connections) {
+    const auto holder = holders.find(connection.peer);
+    const pid_t pid = holder == holders.end() ? 0 : holder->second.front();
+    state.clients.push_back({pid, pid == 0 ? std::string() : QVProcessTable::name(pid)});
+  }
+  return state;
+}

@@ -1,0 +1,42 @@
+#pragma once
+
+#include "tools/qvctl/QVToolPlaces.h"
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include <sys/types.h>
+
+// Whether the service runs, found out without connecting to it: that would start one that runs on
+// demand.
+//
+//   stopped   nobody listens at the socket
+//   onDemand  somebody does, who starts the service at the first call, and it does not run
+//   running   the service listens, or has connections
+//   unknown   somebody listens, and this user may not see who
+//
+// The kernel says who listens at the socket's file and who is connected there, /proc says which
+// process is the service.
+struct QVServiceState {
+  enum class Kind { stopped, onDemand, running, unknown };
+  struct Client {
+    pid_t pid = 0;  // 0 where this user may not see it
+    std::string name;
+  };
+
+  Kind kind = Kind::unknown;
+  pid_t pid = 0;                 // of the service; 0 where this user may not see it
+  std::optional<int64_t> since;  // microseconds since 1970
+  std::vector<Client> clients;   // one for each connection
+
+  bool isRunning() const { return kind == Kind::running; }
+  // "running", "starts on demand", ...
+  const char* word() const;
+  // What a command that needs a running service says where there is none.
+  std::string complaint(const QVToolPlaces& places) const;
+
+  // Failures: QVToolFailure, notPermitted, where the socket's directory is closed to this user.
+  static QVServiceState find(const QVToolPlaces& places);
+};

@@ -1,0 +1,48 @@
+#include "tools/qvctl/QVSessionCommand.h"
+
+#include "platform/QVText.h"
+#include "tools/qvctl/QVServiceState.h"
+#include "tools/qvctl/QVSessionKeeper.h"
+
+QVToolStatus QVSessionCommand::run(const QVToolContext& context, const Options& options) {
+  const QVSessionKeeper keeper(context.places);
+  switch (options.operation) {
+    case Operation::create:
+      create(context, options);
+      break;
+    case Operation::start:
+      start(context, options.reporterID);
+      break;
+    case Operation::stop:
+      keeper.ask(options.reporterID, QVSessionKeeper::Request::stop);
+      break;
+    case Operation::destroy:
+      keeper.ask(options.reporterID, QVSessionKeeper::Request::destroy);
+      break;
+  }
+  return QVToolStatus::done;
+}
+
+void QVSessionCommand::create(const QVToolContext& context, const Options& options) {
+  options.setup.check();
+  const auto kept = QVSessionKeeper(context.places).start(options.setup, options.start);
+  if (context.output.isJSON()) {
+    context.output.json(QVDictionary{{"session", kept.reporterID}, {"keeper", kept.keeper}});
+  } else {
+    context.output.line(std::to_string(kept.reporterID));
+  }
+}
+
+void QVSessionCommand::start(const QVToolContext& context, int64_t reporterID) {
+  // A service that does not run has no session to be started.
+  const QVServiceState state = QVServiceState::find(context.places);
+  if (state.kind == QVServiceState::Kind::stopped) {
+    throw QVToolFailure(QVToolStatus::notRunning, state.complaint(context.places));
+  }
+  QVServiceConnection service(context.places);
+  if (!service.serviceType(reporterID)) {
+    throw QVToolFailure(QVToolStatus::failed, QVText("there is no session ", reporterID));
+  }
+  QVServiceConnection::answer(service.client().startReportingSessionForIDAndWait(
+      reporterID, nullptr, QVServiceConnection::kTimeLimit));
+}

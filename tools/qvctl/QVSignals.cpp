@@ -1,0 +1,22 @@
+#include "tools/qvctl/QVSignals.h"
+
+#include "tools/qvctl/QVToolFailure.h"
+
+#include <cerrno>
+
+QVSignals::QVSignals(std::initializer_list<int> signals) {
+  sigset_t set;
+  ::sigemptyset(&set);
+  for (const int number : signals) ::sigaddset(&set, number);
+  ::pthread_sigmask(SIG_BLOCK, &set, &previous_);
+  descriptor_ = QVDescriptor(::signalfd(-1, &set, SFD_CLOEXEC | SFD_NONBLOCK));
+  if (!descriptor_.isOpen()) throw QVToolFailure::ofSystem("signals", errno);
+}
+
+std::optional<signalfd_siginfo> QVSignals::next() const {
+  signalfd_siginfo information{};
+  if (::read(descriptor_.get(), &information, sizeof information) != sizeof information) {
+    return std::nullopt;
+  }
+  return information;
+}

@@ -1,0 +1,105 @@
+#include "tools/qvctl/QVToolOutput.h"
+
+#include "tools/qvctl/QVDisplayText.h"
+#include "tools/qvctl/QVToolFailure.h"
+
+#include <cerrno>
+#include <cstdio>
+#include <cstdlib>
+
+#include <sys/ioctl.h>
+#include <unistd.h>
+
+namespace {
+
+// Bytes that are collected before they are written.
+constexpr std::size_t kBufferBytes = std::size_t{64} * 1024;
+
+bool wantsColours() {
+  // There is one thread so far.
+  // NOLINTBEGIN(concurrency-mt-unsafe)
+  const char* const refusal = std::getenv("NO_COLOR");
+  const char* const terminal = std::getenv("TERM");
+  // NOLINTEND(concurrency-mt-unsafe)
+  if (refusal != nullptr && *refusal != '\0') return false;
+  return terminal == nullptr || std::string_view(terminal) != "dumb";
+}
+
+const char* codeOf(QVToolOutput::Style style) {
+  switch (style) {
+    case QVToolOutput::Style::title:
+      return "\033[1m";
+    case QVToolOutput::Style::dim:
+      return "\033[2m";
+    case QVToolOutput::Style::good:
+      return "\033[32m";
+    case QVToolOutput::Style::bad:
+      return "\033[31m";
+    default:
+      return "";
+  }
+}
+
+}  // namespace
+
+QVToolOutput::QVToolOutput(bool json, int descriptor)
+    : isJSON_(json),
+      descriptor_(descriptor),
+      isTerminal_(::isatty(descriptor) == 1),
+      isColoured_(isTerminal_ && !json && wantsColours()) {}
+
+QVToolOutput::~QVToolOutput() {
+  try {
+    flush();
+  } catch (...) {
+    // Whoever cares has called flush().
+  }
+}
+
+std::size_t QVToolOutput::columns() const {
+  winsize size{};
+  if (!isTerminal_ || ::ioctl(descriptor_, TIOCGWINSZ, &size) != 0) return 0;
+  return size.ws_col;
+}
+
+std::string QVToolOutput::painted(Style style, std::string_view text) const {
+  if (!isColoured_ || style == Style::plain || text.empty()) return std::string(text);
+  std::string painted = codeOf(style);
+  return painted.append(text).append("\033[0m");
+}
+
+void QVToolOutput::line(std::string_view text) {
+  waiting_.append(text).push_back('\n');
+  if (waiting_.size() >= kBufferBytes) flush();
+}
+
+void QVToolOutput::json(const QVValue& value) {
+  line(QVDisplayJSON(jsonText_.write(value)));
+}
+
+void QVToolOutput::raw(std::string_view bytes) {
+  waiting_.append(bytes);
+  if (waiting_.size() >= kBufferBytes) flush();
+}
+
+void QVToolOutput::flush() {
+  std::string bytes;
+  bytes.swap(waiting_);
+  std::string_view rest = bytes;
+  while (!rest.empty()) {
+    const ssize_t count = ::write(descriptor_, rest.data(), rest.size());
+    if (count >= 0) {
+      rest.remove_prefix(static_cast<std::size_t>(count));
+    } else if (errno == EPIPE) {
+      throw QVReaderGone();
+    } else if (errno != EINTR) {
+      throw QVToolFailure::ofSystem("standard output", errno);
+    }
+  }
+}
+
+void QVToolOutput::note(std::string_view text) {
+  std::string line = "qvctl: ";
+  line.append(QVDisplayText(text)).push_back('\n');
+  std::fwrite(line.data(), 1, line.size(), stderr);
+}

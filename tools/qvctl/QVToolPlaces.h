@@ -1,0 +1,34 @@
+#pragma once
+
+#include "platform/linux/QVServiceDirectories.h"
+
+#include <filesystem>
+#include <string>
+
+// Where the service listens and keeps its files. A value.
+//
+//   --root DIR   the system whose root directory is DIR: DIR/run/quietvox, DIR/var/lib/quietvox,
+//   ... else         RUNTIME_DIRECTORY, STATE_DIRECTORY, CONFIGURATION_DIRECTORY and
+//   LOGS_DIRECTORY, as
+//                the service takes them, else the usual ones
+//   --socket     the socket; else without --root what QUIETVOX_SOCKET names, as the client library
+//                takes it; else reporting.socket in the runtime directory
+struct QVToolPlaces {
+  std::filesystem::path socket;
+  QVServiceDirectories directories;
+
+  // `socket` and `root` as the command line has them; empty where it has none.
+  static QVToolPlaces find(const std::string& socket, const std::string& root);
+
+  // Where sessions leave their summaries on an internal build.
+  std::filesystem::path summaries() const {
+    return directories.logs / "DiagnosticLogs" / "Audio" / "Reporting";
+  }
+  // The preferences of the service itself, and the notification that has it read them.
+  std::filesystem::path servicePreferences() const {
+    return directories.preferences() / "net.quillon.quietvox.json";
+  }
+  std::filesystem::path reportingNotification() const {
+    return directories.notifications() / "net.quillon.quietvox.reporting";
+  }
+};

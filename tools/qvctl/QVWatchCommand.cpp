@@ -1,0 +1,129 @@
+#include "tools/qvctl/QVWatchCommand.h"
+
+#include "platform/QVText.h"
+#include "tools/qvctl/QVEventFollower.h"
+#include "tools/qvctl/QVEventPrinter.h"
+#include "tools/qvctl/QVSignals.h"
+#include "tools/qvctl/QVStoreWatch.h"
+#include "tools/qvctl/QVTimeText.h"
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <chrono>
+
+#include <poll.h>
+
+namespace {
+
+using Clock = std::chrono::steady_clock;
+
+// A commit first changes the file, of which the kernel tells, and a moment later becomes visible,
+// of which nobody does. So after a change the store is looked at twice more, then no more until
+// the next one.
+constexpr std::array<std::chrono::milliseconds, 2> kSecondLooks{std::chrono::milliseconds(50),
+                                                                std::chrono::milliseconds(500)};
+
+std::chrono::microseconds durationOf(const std::string& text) {
+  const auto duration = QVParseDuration(text);
+  if (!duration)
+    throw QVToolFailure(QVToolStatus::wrongUsage, QVText("\"", text, "\" is no duration"));
+  return *duration;
+}
+
+// One that was told is enough.
+struct Enough {};
+
+class Watcher {
+ public:
+  Watcher(const QVToolContext& context, const QVWatchCommand::Options& options)
+      : output_(context.output),
+        reader_(context.places.directories.store(), QVEventFilter(options.filter, QVTimeNow())),
+        changes_(reader_.path()),
+        follower_(reader_),
+        printer_(context.output, options.full),
+        left_(options.count) {
+    if (!options.duration.empty()) end_ = Clock::now() + durationOf(options.duration);
+  }
+
+  void run() {
+    // What was asked for from an earlier time on is told first.
+    if (!reader_.filter().since()) follower_.skip();
+    printer_.showTitles();
+    output_.flush();
+    try {
+      look();
+      while (wait()) look();
+    } catch (const Enough&) {
+    }
+    output_.flush();
+  }
+
+ private:
+  void look() {
+    changes_.drain();
+    if (left_ && *left_ == 0) throw Enough();
+    follower_.readNew([this](const QVStoredEvent& event) {
+      printer_.show(event);
+      if (left_ && --*left_ == 0) throw Enough();
+    });
+    output_.flush();
+  }
+
+  // Milliseconds until the next look that is due; -1 for none.
+  int timeLimit() const {
+    auto limit = end_;
+    if (looks_ < kSecondLooks.size()) {
+      const auto next = changed_ + kSecondLooks[looks_];
+      limit = limit ? std::min(*limit, next) : next;
+    }
+    if (!limit) return -1;
+    const auto rest = std::chrono::ceil<std::chrono::milliseconds>(*limit - Clock::now());
+    constexpr int64_t kLongest = 3'600'000;
+    return static_cast<int>(std::clamp<int64_t>(rest.count(), 0, kLongest));
+  }
+
+  // Waits for the next time to look; false where that is the end.
+  bool wait() {
+    while (true) {
+      // Of the output, errors are always told: the reader of a pipe has gone away.
+      std::array<pollfd, 3> entries{{{changes_.descriptor(), POLLIN, 0},
+                                     {signals_.descriptor(), POLLIN, 0},
+                                     {output_.descriptor(), 0, 0}}};
+      const int ready = ::poll(entries.data(), entries.size(), timeLimit());
+      if (ready < 0 && errno != EINTR) throw QVToolFailure::ofSystem("waiting", errno);
+      if (ready > 0 && (entries[1].revents != 0 || (entries[2].revents & POLLERR) != 0)) {
+        return false;
+      }
+      if (ready > 0 && entries[0].revents != 0) {
+        changed_ = Clock::now();
+        looks_ = 0;
+        return true;
+      }
+      if (end_ && Clock::now() >= *end_) return false;
+      if (looks_ < kSecondLooks.size() && Clock::now() >= changed_ + kSecondLooks[looks_]) {
+        ++looks_;
+        return true;
+      }
+    }
+  }
+
+  // Before all else, so that an interruption is never lost.
+  const QVSignals signals_{SIGINT, SIGTERM, SIGHUP};
+  QVToolOutput& output_;
+  const QVEventRowReader reader_;
+  const QVStoreWatch changes_;
+  QVEventFollower follower_;
+  QVEventPrinter printer_;
+  std::optional<std::size_t> left_;
+  std::optional<Clock::time_point> end_;
+  Clock::time_point changed_ = Clock::now();
+  std::size_t looks_ = kSecondLooks.size();  // second looks that were taken since the last change
+};
+
+}  // namespace
+
+QVToolStatus QVWatchCommand::run(const QVToolContext& context, const Options& options) {
+  Watcher(context, options).run();
+  return QVToolStatus::done;
+}
