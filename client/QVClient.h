@@ -1,6 +1,7 @@
 #pragma once
 
 #include "client/QVClientError.h"
+#include "client/QVClientExport.h"
 #include "client/QVClientOptions.h"
 #include "client/QVClientPayload.h"
 #include "client/QVClientReplies.h"
@@ -40,7 +41,7 @@ class QVClientConnection;
 //
 // Threads: every member may be called on any thread, at once, but dispatch() by one at a time, and
 // the destructor last. Limits: QVClientOptions; payloads of 8 MiB.
-class QVClient {
+class QV_CLIENT_API QVClient {
  public:
   using TimeLimit = std::optional<std::chrono::milliseconds>;
 

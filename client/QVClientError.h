@@ -1,5 +1,7 @@
 #pragma once
 
+#include "client/QVClientExport.h"
+
 #include <cstdint>
 #include <string>
 #include <utility>
@@ -7,7 +9,7 @@
 // What went wrong with a call, a payload or a connection: a value, never thrown.
 //
 // `if (error)` is true where there is an error. Threads: as any value.
-class QVClientError {
+class QV_CLIENT_API QVClientError {
  public:
   enum class Code : uint8_t {
     none,

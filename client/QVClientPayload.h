@@ -1,6 +1,7 @@
 #pragma once
 
 #include "client/QVClientError.h"
+#include "client/QVClientExport.h"
 
 #include <array>
 #include <concepts>
@@ -26,7 +27,7 @@
 //
 // Threads: one at a time. A call copies the payload; it may be changed as soon as the call returns.
 // Limits: 8 MiB; 20 dictionaries or 30 arrays within each other.
-class QVClientPayload {
+class QV_CLIENT_API QVClientPayload {
  public:
   QVClientPayload() = default;
   QVClientPayload(QVClientPayload&& other) noexcept;

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "client/QVClientExport.h"
+
 #include <cstdint>
 #include <optional>
 #include <string_view>
@@ -29,9 +31,10 @@ enum class QVClientServiceType : uint16_t {
 };
 
 // "telephony"; empty for a value without a name.
-std::string_view QVClientNameOf(QVClientServiceType serviceType) noexcept;
+QV_CLIENT_API std::string_view QVClientNameOf(QVClientServiceType serviceType) noexcept;
 // The service type of that name, or of that number in decimal; nothing where it is neither.
-std::optional<QVClientServiceType> QVClientServiceTypeNamed(std::string_view name) noexcept;
+QV_CLIENT_API std::optional<QVClientServiceType> QVClientServiceTypeNamed(
+    std::string_view name) noexcept;
 
 // The part of the audio stack that a message is about: the high half of its category.
 enum class QVClientComponent : uint32_t {
