@@ -48,9 +48,8 @@ bool QVClientCallTable::take(uint32_t serial, QVClientCall& call) noexcept {
 }
 
 bool QVClientCallTable::abandon(uint32_t serial) noexcept {
-  if (slots_.empty() || slotOf(serial).serial != serial) return false;
-  slotOf(serial).call = QVClientCall();
-  return true;
+  QVClientCall call;
+  return take(serial, call);
 }
 
 std::vector<QVClientCall> QVClientCallTable::takeAll() {

@@ -31,8 +31,8 @@ class QVClientCallTable {
 
   // Hands a call out; false where there is none of that serial.
   [[nodiscard]] bool take(uint32_t serial, QVClientCall& call) noexcept;
-  // Nobody waits for the answer any more; its slot stays taken until it comes. False where there is
-  // no such call.
+  // Nobody waits for the answer any more: the slot is free, so that a service that never answers
+  // fills no table. False where there is no such call.
   bool abandon(uint32_t serial) noexcept;
   // Hands all calls out, the oldest first.
   std::vector<QVClientCall> takeAll();

@@ -1,14 +1,13 @@
 #include "client/QVClientConnection.h"
 
 #include "client/QVClientSocket.h"
+#include "client/QVClientThread.h"
 #include "platform/linux/bus/QVBusAuthClient.h"
 #include "platform/linux/bus/QVBusMessage.h"
 
 #include <algorithm>
 #include <cassert>
-#include <csignal>
 #include <new>
-#include <system_error>
 #include <utility>
 
 #include <sys/socket.h>
@@ -59,25 +58,13 @@ QVClientError QVClientConnection::start() {
   {
     QVMutexLock lock(mutex_);
     pending_ = QVBusAuthClient::opening(geteuid());
+    takenInBytes_ = pending_.size();
     send = beginSending();
   }
   if (send) sendPending();
   if (!hasOwnThread()) return {};
 
-  // The program's signal handlers run on the program's threads.
-  sigset_t every;
-  sigset_t before;
-  sigfillset(&every);
-  pthread_sigmask(SIG_SETMASK, &every, &before);
-  QVClientError error;
-  try {
-    thread_ = std::thread([self = shared_from_this()] { self->runOwnThread(); });
-  } catch (const std::system_error& problem) {
-    error = {QVClientError::Code::cannotConnect,
-             std::string("no thread for the replies: ") + problem.what()};
-  }
-  pthread_sigmask(SIG_SETMASK, &before, nullptr);
-  return error;
+  return QVClientStartThread(thread_, [self = shared_from_this()] { self->runOwnThread(); });
 }
 
 void QVClientConnection::close() {
@@ -220,13 +207,19 @@ QVClientError QVClientConnection::issueAndWait(const QVClientRequest& request,
   return {};
 }
 
-QVClientError QVClientConnection::waitUntilSent(Deadline deadline) {
+// Lets go of the lock in a way that the compiler's analysis cannot follow.
+QVClientError QVClientConnection::waitUntilSent(Deadline deadline) QV_NO_THREAD_SAFETY_ANALYSIS {
   if (onCallbackThread()) return wouldDeadlockError();
-  flush();
   QVMutexLock lock(mutex_);
+  // What others add meanwhile is theirs to wait for; what a batch keeps back must leave.
+  const uint64_t last = takenInBytes_;
   while (!ended_ && !sendingFailed_) {
-    if (queuedBytes() == 0) return {};
-    if (!waitForRoom(lock, deadline)) {
+    if (takenInBytes_ - queuedBytes() >= last) return {};
+    if (beginSending()) {
+      lock.unlock();
+      sendPending();
+      lock.lock();
+    } else if (!waitForRoom(lock, deadline)) {
       return timedOutError("the service did not read within the time limit");
     }
   }
@@ -259,6 +252,7 @@ QVClientError QVClientConnection::takeIn(const QVClientRequest& request, QVClien
   }
   serial = answered ? calls_.insert(std::move(call)) : calls_.unansweredSerial();
   request.appendTo(pending_, serial, answered);
+  takenInBytes_ += bytes;
   return {};
 }
 

@@ -121,6 +121,7 @@ class QVClientConnection : public std::enable_shared_from_this<QVClientConnectio
   QVClientCallTable calls_ QV_GUARDED_BY(mutex_);
   std::string pending_ QV_GUARDED_BY(mutex_);
   std::size_t sendingBytes_ QV_GUARDED_BY(mutex_) = 0;  // of sendingBuffer_, not sent yet
+  uint64_t takenInBytes_ QV_GUARDED_BY(mutex_) = 0;     // ever; what is not queued has left
   Sending sending_ QV_GUARDED_BY(mutex_) = Sending::idle;
   bool watchesForRoom_ QV_GUARDED_BY(mutex_) = false;
   bool sendingFailed_ QV_GUARDED_BY(mutex_) = false;  // the reader will find the end

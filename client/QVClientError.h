@@ -22,9 +22,13 @@ class QV_CLIENT_API QVClientError {
     messageTooLarge,  // over 8 MiB
     invalidPayload,   // a text that is no UTF-8, containers nested too deeply or not closed
     outOfMemory,
-    refused,       // the service did not take the call: domain() is the standard error's name
-    serviceError,  // an error object of the service: domain() and serviceCode()
-    invalidReply   // an answer that is not what the operation answers
+    refused,          // the service did not take the call: domain() is the standard error's name
+    serviceError,     // an error object of the service: domain() and serviceCode()
+    invalidReply,     // an answer that is not what the operation answers
+    disabled,         // reporting is switched off: nothing was sent
+    reporterIDTaken,  // another session of this reporter has that ID
+    tooManySessions,  // of one reporter
+    invalidArgument   // a number beyond its limits; in C also a null pointer
   };
 
   // No error.
@@ -33,6 +37,9 @@ class QV_CLIENT_API QVClientError {
 
   static QVClientError refusal(std::string name, std::string text);
   static QVClientError ofService(std::string domain, int64_t serviceCode, std::string text);
+
+  // What a code means, in a few words; "no error" for none.
+  static const char* textOf(Code code) noexcept;
 
   explicit operator bool() const noexcept { return code_ != Code::none; }
   Code code() const noexcept { return code_; }

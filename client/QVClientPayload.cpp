@@ -38,9 +38,11 @@ QVClientPayload::QVClientPayload(QVClientPayload&& other) noexcept {
 
 QVClientPayload& QVClientPayload::operator=(QVClientPayload&& other) noexcept {
   if (this == &other) return *this;
-  bytes_ = std::move(other.bytes_);
+  own_ = std::move(other.own_);
+  bytes_ = std::exchange(other.bytes_, nullptr);
   size_ = std::exchange(other.size_, 0);
   capacity_ = std::exchange(other.capacity_, 0);
+  mayGrow_ = std::exchange(other.mayGrow_, true);
   depth_ = std::exchange(other.depth_, 0);
   std::copy_n(other.open_.begin(), depth_, open_.begin());
   failure_ = std::exchange(other.failure_, nullptr);
@@ -52,6 +54,20 @@ void QVClientPayload::clear() noexcept {
   size_ = 0;
   depth_ = 0;
   failure_ = nullptr;
+}
+
+void QVClientPayload::use(std::span<char> memory, std::size_t filled) noexcept {
+  own_.reset();
+  bytes_ = memory.data();
+  capacity_ = memory.size();
+  mayGrow_ = false;
+  clear();
+  size_ = filled;
+}
+
+QVClientError::Code QVClientPayload::errorCode() const noexcept {
+  if (failure_ != nullptr) return failureCode_;
+  return depth_ != 0 ? QVClientError::Code::invalidPayload : QVClientError::Code::none;
 }
 
 QVClientError QVClientPayload::error() const {
@@ -71,6 +87,10 @@ void QVClientPayload::fail(QVClientError::Code code, const char* text) noexcept 
 
 bool QVClientPayload::makeRoom(std::size_t bytes) {
   if (bytes <= capacity_ - size_) return true;
+  if (!mayGrow_) {
+    fail(QVClientError::Code::messageTooLarge, "the payload is larger than the memory given");
+    return false;
+  }
   if (bytes > kBusMaximumMessageBytes - size_) {
     fail(QVClientError::Code::messageTooLarge, "the payload is larger than 8 MiB");
     return false;
@@ -82,8 +102,9 @@ bool QVClientPayload::makeRoom(std::size_t bytes) {
     fail(QVClientError::Code::outOfMemory, "no memory for the payload");
     return false;
   }
-  if (size_ != 0) std::memcpy(larger.get(), bytes_.get(), size_);
-  bytes_ = std::move(larger);
+  if (size_ != 0) std::memcpy(larger.get(), bytes_, size_);
+  own_ = std::move(larger);
+  bytes_ = own_.get();
   capacity_ = capacity;
   return true;
 }
@@ -107,7 +128,7 @@ char* QVClientPayload::beginValue(Key key, std::string_view signature, std::size
                                 : kEntryOverhead + keyBytes + signature.size() + valueBytes;
   if (!makeRoom(bytes)) return nullptr;
 
-  char* const buffer = bytes_.get();
+  char* const buffer = bytes_;
   std::size_t at = size_;
   const auto padTo = [buffer, &at](std::size_t multiple) {
     for (const std::size_t aligned = QVBusAlign(at, multiple); at != aligned; ++at) buffer[at] = 0;
@@ -155,15 +176,19 @@ QVClientPayload& QVClientPayload::putReal(Key key, double value) {
 }
 
 QVClientPayload& QVClientPayload::put(Key key, std::string_view value) {
-  if (failure_ == nullptr && !QVBusIsValidText(value)) {
+  // A wild length must not wrap around in the sum.
+  const std::size_t bytes = std::min(value.size(), kBusMaximumMessageBytes);
+  char* at = beginValue(key, "s", 4, sizeof(uint32_t) + bytes + 1);
+  if (at == nullptr) return *this;
+  // Only now, so that it never reads more than there is room for.
+  if (!QVBusIsValidText(value)) {
     fail(QVClientError::Code::invalidPayload, "a text of the payload is no UTF-8");
+    return *this;
   }
-  if (char* at = beginValue(key, "s", 4, sizeof(uint32_t) + value.size() + 1)) {
-    storeNumber(at, static_cast<uint32_t>(value.size()));
-    at += sizeof(uint32_t);
-    if (!value.empty()) std::memcpy(at, value.data(), value.size());
-    at[value.size()] = 0;
-  }
+  storeNumber(at, static_cast<uint32_t>(value.size()));
+  at += sizeof(uint32_t);
+  if (!value.empty()) std::memcpy(at, value.data(), value.size());
+  at[value.size()] = 0;
   return *this;
 }
 
@@ -184,7 +209,7 @@ QVClientPayload& QVClientPayload::putNumbers(Key key, std::string_view signature
   storeNumber(at, static_cast<uint32_t>(bytes));
   at += sizeof(uint32_t);
   // The numbers begin at a multiple of 8, which is here or 4 bytes further.
-  if (static_cast<std::size_t>(at - bytes_.get()) % 8 != 0) {
+  if (static_cast<std::size_t>(at - bytes_) % 8 != 0) {
     storeNumber(at, uint32_t{0});
     at += 4;
   } else {
@@ -208,10 +233,10 @@ QVClientPayload& QVClientPayload::begin(Key key, bool isArray) {
   }
   char* at = beginValue(key, isArray ? "av" : "a{sv}", 4, sizeof(uint32_t));
   if (at == nullptr) return *this;
-  const std::size_t lengthAt = static_cast<std::size_t>(at - bytes_.get());
+  const std::size_t lengthAt = static_cast<std::size_t>(at - bytes_);
   if (!isArray && size_ % 8 != 0) {
     if (!makeRoom(4)) return *this;
-    storeNumber(bytes_.get() + size_, uint32_t{0});
+    storeNumber(bytes_ + size_, uint32_t{0});
     size_ += 4;
   }
   open_[depth_++] = {lengthAt, size_, wireDepth, isArray};
@@ -226,6 +251,6 @@ QVClientPayload& QVClientPayload::end(bool isArray) {
     return *this;
   }
   const Container& container = open_[--depth_];
-  storeNumber(bytes_.get() + container.lengthAt, static_cast<uint32_t>(size_ - container.begin));
+  storeNumber(bytes_ + container.lengthAt, static_cast<uint32_t>(size_ - container.begin));
   return *this;
 }

@@ -20,16 +20,20 @@
 //   payload.beginArray("levels").add(-3.5).add(-6.0).endArray();
 //
 // Keep one and clear() it between messages: once it has held the largest of them, nothing is
-// allocated any more. Of entries with the same key the last one counts.
+// allocated any more. One that is given its memory never allocates: all of its members but error()
+// may then be called where nothing may wait. Of entries with the same key the last one counts.
 //
 // Errors stick: after the first one nothing more is taken in until clear(), and calls that are
 // given the payload answer error(). So a whole payload is written without looking.
 //
 // Threads: one at a time. A call copies the payload; it may be changed as soon as the call returns.
-// Limits: 8 MiB; 20 dictionaries or 30 arrays within each other.
+// Limits: 8 MiB, or the memory given, up to 21 bytes of which an entry may ask for and not use; 20
+// dictionaries or 30 arrays within each other.
 class QV_CLIENT_API QVClientPayload {
  public:
   QVClientPayload() = default;
+  // Written into memory that outlives it; what does not fit there is messageTooLarge.
+  explicit QVClientPayload(std::span<char> memory) noexcept { use(memory); }
   QVClientPayload(QVClientPayload&& other) noexcept;
   QVClientPayload& operator=(QVClientPayload&& other) noexcept;
 
@@ -58,10 +62,17 @@ class QV_CLIENT_API QVClientPayload {
   // The first thing that went wrong, or that something is still open; no error where it can be
   // sent.
   QVClientError error() const;
+  QVClientError::Code errorCode() const noexcept;
+  // The first thing that went wrong so far, whatever is open.
+  QVClientError::Code failureCode() const noexcept {
+    return failure_ != nullptr ? failureCode_ : QVClientError::Code::none;
+  }
   bool ok() const noexcept { return failure_ == nullptr && depth_ == 0; }
 
   // The entries as they go over the wire, alignment counted from the first byte. For the client.
-  std::string_view entries() const noexcept { return {bytes_.get(), size_}; }
+  std::string_view entries() const noexcept { return {bytes_, size_}; }
+  // From now on in that memory, whose first `filled` bytes are entries already. For the client.
+  void use(std::span<char> memory, std::size_t filled = 0) noexcept;
 
  private:
   using Key = const std::string_view*;  // null in an array
@@ -107,9 +118,11 @@ class QV_CLIENT_API QVClientPayload {
   bool makeRoom(std::size_t bytes);
   void fail(QVClientError::Code code, const char* text) noexcept;
 
-  std::unique_ptr<char[]> bytes_;
+  std::unique_ptr<char[]> own_;  // null where it was given its memory
+  char* bytes_ = nullptr;
   std::size_t size_ = 0;
   std::size_t capacity_ = 0;
+  bool mayGrow_ = true;
   std::array<Container, kMaximumOpenContainers> open_;  // the first depth_ are in use
   std::size_t depth_ = 0;
   const char* failure_ = nullptr;

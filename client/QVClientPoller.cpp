@@ -4,7 +4,6 @@
 #include <cstdint>
 
 #include <sys/epoll.h>
-#include <sys/eventfd.h>
 #include <unistd.h>
 
 namespace {
@@ -23,18 +22,15 @@ void waitOn(int events, int milliseconds) {
 }  // namespace
 
 QVClientPoller::QVClientPoller(int socket, bool ownThread)
-    : socket_(socket),
-      ownThread_(ownThread),
-      socketEvents_(epoll_create1(EPOLL_CLOEXEC)),
-      bell_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
+    : socket_(socket), ownThread_(ownThread), socketEvents_(epoll_create1(EPOLL_CLOEXEC)) {
   bool complete =
       socketEvents_.isOpen() && bell_.isOpen() && add(socketEvents_.get(), socket, EPOLLIN);
   if (ownThread) {
-    complete = complete && add(socketEvents_.get(), bell_.get(), EPOLLIN);
+    complete = complete && add(socketEvents_.get(), bell_.descriptor(), EPOLLIN);
   } else if (complete) {
     allEvents_ = QVClientDescriptor(epoll_create1(EPOLL_CLOEXEC));
     complete = allEvents_.isOpen() && add(allEvents_.get(), socketEvents_.get(), EPOLLIN) &&
-               add(allEvents_.get(), bell_.get(), EPOLLIN);
+               add(allEvents_.get(), bell_.descriptor(), EPOLLIN);
   }
   if (!complete) socketEvents_ = QVClientDescriptor();
 }
@@ -73,17 +69,4 @@ void QVClientPoller::watchForRoom(bool watch) const {
 
 void QVClientPoller::forgetSocket() const {
   static_cast<void>(epoll_ctl(socketEvents_.get(), EPOLL_CTL_DEL, socket_, nullptr));
-}
-
-void QVClientPoller::ring() {
-  // In this order: a bell that is silenced in between rings once too often, and never too seldom.
-  static_cast<void>(eventfd_write(bell_.get(), 1));
-  rang_.store(true);
-}
-
-void QVClientPoller::silence() {
-  // Spares a system call where it did not ring, which is nearly always.
-  if (!rang_.exchange(false)) return;
-  eventfd_t count = 0;
-  static_cast<void>(eventfd_read(bell_.get(), &count));
 }

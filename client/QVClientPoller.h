@@ -1,8 +1,8 @@
 #pragma once
 
+#include "client/QVClientBell.h"
 #include "client/QVClientDescriptor.h"
 
-#include <atomic>
 #include <chrono>
 #include <optional>
 
@@ -32,14 +32,13 @@ class QVClientPoller {
   // The socket is of no use any more.
   void forgetSocket() const;
 
-  void ring();
-  void silence();
+  void ring() { bell_.ring(); }
+  void silence() { bell_.silence(); }
 
  private:
   const int socket_;
   const bool ownThread_;
   QVClientDescriptor socketEvents_;
-  QVClientDescriptor bell_;
-  std::atomic<bool> rang_{false};
+  QVClientBell bell_;
   QVClientDescriptor allEvents_;  // only with a program's loop
 };

@@ -69,13 +69,19 @@ TEST_F(QVClientCallTableTest, GrowsUpToItsLimit) {
   for (int i = 0; i < 1000; ++i) EXPECT_EQ(order_[static_cast<std::size_t>(i)], i);
 }
 
-TEST_F(QVClientCallTableTest, AnAbandonedCallKeepsItsPlaceUntilItsAnswerComes) {
+TEST_F(QVClientCallTableTest, AnAbandonedCallLeavesItsPlaceAndItsAnswerFindsNone) {
   const uint32_t serial = insert(1);
   EXPECT_TRUE(table_.abandon(serial));
-  EXPECT_EQ(table_.count(), 1U);
-  finish(serial);
-  EXPECT_TRUE(order_.empty());
   EXPECT_EQ(table_.count(), 0U);
+  EXPECT_FALSE(table_.abandon(serial));
+  QVClientCall call;
+  EXPECT_FALSE(table_.take(serial, call));
+  EXPECT_TRUE(order_.empty());
+}
+
+TEST_F(QVClientCallTableTest, CallsThatAreAllAbandonedNeverFillIt) {
+  for (int i = 0; i < 3000; ++i) EXPECT_TRUE(table_.abandon(insert(i)));
+  EXPECT_FALSE(table_.isFull());
 }
 
 TEST_F(QVClientCallTableTest, HandsOutAllCallsTheOldestFirst) {

@@ -1,0 +1,298 @@
+#include "client/QVReporterCalls.h"
+
+#include "client/QVClientBatch.h"
+#include "client/QVReporterConfiguration.h"
+
+#include <utility>
+
+namespace {
+
+// What may be under way, not answered yet, and would be lost with the connection: calls, and bytes
+// of messages. Enough to keep the service busy while answers travel.
+constexpr uint64_t kMaximumUnderWay = 256;
+constexpr std::size_t kMaximumBytesUnderWay = std::size_t{256} << 10;
+
+// Bytes of one session's configuration that are kept for its restoration. Beyond it only the last
+// addition is.
+constexpr std::size_t kMaximumConfigurationBytes = std::size_t{64} << 10;
+
+// Messages that are taken from one real-time queue in a row.
+constexpr std::size_t kMaximumDrained = 65'536;
+
+using Kind = QVReporterRecord::Kind;
+
+QVDropReason reasonOf(const QVClientError& error) {
+  switch (error.code()) {
+    case QVClientError::Code::connectionLost:
+    case QVClientError::Code::closed:
+      return QVDropReason::connectionLost;
+    case QVClientError::Code::serviceError:
+      return error.domain() == kQVClientReportingDomain &&
+                     error.serviceCode() == kQVClientReportingSwitchedOff
+                 ? QVDropReason::disabled
+                 : QVDropReason::refused;
+    default:
+      return QVDropReason::refused;
+  }
+}
+
+}  // namespace
+
+void QVReporterCalls::begin(QVClient& client) {
+  client_ = &client;
+  isLost_ = false;
+  isAnswered_ = false;
+  isRestored_ = !core_.options.restoreSessions;
+}
+
+void QVReporterCalls::end() {
+  client_ = nullptr;
+  isLost_ = false;
+  isRestored_ = true;
+  core_.sessions.forEach([this](QVReporterSessionState& session) {
+    session.isPresent = false;
+    if (!core_.options.restoreSessions) session.isStarted = false;
+    return true;
+  });
+}
+
+bool QVReporterCalls::hasRoom() const {
+  return client_ != nullptr && !isLost_ && issued_ - answered_ < kMaximumUnderWay &&
+         bytesUnderWay_ < kMaximumBytesUnderWay;
+}
+
+bool QVReporterCalls::wantsConnection() {
+  QVReporterRecord record;
+  if (core_.queue.front(record)) return true;
+  if (!core_.options.restoreSessions) return false;
+  bool hasSessions = false;
+  core_.sessions.forEach([&hasSessions](const QVReporterSessionState& session) {
+    hasSessions = session.isOpen;
+    return !hasSessions;
+  });
+  return hasSessions;
+}
+
+bool QVReporterCalls::isDone() {
+  QVReporterRecord record;
+  return !core_.queue.front(record) && issued_ == answered_ && ringsAreEmpty_;
+}
+
+void QVReporterCalls::work() {
+  std::optional<QVClientBatch> batch;
+  if (client_ != nullptr) batch.emplace(*client_);
+  if (!isRestored_) isRestored_ = restore();
+  if (isRestored_) {
+    for (QVReporterRecord record; core_.queue.front(record) && handle(record);) core_.queue.pop();
+  }
+  drainAll();
+}
+
+bool QVReporterCalls::restore() {
+  bool complete = true;
+  core_.sessions.forEach([this, &complete](QVReporterSessionState& session) {
+    complete = !session.isOpen || session.isPresent || make(session);
+    return complete;
+  });
+  return complete;
+}
+
+// False where a call cannot be made, now or on this connection.
+bool QVReporterCalls::make(QVReporterSessionState& session) {
+  if (!hasRoom()) return false;
+  const int64_t reporterID = session.reporterID;
+  session.isPresent =
+      issue(client_->createReportingSession(reporterID, acknowledge())) &&
+      issue(client_->setServiceType(session.serviceType, reporterID, acknowledge())) &&
+      (session.configuration.empty() || configure(session)) &&
+      (!session.isStarted || start(session));
+  return session.isPresent;
+}
+
+bool QVReporterCalls::configure(QVReporterSessionState& session) {
+  view_.use(session.configuration, session.configuration.size());
+  return issue(client_->setConfiguration(view_, session.reporterID, acknowledge()));
+}
+
+bool QVReporterCalls::start(QVReporterSessionState& session) {
+  // A start is answered when the session stops. The question behind it is answered when the service
+  // has started the session.
+  if (client_->startReportingSessionForID(session.reporterID, nullptr)) {
+    isLost_ = true;
+    return false;
+  }
+  return issue(client_->reporterIDValid(
+      session.reporterID,
+      [this](const QVClientResult<QVClientReporter>& reporter) { take(reporter.error(), 0); }));
+}
+
+bool QVReporterCalls::issue(const QVClientError& error) {
+  // There is room, so that only a loss or the lack of memory keeps a call back. Then the sessions
+  // are made up for on another connection.
+  if (error) {
+    isLost_ = true;
+    return false;
+  }
+  ++issued_;
+  return true;
+}
+
+QVClientBooleanReply QVReporterCalls::acknowledge() {
+  return [this](const QVClientResult<bool>& handled) { take(handled.error(), 0); };
+}
+
+void QVReporterCalls::take(const QVClientError& error, std::size_t bytes) {
+  ++answered_;
+  bytesUnderWay_ -= bytes;
+  isAnswered_ = isAnswered_ || !error;
+}
+
+// Was it lost with an earlier connection, and is not to be restored?
+bool QVReporterCalls::isGone(const QVReporterSessionState& session) const {
+  return !session.isPresent && !core_.options.restoreSessions;
+}
+
+// False where it has to wait; the record then stays where it is.
+bool QVReporterCalls::handle(const QVReporterRecord& record) {
+  if (record.kind == Kind::message) return handleMessage(record, core_.queue.frontPayload());
+  return handleStep(record, *record.session);
+}
+
+bool QVReporterCalls::handleMessage(const QVReporterRecord& record, std::span<char> payload) {
+  if (core_.isReportingOff()) {
+    core_.countDrop(QVDropReason::disabled);
+    return true;
+  }
+  if (record.session != nullptr && isGone(*record.session)) {
+    core_.countDrop(QVDropReason::connectionLost);
+    return true;
+  }
+  if (!isRestored_ || !hasRoom()) return false;
+  const std::size_t bytes = payload.size();
+  const auto count = [this, bytes](const QVClientError& error) {
+    take(error, bytes);
+    if (error) {
+      core_.countDrop(reasonOf(error));
+    } else {
+      core_.ledger.countSent();
+    }
+  };
+  view_.use(payload, bytes);
+  const QVClientError error = client_->sendMessage(
+      view_, QVClientCategory(record.category), static_cast<QVClientMessageType>(record.type),
+      record.session != nullptr ? QVClientTargets(record.session->reporterID)
+                                : QVClientTargets::everySession(),
+      count);
+  if (error.code() == QVClientError::Code::messageTooLarge) {
+    core_.countDrop(QVDropReason::invalid);
+    return true;
+  }
+  if (!issue(error)) return false;
+  bytesUnderWay_ += bytes;
+  return true;
+}
+
+bool QVReporterCalls::handleStep(const QVReporterRecord& record, QVReporterSessionState& session) {
+  if (record.kind == Kind::destroy) return destroy(session);
+  const bool makes = record.kind == Kind::open || record.kind == Kind::start;
+  if (!hasRoom() && (makes || !isGone(session))) return false;
+  if (record.kind == Kind::stop && !drain(session)) return false;
+  switch (record.kind) {
+    case Kind::open:
+      session.isOpen = true;
+      session.serviceType = static_cast<QVClientServiceType>(record.type);
+      return session.isPresent || make(session);
+    case Kind::setServiceType:
+      session.serviceType = static_cast<QVClientServiceType>(record.type);
+      return !session.isPresent ||
+             issue(client_->setServiceType(session.serviceType, session.reporterID, acknowledge()));
+    case Kind::setConfiguration: {
+      std::string merged = QVReporterMergedConfiguration(session.configuration, record.payload);
+      if (merged.size() > kMaximumConfigurationBytes) merged = record.payload;
+      session.configuration = std::move(merged);
+      return !session.isPresent || configure(session);
+    }
+    case Kind::start:
+      session.isStarted = true;
+      return session.isPresent ? start(session) : make(session);
+    case Kind::stop:
+      session.isStarted = false;
+      return !session.isPresent ||
+             issue(client_->stopReportingSessionForID(session.reporterID, acknowledge()));
+    case Kind::message:
+    case Kind::destroy:
+      break;
+  }
+  return true;
+}
+
+bool QVReporterCalls::destroy(QVReporterSessionState& session) {
+  if (session.isPresent) {
+    if (!hasRoom() || !drain(session) ||
+        !issue(client_->destroyReportingSession(session.reporterID, acknowledge()))) {
+      return false;
+    }
+  }
+  for (const auto& ring : core_.rings.all()) {
+    if (ring->session != &session) continue;
+    ring->session = nullptr;
+    drain(*ring);
+    core_.rings.remove(*ring);
+  }
+  core_.sessions.remove(session);
+  return true;
+}
+
+// Real-time queues.
+
+bool QVReporterCalls::drain(const QVReporterSessionState& session) {
+  for (const auto& ring : core_.rings.all()) {
+    if (ring->session == &session && !drain(*ring)) return false;
+  }
+  return true;
+}
+
+// False where something is left in it.
+bool QVReporterCalls::drain(QVRealtimeRing& ring) {
+  QVRealtimeRing::Message message;
+  for (std::size_t i = 0; i < kMaximumDrained; ++i) {
+    if (!ring.front(message)) return true;
+    if (ring.session == nullptr) {
+      core_.countDrop(QVDropReason::connectionLost);
+    } else if (!handleMessage(
+                   {.type = message.type, .category = message.category, .session = ring.session},
+                   message.payload)) {
+      return false;
+    }
+    ring.pop();
+  }
+  return false;
+}
+
+void QVReporterCalls::drainAll() {
+  polls_ = false;
+  ringsAreEmpty_ = true;
+  for (const auto& ring : core_.rings.all()) {
+    if (!ring->session->isStarted) continue;
+    // In this order: what was committed before it was abandoned is seen.
+    const bool isAbandoned = ring->isAbandoned();
+    if (!drain(*ring)) {
+      ringsAreEmpty_ = false;
+    } else if (isAbandoned) {
+      core_.rings.remove(*ring);
+      continue;
+    }
+    polls_ = true;
+  }
+}
+
+void QVReporterCalls::abandon() {
+  for (QVReporterRecord record; core_.queue.front(record); core_.queue.pop()) {
+    if (record.kind == Kind::message) core_.countDrop(QVDropReason::connectionLost);
+  }
+  for (const auto& ring : core_.rings.all()) {
+    ring->session = nullptr;
+    drain(*ring);
+  }
+  core_.collectDrops();
+}

@@ -1,0 +1,83 @@
+#pragma once
+
+#include "client/QVClient.h"
+#include "client/QVReporterCore.h"
+
+#include <cstddef>
+#include <cstdint>
+
+// Turns what lies in a reporter's queues into calls to the service, and counts the answers.
+//
+// Calls that control sessions change what is known of the session first; then, where it is there,
+// the service. A session that is not there on this connection is made with all that is known of it.
+// So what a loss interrupts is made up for by the restoration.
+//
+// Only so much is under way at a time: what lies in the queues outlives a lost connection, what is
+// under way does not.
+//
+// Used by QVReporterWorker, on the reporter's thread.
+class QVReporterCalls {
+ public:
+  explicit QVReporterCalls(QVReporterCore& core) : core_(core) {}
+
+  // A connection is made: the sessions that there are have to be restored on it.
+  void begin(QVClient& client);
+  // It is of no use any more: it was lost, or a call could not be made. Then end() has to follow,
+  // once the client is gone and all answers have run.
+  bool isLost() const { return isLost_; }
+  void lose() { isLost_ = true; }
+  void end();
+  // Has the service answered on this connection?
+  bool isAnswered() const { return isAnswered_; }
+
+  // Does as much as can be done: restores, works off the queue, then the real-time queues. Without
+  // a connection, drops what reporting that is off drops.
+  void work();
+  // Is there anything to be done with a connection?
+  bool wantsConnection();
+  // Is nothing left of what has been sent?
+  bool isDone();
+  // May more be sent right now?
+  bool hasRoom() const;
+  // Is there a started session with a real-time queue?
+  bool polls() const { return polls_; }
+
+  // How many calls were made that are answered, and how many of them are.
+  uint64_t issued() const { return issued_; }
+  uint64_t answered() const { return answered_; }
+  // Have the real-time queues of started sessions been found empty by the last work()?
+  bool ringsAreEmpty() const { return ringsAreEmpty_; }
+
+  // Counts all that is left as lost. The end.
+  void abandon();
+
+ private:
+  bool restore();
+  bool make(QVReporterSessionState& session);
+  bool start(QVReporterSessionState& session);
+  bool configure(QVReporterSessionState& session);
+  bool isGone(const QVReporterSessionState& session) const;
+  bool handle(const QVReporterRecord& record);
+  bool handleStep(const QVReporterRecord& record, QVReporterSessionState& session);
+  bool handleMessage(const QVReporterRecord& record, std::span<char> payload);
+  bool destroy(QVReporterSessionState& session);
+  bool drain(const QVReporterSessionState& session);
+  bool drain(QVRealtimeRing& ring);
+  void drainAll();
+
+  bool issue(const QVClientError& error);
+  QVClientBooleanReply acknowledge();
+  void take(const QVClientError& error, std::size_t bytes);
+
+  QVReporterCore& core_;
+  QVClient* client_ = nullptr;
+  bool isLost_ = false;
+  bool isAnswered_ = false;
+  bool isRestored_ = true;
+  bool polls_ = false;
+  bool ringsAreEmpty_ = true;
+  uint64_t issued_ = 0;
+  uint64_t answered_ = 0;
+  std::size_t bytesUnderWay_ = 0;
+  QVClientPayload view_{std::span<char>()};
+};
