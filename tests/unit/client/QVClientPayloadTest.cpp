@@ -232,6 +232,34 @@ TEST(QVClientPayload, RefusesMoreThanAMessageMayHold) {
   EXPECT_LE(payload.entries().size(), kBusMaximumMessageBytes);
 }
 
+TEST(QVClientPayload, IsWrittenIntoTheMemoryGiven) {
+  std::array<char, 128> memory{};
+  QVClientPayload payload{std::span(memory)};
+  payload.set("frames", 480).set("route", "speaker");
+  EXPECT_EQ(payload.entries().data(), memory.data());
+  EXPECT_EQ(decoded(payload), (QVDictionary{{"frames", 480}, {"route", "speaker"}}));
+  for (int i = 0; payload.ok() && i < 10; ++i) payload.set("more", i);
+  EXPECT_EQ(payload.errorCode(), Code::messageTooLarge);
+  EXPECT_EQ(payload.entries().data(), memory.data());
+  EXPECT_LE(payload.entries().size(), memory.size());
+  payload.clear();
+  EXPECT_EQ(payload.errorCode(), Code::none);
+  payload.set("text", std::string(128, 'x'));
+  EXPECT_EQ(payload.errorCode(), Code::messageTooLarge);
+  payload.use(std::span<char>());
+  payload.set("n", 1);
+  EXPECT_EQ(payload.errorCode(), Code::messageTooLarge);
+}
+
+TEST(QVClientPayload, TakesEntriesThatAreThereAlready) {
+  QVClientPayload written;
+  written.set("frames", 480);
+  std::string bytes(written.entries());
+  QVClientPayload read;
+  read.use(bytes, bytes.size());
+  EXPECT_EQ(decoded(read), (QVDictionary{{"frames", 480}}));
+}
+
 TEST(QVClientPayload, RefusesALengthThatWouldWrapAround) {
   // Only the length is looked at: the bytes are not touched, since there is no room for them.
   const std::vector<double> one(1);

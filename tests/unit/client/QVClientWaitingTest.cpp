@@ -1,5 +1,6 @@
 // Calls that wait for their answers, on a thread of the program's, and the library's own thread.
 
+#include "client/QVClientBatch.h"
 #include "tests/unit/client/QVScriptedService.h"
 
 #include <atomic>
@@ -142,6 +143,31 @@ TEST_P(QVClientWaitingTest, ItsLimitEndsAWait) {
   EXPECT_TRUE(second);
   EXPECT_FALSE(second.value());
   server.join();
+}
+
+TEST_P(QVClientWaitingTest, WaitingUntilSentSendsWhatABatchKeeps) {
+  connect();
+  service_.letIn();
+  const QVClientBatch batch(*client_);
+  EXPECT_FALSE(client_->createReportingSession(1, nullptr));
+  EXPECT_TRUE(service_.callsSoFar().empty());
+  EXPECT_FALSE(client_->waitUntilSent());
+  EXPECT_EQ(service_.nextCall().member, "CreateReportingSession");
+}
+
+TEST_P(QVClientWaitingTest, WaitingUntilSentDoesNotWaitForTheBatchesOfOthers) {
+  connect();
+  service_.letIn();
+  // More than a socket takes: whoever waits now waits for the service to read.
+  QVClientPayload payload;
+  payload.set("text", std::string(std::size_t{2} << 20, 'x'));
+  EXPECT_FALSE(client_->sendMessage(payload, kPlayback, QVClientMessageType::start, 7, nullptr));
+  auto sent = std::async(std::launch::async, [this] { return client_->waitUntilSent(); });
+  const QVClientBatch batch(*client_);
+  EXPECT_EQ(client_->createReportingSession(1, nullptr).code(), Code::queueFull);
+  EXPECT_EQ(service_.nextCall().member, "SendMessage");
+  EXPECT_FALSE(client_->createReportingSession(2, nullptr));
+  EXPECT_FALSE(sent.get());
 }
 
 TEST_P(QVClientWaitingTest, ALimitBeyondAllTimesIsNone) {

@@ -170,6 +170,12 @@ QVDropCounts QVReporterFixture::awaitDrops(uint64_t count) {
   return drops_;
 }
 
+uint64_t QVReporterFixture::awaitDrops(QVDropReason reason, uint64_t count) {
+  std::unique_lock lock(mutex_);
+  EXPECT_TRUE(changed_.wait_for(lock, kPatience, [&] { return drops_.of(reason) >= count; }));
+  return drops_.of(reason);
+}
+
 void QVReporterFixture::switchReporting(bool on) {
   root_.configure("preferences/net.quillon.quietvox.json",
                   on ? "{}" : R"({"disable_reporting": true})");

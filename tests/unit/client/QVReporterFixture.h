@@ -53,6 +53,8 @@ class QVReporterFixture : public testing::Test {
 
   // The drops that the reporter told of, in all; waits until there are so many.
   QVDropCounts awaitDrops(uint64_t count);
+  // The same for one reason; answers how many.
+  uint64_t awaitDrops(QVDropReason reason, uint64_t count);
   // Switches reporting and posts the service's notification.
   void switchReporting(bool on);
   void post();
