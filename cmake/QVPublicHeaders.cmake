@@ -1,0 +1,33 @@
+# Public headers of a library.
+
+# Lays the public headers of the calling folder, and those of the folder that they include, into
+# `destination`, where they include each other as neighbours: a program then needs no include path
+# of the project's. Lists them in the target's property QV_PUBLIC_HEADERS.
+function(qv_public_headers target destination)
+  file(RELATIVE_PATH folder ${PROJECT_SOURCE_DIR} ${CMAKE_CURRENT_SOURCE_DIR})
+  set(left ${ARGN})
+  set(done)
+  set(copies)
+  while(left)
+    list(POP_FRONT left header)
+    if(header IN_LIST done)
+      continue()
+    endif()
+    list(APPEND done ${header})
+    set(source ${CMAKE_CURRENT_SOURCE_DIR}/${header})
+    set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS ${source})
+    file(READ ${source} text)
+    string(REPLACE "#include \"${folder}/" "#include \"" text "${text}")
+    string(REGEX MATCHALL "#include \"[^\"]+\"" includes "${text}")
+    foreach(include IN LISTS includes)
+      string(REGEX REPLACE "#include \"(.+)\"" "\\1" include "${include}")
+      if(NOT EXISTS ${CMAKE_CURRENT_SOURCE_DIR}/${include})
+        message(FATAL_ERROR "${header} is installed, but not ${include}, which it includes")
+      endif()
+      list(APPEND left ${include})
+    endforeach()
+    file(CONFIGURE OUTPUT ${destination}/${header} CONTENT "${text}" @ONLY)
+    list(APPEND copies ${destination}/${header})
+  endwhile()
+  set_target_properties(${target} PROPERTIES QV_PUBLIC_HEADERS "${copies}")
+endfunction()

@@ -1,0 +1,106 @@
+// The installed client library: programs are built with it and report to the service.
+
+#include "tests/package/QVInstallation.h"
+#include "tests/support/QVEndToEndTest.h"
+
+#include <fstream>
+
+#include <gmock/gmock.h>
+
+namespace {
+
+using ::testing::ElementsAre;
+using ::testing::SizeIs;
+
+constexpr const char* kPrograms = QV_SOURCE_DIRECTORY "/packaging/smoke";
+
+// A compiler on a busy machine.
+constexpr std::chrono::minutes kBuildLimit{5};
+
+enum class Language { c, cxx };
+
+// A compiler's command line up to what it is to compile.
+std::vector<std::string> compiler(Language language) {
+  std::vector<std::string> command{language == Language::c ? QV_C_COMPILER : QV_CXX_COMPILER,
+                                   language == Language::c ? "-std=c99" : "-std=c++20",
+                                   "-Wall",
+                                   "-Wextra",
+                                   "-Wpedantic",
+                                   "-Werror"};
+  if (*QV_SANITIZE != '\0') command.emplace_back("-fsanitize=" QV_SANITIZE);
+  return command;
+}
+
+void add(std::vector<std::string>& command, const std::vector<std::string>& arguments) {
+  command.insert(command.end(), arguments.begin(), arguments.end());
+}
+
+void run(const std::vector<std::string>& command) {
+  const auto output = QVSubprocess::run(command, kBuildLimit);
+  ASSERT_EQ(output.status, 0) << output.text;
+}
+
+class QVInstalledClientTest : public QVEndToEndTest {
+ protected:
+  // Has a program report to a service; its session is in the store then.
+  void expectReports(const std::filesystem::path& program, const std::string& language) {
+    service();
+    run({"env", "QUIETVOX_SOCKET=" + root_.socket().string(),
+         "LD_LIBRARY_PATH=" + installation_.libraries().string(), program.string()});
+    endService();
+    EXPECT_THAT(store().rows("SELECT session_id, json_extract(payload, '$.language') "
+                             "FROM beacon_message WHERE category = 3 AND type = 1"),
+                ElementsAre("4711|" + language));
+    EXPECT_THAT(store().rows("SELECT * FROM beacon_session WHERE session_id = 4711"), SizeIs(1));
+  }
+
+  void buildWithPkgConfig(Language language, const std::string& source,
+                          const std::filesystem::path& program) {
+    auto command = compiler(language);
+    add(command, {std::string(kPrograms).append("/").append(source), "-o", program.string()});
+    add(command, installation_.pkgConfig({"--cflags", "--libs"}));
+    run(command);
+  }
+
+  const QVInstallation installation_{{"client", "client-dev"}};
+};
+
+TEST_F(QVInstalledClientTest, HeadersCompileByThemselves) {
+  int count = 0;
+  for (const auto& entry : std::filesystem::directory_iterator(installation_.headers())) {
+    const std::string name = entry.path().filename().string();
+    // Those that are named in small letters are for C, too.
+    for (const Language language : {Language::cxx, Language::c}) {
+      if (language == Language::c && name.starts_with("QV") && name != "QVClientExport.h") continue;
+      const std::string source =
+          (installation_.work() / (language == Language::c ? "header.c" : "header.cpp")).string();
+      std::ofstream(source) << "#include <quietvox/" << name << ">\nint main(void) { return 0; }\n";
+      auto command = compiler(language);
+      // Parts of quietvox_channels.h lie in headers of their own, which rely on what it asks for.
+      add(command, {"-D_DEFAULT_SOURCE", "-fsyntax-only",
+                    "-I" + (installation_.prefix() / "include").string(), source});
+      run(command);
+      ++count;
+    }
+  }
+  EXPECT_GT(count, 10);
+}
+
+TEST_F(QVInstalledClientTest, BuildsCxxProgramsWithPkgConfig) {
+  const auto program = installation_.work() / "reporter";
+  buildWithPkgConfig(Language::cxx, "reporter.cpp", program);
+  expectReports(program, "C++");
+}
+
+TEST_F(QVInstalledClientTest, BuildsCxxProgramsWithItsCMakePackage) {
+  const auto build = installation_.work() / "build";
+  run({"cmake", "-S", kPrograms, "-B", build.string(), "-DCMAKE_C_COMPILER=" QV_C_COMPILER,
+       "-DCMAKE_CXX_COMPILER=" QV_CXX_COMPILER,
+       "-DCMAKE_PREFIX_PATH=" + installation_.prefix().string(),
+       *QV_SANITIZE == '\0' ? "-DCMAKE_BUILD_TYPE=Debug"
+                            : "-DCMAKE_CXX_FLAGS=-fsanitize=" QV_SANITIZE});
+  run({"cmake", "--build", build.string()});
+  expectReports(build / "reporter-cxx", "C++");
+}
+
+}  // namespace
