@@ -7,11 +7,11 @@
 # packaging/ has the files that are not built; debian/ makes a package of each component.
 include(CMakePackageConfigHelpers)
 
-# What the service manager reads lies below its own prefix, also where the project's is another.
-set(QV_UNIT_DIR ${CMAKE_INSTALL_PREFIX}/lib/systemd/system CACHE PATH "Units of the system")
-set(QV_USER_UNIT_DIR ${CMAKE_INSTALL_PREFIX}/lib/systemd/user CACHE PATH "Units of users")
-set(QV_SYSUSERS_DIR ${CMAKE_INSTALL_PREFIX}/lib/sysusers.d CACHE PATH "Users to make")
-set(QV_TMPFILES_DIR ${CMAKE_INSTALL_PREFIX}/lib/tmpfiles.d CACHE PATH "Directories to make")
+# Where the service manager looks, below the prefix or anywhere.
+set(QV_UNIT_DIR lib/systemd/system CACHE STRING "Units of the system")
+set(QV_USER_UNIT_DIR lib/systemd/user CACHE STRING "Units of users")
+set(QV_SYSUSERS_DIR lib/sysusers.d CACHE STRING "Accounts to make")
+set(QV_TMPFILES_DIR lib/tmpfiles.d CACHE STRING "Directories to make")
 
 set(packaging ${PROJECT_SOURCE_DIR}/packaging)
 set(made ${PROJECT_BINARY_DIR}/packaging)

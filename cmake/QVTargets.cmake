@@ -6,7 +6,7 @@ find_package(Threads REQUIRED)
 add_library(qv_options INTERFACE)
 target_include_directories(qv_options INTERFACE ${PROJECT_SOURCE_DIR})
 target_compile_options(qv_options INTERFACE
-  -Wall -Wextra -Wpedantic -Wshadow -Wconversion -Werror
+  -Wall -Wextra -Wpedantic -Wshadow -Wconversion $<$<BOOL:${QV_WARNINGS_END_BUILD}>:-Werror>
   # Log lines and diagnostics name files from the project's root, wherever it was built.
   -ffile-prefix-map=${PROJECT_SOURCE_DIR}/=)
 if(CMAKE_CXX_COMPILER_ID STREQUAL "Clang")

@@ -12,6 +12,9 @@ INTERPRETERS = {
     "#!/usr/bin/env bash": "bash",
     "#!/usr/bin/env python3": "python",
     "#!/usr/bin/python3": "python",
+    # What Debian's tools run: the package's rules, and its maintainer scripts.
+    "#!/usr/bin/make -f": "make",
+    "#!/bin/sh": "sh",
 }
 # Scripts whose --help is tried.
 ANSWERS_HELP = re.compile(r"scripts/[\w-]+|\.ci/run")
