@@ -62,6 +62,27 @@ class QVInstalledClientTest : public QVEndToEndTest {
     run(command);
   }
 
+  // The directory with what was built.
+  std::filesystem::path buildWithCMake(const std::vector<std::string>& options) {
+    const auto build = installation_.work() / "build";
+    std::vector<std::string> command{"cmake",
+                                     "-S",
+                                     kPrograms,
+                                     "-B",
+                                     build.string(),
+                                     "-DCMAKE_C_COMPILER=" QV_C_COMPILER,
+                                     "-DCMAKE_CXX_COMPILER=" QV_CXX_COMPILER,
+                                     "-DCMAKE_PREFIX_PATH=" + installation_.prefix().string()};
+    add(command, options);
+    if (*QV_SANITIZE != '\0') {
+      add(command,
+          {"-DCMAKE_C_FLAGS=-fsanitize=" QV_SANITIZE, "-DCMAKE_CXX_FLAGS=-fsanitize=" QV_SANITIZE});
+    }
+    run(command);
+    run({"cmake", "--build", build.string()});
+    return build;
+  }
+
   const QVInstallation installation_{{"client", "client-dev"}};
 };
 
@@ -92,15 +113,18 @@ TEST_F(QVInstalledClientTest, BuildsCxxProgramsWithPkgConfig) {
   expectReports(program, "C++");
 }
 
+TEST_F(QVInstalledClientTest, BuildsCProgramsWithPkgConfig) {
+  const auto program = installation_.work() / "reporter";
+  buildWithPkgConfig(Language::c, "reporter.c", program);
+  expectReports(program, "C");
+}
+
 TEST_F(QVInstalledClientTest, BuildsCxxProgramsWithItsCMakePackage) {
-  const auto build = installation_.work() / "build";
-  run({"cmake", "-S", kPrograms, "-B", build.string(), "-DCMAKE_C_COMPILER=" QV_C_COMPILER,
-       "-DCMAKE_CXX_COMPILER=" QV_CXX_COMPILER,
-       "-DCMAKE_PREFIX_PATH=" + installation_.prefix().string(),
-       *QV_SANITIZE == '\0' ? "-DCMAKE_BUILD_TYPE=Debug"
-                            : "-DCMAKE_CXX_FLAGS=-fsanitize=" QV_SANITIZE});
-  run({"cmake", "--build", build.string()});
-  expectReports(build / "reporter-cxx", "C++");
+  expectReports(buildWithCMake({"-DWITH_CXX=ON"}) / "reporter-cxx", "C++");
+}
+
+TEST_F(QVInstalledClientTest, BuildsCProgramsWithItsCMakePackage) {
+  expectReports(buildWithCMake({"-DWITH_CXX=OFF"}) / "reporter-c", "C");
 }
 
 }  // namespace
