@@ -15,7 +15,7 @@ int main(void) {
     error = quietvox_session_open(reporter, 4711, QUIETVOX_SERVICE_NONLONGFORMAUDIO, &session);
   }
   quietvox_payload_set_int(message, "frames", 480);
-  quietvox_payload_set_text(message, "language", "C");
+  quietvox_payload_set_string(message, "language", "C");
   if (error == QUIETVOX_OK) error = quietvox_session_start(session);
   if (error == QUIETVOX_OK) {
     error = quietvox_session_send(
