@@ -70,3 +70,14 @@ void QVClientPoller::watchForRoom(bool watch) const {
 void QVClientPoller::forgetSocket() const {
   static_cast<void>(epoll_ctl(socketEvents_.get(), EPOLL_CTL_DEL, socket_, nullptr));
 }
+
+void QVClientPoller::ring() {
+  // In this order: a bell that is silenced in between rings once too often, and never too seldom.
+  bell_.ring();
+  rang_.store(true);
+}
+
+void QVClientPoller::silence() {
+  // Spares a system call where it did not ring, which is nearly always.
+  if (rang_.exchange(false)) bell_.silence();
+}

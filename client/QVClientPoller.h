@@ -3,6 +3,7 @@
 #include "client/QVClientBell.h"
 #include "client/QVClientDescriptor.h"
 
+#include <atomic>
 #include <chrono>
 #include <optional>
 
@@ -32,13 +33,14 @@ class QVClientPoller {
   // The socket is of no use any more.
   void forgetSocket() const;
 
-  void ring() { bell_.ring(); }
-  void silence() { bell_.silence(); }
+  void ring();
+  void silence();
 
  private:
   const int socket_;
   const bool ownThread_;
   QVClientDescriptor socketEvents_;
-  QVClientBell bell_;
+  const QVClientBell bell_;
+  std::atomic<bool> rang_{false};
   QVClientDescriptor allEvents_;  // only with a program's loop
 };

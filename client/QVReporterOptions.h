@@ -29,7 +29,7 @@ struct QVReporterOptions {
   std::string runtimeDirectory{};
 
   // Above either of these, messages are dropped. A message counts with the bytes of its payload and
-  // 32 more. Up to twice the bytes are held in memory.
+  // 24 more. Up to twice the bytes are held in memory.
   std::size_t maximumQueuedBytes = kQVReporterDefaultQueuedBytes;
   std::size_t maximumQueuedMessages = kQVReporterDefaultQueuedMessages;
 

@@ -49,7 +49,6 @@ void QVReporterWorker::run() {
 }
 
 bool QVReporterWorker::work() {
-  core_.bell.silence();
   if (std::exchange(hasNewsOfSwitch_, false)) {
     const bool wasOff = core_.isReportingOff();
     core_.reportingSwitch.readNews();
@@ -62,8 +61,7 @@ bool QVReporterWorker::work() {
   calls_.work();
   const bool isEnding = core_.deadline.load() != TimePoint::max();
   // At the end, once more at once, and only for what is still to be sent.
-  const bool mayConnect =
-      isEnding ? !hasTriedAtEnd_ && !calls_.isDone() : now >= delay_.nextAttempt();
+  const bool mayConnect = isEnding ? !hasTriedAtEnd_ && !mayEnd(now) : now >= delay_.nextAttempt();
   if (client_ == nullptr && mayConnect && calls_.wantsConnection()) {
     hasTriedAtEnd_ = isEnding;
     connect(now);
@@ -158,6 +156,7 @@ void QVReporterWorker::wait() {
                                  {socket, POLLIN, 0}}};
   // A wait that fails is one that ended early.
   static_cast<void>(poll(entries.data(), entries.size(), milliseconds));
+  if (entries[0].revents != 0) core_.bell.silence();
   hasNewsOfSwitch_ = entries[1].revents != 0;
   hasAnswers_ = entries[2].revents != 0;
 }

@@ -8,8 +8,8 @@ int main(void) {
   quietvox_session_open(reporter, 0, QUIETVOX_SERVICE_LONGFORMAUDIO, &session);
   quietvox_session_start(session);
   QuietVoxPayload* const message = quietvox_payload_new();
-  quietvox_payload_set_int(message, "frames", 48000);
-  quietvox_payload_set_string(message, "route", "Speaker");
+  quietvox_payload_set_int(message, "frames", 480);
+  quietvox_payload_set_string(message, "route", "speaker");
   quietvox_session_send(session, message, QUIETVOX_COMPONENT_SESSION | QUIETVOX_KIND_PLAYBACK,
                         QUIETVOX_TYPE_START);
   quietvox_payload_free(message);

@@ -8,8 +8,9 @@ int main() {
   if (!session) return 1;
   session.value()->start();
   QVClientPayload message;
-  message.set("frames", 48000).set("xruns", 0).set("route", "Speaker");
+  message.set("frames", 480).set("route", "speaker");
   session.value()->sendMessage(message, {QVClientComponent::session, QVClientKind::playback},
                                QVClientMessageType::start);
   session.value()->stop();
+  return reporter.value()->flush(std::chrono::seconds(5)) == QVClientError::Code::none ? 0 : 1;
 }

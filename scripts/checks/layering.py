@@ -76,7 +76,7 @@ _SHARED_WITH_BUS = r"platform/linux/(QVDescriptor|QVThreadAnnotations|QVWakeUpBa
 _SHARED_WITH_TOOLS = (r"platform/linux/(QVEventStoreSchema|QVJSONFile|QVJSONText|QVPosixAtomicFile|"
                       r"QVRegularFile|QVServiceDirectories|tally/\w+)\.h")
 
-# The first folder that a file lies in decides.
+# The first folder that a file lies in, or the file itself, decides.
 LAYERS = [
     Layer("platform/fake", [_PLATFORM, r"platform/fake/\w+\.h"]),
     Layer("platform/linux/bus", [_PLATFORM, r"platform/linux/bus/\w+\.h", _SHARED_WITH_BUS],
@@ -87,6 +87,9 @@ LAYERS = [
     Layer("QVServices/Statistics/Service", [_PLATFORM, r"QVServices/Statistics/(Service/)?\w+\.h"],
           machine=False),
     Layer("QVServices", [_PLATFORM, r"QVServices/Statistics/\w+\.h"], machine=False),
+    # The one source of the client that reads a file of the service's.
+    Layer("client/QVReportingPreference.cpp", [r"client/.*\.h"], system=True,
+          libraries=["RapidJSON"]),
     Layer("client",
           [_PLATFORM, r"client/.*\.h", r"platform/linux/bus/\w+\.h", _SHARED_WITH_BUS],
           system=True),
@@ -104,7 +107,8 @@ LAYERS = [
 ]
 
 def layer_of(name):
-    return next((layer for layer in LAYERS if name.startswith(layer.folder + "/")), None)
+    return next((layer for layer in LAYERS
+                 if name == layer.folder or name.startswith(layer.folder + "/")), None)
 
 
 def check_include(project, layer, name, line, match):

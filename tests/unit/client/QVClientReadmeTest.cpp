@@ -1,4 +1,4 @@
-// The example that people read is the one that is compiled.
+// The examples that people read are those that are compiled.
 
 #include <filesystem>
 #include <fstream>
@@ -17,12 +17,14 @@ std::string contentsOf(const std::string& path) {
   return contents.str();
 }
 
-TEST(QVClientReadme, ShowsTheExampleThatIsCompiled) {
+TEST(QVClientReadme, ShowsTheExamplesThatAreCompiled) {
   const std::string readme = contentsOf("client/README.md");
-  const std::string example = contentsOf("client/examples/QVClientExample.cpp");
-  const std::size_t main = example.find("int main()");
-  ASSERT_NE(main, std::string::npos);
-  EXPECT_NE(readme.find("```cpp\n" + example.substr(main) + "```"), std::string::npos);
+  for (const char* file : {"qv_ten_lines.cpp", "QVClientExample.cpp"}) {
+    const std::string example = contentsOf(std::string("client/examples/").append(file));
+    const std::size_t main = example.find("int main()");
+    ASSERT_NE(main, std::string::npos);
+    EXPECT_NE(readme.find("```cpp\n" + example.substr(main) + "```"), std::string::npos) << file;
+  }
 }
 
 }  // namespace
