@@ -30,7 +30,7 @@ class QVRealtimeRing {
   };
 
   // `slots` a power of 2. The session is the consumer's alone.
-  QVRealtimeRing(std::size_t slots, std::size_t slotBytes, QVReporterSessionState* session);
+  QVRealtimeRing(std::size_t slots, std::size_t slotBytes, QVReporterSessionState* owner);
 
   // The producer's. The next slot's memory, empty where all slots are taken.
   std::span<char> nextSlot() noexcept;

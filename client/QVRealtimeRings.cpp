@@ -1,14 +1,7 @@
 #include "client/QVRealtimeRings.h"
 
+#include <algorithm>
 #include <utility>
-
-namespace {
-
-void add(QVDropCounts& sum, const QVDropCounts& more) {
-  for (std::size_t i = 0; i < kQVDropReasonCount; ++i) sum.counts[i] += more.counts[i];
-}
-
-}  // namespace
 
 void QVRealtimeRings::add(std::shared_ptr<QVRealtimeRing> ring) {
   QVMutexLock lock(mutex_);
@@ -17,11 +10,10 @@ void QVRealtimeRings::add(std::shared_ptr<QVRealtimeRing> ring) {
 
 void QVRealtimeRings::remove(const QVRealtimeRing& ring) {
   QVMutexLock lock(mutex_);
-  std::erase_if(rings_, [this, &ring](const std::shared_ptr<QVRealtimeRing>& one) {
-    if (one.get() != &ring) return false;
-    ::add(dropsOfRemoved_, one->takeDrops());
-    return true;
-  });
+  const auto found = std::ranges::find(rings_, &ring, &std::shared_ptr<QVRealtimeRing>::get);
+  if (found == rings_.end()) return;
+  dropsOfRemoved_ += (*found)->takeDrops();
+  rings_.erase(found);
 }
 
 QVRealtimeRings::List QVRealtimeRings::all() {
@@ -32,6 +24,6 @@ QVRealtimeRings::List QVRealtimeRings::all() {
 QVDropCounts QVRealtimeRings::takeDrops() {
   QVMutexLock lock(mutex_);
   QVDropCounts sum = std::exchange(dropsOfRemoved_, {});
-  for (const auto& ring : rings_) ::add(sum, ring->takeDrops());
+  for (const auto& ring : rings_) sum += ring->takeDrops();
   return sum;
 }

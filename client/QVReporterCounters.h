@@ -27,6 +27,10 @@ struct QVDropCounts {
     for (const uint64_t count : counts) sum += count;
     return sum;
   }
+  QVDropCounts& operator+=(const QVDropCounts& more) noexcept {
+    for (std::size_t i = 0; i < kQVDropReasonCount; ++i) counts[i] += more.counts[i];
+    return *this;
+  }
 };
 
 // What became of a reporter's messages since it was opened. A value.

@@ -83,9 +83,7 @@ QVReporterOptions QVReporterFixture::options() {
   options.dropReportInterval = std::chrono::milliseconds(0);
   options.dropped = [this](const QVDropCounts& sinceLast) {
     const std::lock_guard lock(mutex_);
-    for (std::size_t i = 0; i < kQVDropReasonCount; ++i) {
-      drops_.counts[i] += sinceLast.counts[i];
-    }
+    drops_ += sinceLast;
     changed_.notify_all();
   };
   return options;

@@ -33,8 +33,7 @@ int quietvox_c99_fill(QuietVoxPayload* payload) {
   return quietvox_payload_error(payload);
 }
 
-static int send_all(QuietVoxReporter* reporter, QuietVoxSession* session,
-                    QuietVoxPayload* payload) {
+static int sendAll(QuietVoxReporter* reporter, QuietVoxSession* session, QuietVoxPayload* payload) {
   int error = quietvox_payload_set_int(payload, "n", 48000);
   if (error == QUIETVOX_OK) error = quietvox_session_configure(session, payload);
   if (error == QUIETVOX_OK) error = quietvox_session_start(session);
@@ -56,7 +55,7 @@ int quietvox_c99_report(QuietVoxReporter* reporter, QuietVoxRealtimeQueue** queu
                         QuietVoxSession** session) {
   QuietVoxPayload* payload = quietvox_payload_new();
   int error = quietvox_session_open(reporter, 7, QUIETVOX_SERVICE_TELEPHONY, session);
-  if (error == QUIETVOX_OK) error = send_all(reporter, *session, payload);
+  if (error == QUIETVOX_OK) error = sendAll(reporter, *session, payload);
   quietvox_payload_free(payload);
   if (error == QUIETVOX_OK) error = quietvox_realtime_open(*session, 16, 256, queue);
   if (error != QUIETVOX_OK) return error;
