@@ -58,7 +58,7 @@ QVClientRequest messageRequest(const QVClientPayload& message, QVClientCategory 
 }  // namespace
 
 QVClientResult<std::unique_ptr<QVClient>> QVClient::connect(QVClientOptions options) {
-  QVClientResult<QVClientDescriptor> socket = QVClientConnectSocket(options);
+  QVClientResult<QVDescriptor> socket = QVClientConnectSocket(options);
   if (!socket) return socket.error();
   auto connection =
       std::make_shared<QVClientConnection>(std::move(socket.value()), std::move(options));
@@ -68,7 +68,7 @@ QVClientResult<std::unique_ptr<QVClient>> QVClient::connect(QVClientOptions opti
 
 QVClientResult<std::unique_ptr<QVClient>> QVClient::connectedTo(int socket,
                                                                 QVClientOptions options) {
-  QVClientDescriptor owned(socket);
+  QVDescriptor owned(socket);
   if (!QVClientPrepareSocket(socket)) {
     return QVClientError(QVClientError::Code::cannotConnect,
                          "the socket given: " + QVClientSystemErrorText(errno));

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "client/QVClientDescriptor.h"
+#include "platform/linux/QVDescriptor.h"
 
 // Wakes whoever waits on its descriptor, which is readable from a ring on until it is silenced.
 //
@@ -16,5 +16,5 @@ class QVClientBell {
   void silence() const;
 
  private:
-  const QVClientDescriptor event_;
+  const QVDescriptor event_;
 };

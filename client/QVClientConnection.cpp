@@ -43,7 +43,7 @@ QVClientError wouldDeadlockError() {
 
 }  // namespace
 
-QVClientConnection::QVClientConnection(QVClientDescriptor socket, QVClientOptions options)
+QVClientConnection::QVClientConnection(QVDescriptor socket, QVClientOptions options)
     : options_(std::move(options)),
       socket_(std::move(socket)),
       poller_(socket_.get(), hasOwnThread()),

@@ -2,11 +2,11 @@
 
 #include "client/QVClientCall.h"
 #include "client/QVClientCallTable.h"
-#include "client/QVClientDescriptor.h"
 #include "client/QVClientInbox.h"
 #include "client/QVClientOptions.h"
 #include "client/QVClientPoller.h"
 #include "client/QVClientRequest.h"
+#include "platform/linux/QVDescriptor.h"
 #include "platform/linux/QVThreadAnnotations.h"
 
 #include <atomic>
@@ -40,7 +40,7 @@ class QVClientConnection : public std::enable_shared_from_this<QVClientConnectio
  public:
   using Deadline = std::optional<std::chrono::steady_clock::time_point>;
 
-  QVClientConnection(QVClientDescriptor socket, QVClientOptions options);
+  QVClientConnection(QVDescriptor socket, QVClientOptions options);
 
   // Begins to talk to the service. Once, before anything else.
   QVClientError start();
@@ -108,7 +108,7 @@ class QVClientConnection : public std::enable_shared_from_this<QVClientConnectio
   void finishClosing();
 
   const QVClientOptions options_;
-  const QVClientDescriptor socket_;
+  const QVDescriptor socket_;
   QVClientPoller poller_;
   std::thread thread_;                             // set by start()
   std::atomic<std::thread::id> callbackThread_{};  // while it may run replies

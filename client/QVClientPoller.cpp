@@ -28,11 +28,11 @@ QVClientPoller::QVClientPoller(int socket, bool ownThread)
   if (ownThread) {
     complete = complete && add(socketEvents_.get(), bell_.descriptor(), EPOLLIN);
   } else if (complete) {
-    allEvents_ = QVClientDescriptor(epoll_create1(EPOLL_CLOEXEC));
+    allEvents_ = QVDescriptor(epoll_create1(EPOLL_CLOEXEC));
     complete = allEvents_.isOpen() && add(allEvents_.get(), socketEvents_.get(), EPOLLIN) &&
                add(allEvents_.get(), bell_.descriptor(), EPOLLIN);
   }
-  if (!complete) socketEvents_ = QVClientDescriptor();
+  if (!complete) socketEvents_ = QVDescriptor();
 }
 
 bool QVClientPoller::isOpen() const noexcept {

@@ -1,7 +1,7 @@
 #pragma once
 
 #include "client/QVClientBell.h"
-#include "client/QVClientDescriptor.h"
+#include "platform/linux/QVDescriptor.h"
 
 #include <atomic>
 #include <chrono>
@@ -39,8 +39,8 @@ class QVClientPoller {
  private:
   const int socket_;
   const bool ownThread_;
-  QVClientDescriptor socketEvents_;
+  QVDescriptor socketEvents_;
   const QVClientBell bell_;
   std::atomic<bool> rang_{false};
-  QVClientDescriptor allEvents_;  // only with a program's loop
+  QVDescriptor allEvents_;  // only with a program's loop
 };

@@ -40,14 +40,14 @@ std::string QVClientSocketPath(const QVClientOptions& options) {
   return named ? fromEnvironment : kQVClientDefaultSocketPath;
 }
 
-QVClientResult<QVClientDescriptor> QVClientConnectSocket(const QVClientOptions& options) {
+QVClientResult<QVDescriptor> QVClientConnectSocket(const QVClientOptions& options) {
   const std::string path = QVClientSocketPath(options);
   sockaddr_un address{};
   address.sun_family = AF_UNIX;
   if (path.size() >= sizeof address.sun_path) return cannotConnect(path, "path too long");
   std::copy(path.begin(), path.end(), address.sun_path);
 
-  QVClientDescriptor socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+  QVDescriptor socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
   if (!socket.isOpen()) return cannotConnect(path, QVClientSystemErrorText(errno));
   setSendTimeLimit(socket.get(), options.connectTimeLimit);
   int result = -1;

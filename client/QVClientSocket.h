@@ -1,8 +1,8 @@
 #pragma once
 
-#include "client/QVClientDescriptor.h"
 #include "client/QVClientOptions.h"
 #include "client/QVClientResult.h"
+#include "platform/linux/QVDescriptor.h"
 
 #include <cstddef>
 #include <string>
@@ -15,7 +15,7 @@ std::string QVClientSocketPath(const QVClientOptions& options);
 
 // A socket that is connected to the service. Waits up to the options' limit where the service has a
 // queue of clients; starts the service where it is started on demand.
-QVClientResult<QVClientDescriptor> QVClientConnectSocket(const QVClientOptions& options);
+QVClientResult<QVDescriptor> QVClientConnectSocket(const QVClientOptions& options);
 
 // Makes a socket that somebody else connected fit for this library; false where it is none.
 bool QVClientPrepareSocket(int socket);

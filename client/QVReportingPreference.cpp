@@ -1,6 +1,6 @@
 #include "client/QVReportingPreference.h"
 
-#include "client/QVClientDescriptor.h"
+#include "platform/linux/QVDescriptor.h"
 
 #include <algorithm>
 #include <array>
@@ -108,7 +108,7 @@ class Handler {
 // Nothing where it is no regular file, too large, or cannot be read.
 std::string contentsOf(const std::string& path) {
   // Not waiting for the other end of a pipe.
-  const QVClientDescriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+  const QVDescriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
   struct stat status {};
   if (!file.isOpen() || fstat(file.get(), &status) != 0 || !S_ISREG(status.st_mode)) return {};
   std::string text;

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "client/QVClientDescriptor.h"
+#include "platform/linux/QVDescriptor.h"
 
 #include <atomic>
 #include <string>
@@ -37,7 +37,7 @@ class QVReportingSwitch {
   const std::string preference_;
   const std::string runtimeDirectory_;
   std::atomic<bool> isOff_{false};
-  const QVClientDescriptor inotify_;
+  const QVDescriptor inotify_;
   Watched watched_ = Watched::nothing;
   int watch_ = -1;
 };

@@ -2,10 +2,10 @@
 
 #include "platform/QVPreferences.h"
 #include "platform/QVText.h"
+#include "platform/linux/QVDescriptor.h"
 #include "platform/linux/QVJSONFile.h"
 #include "platform/linux/QVJSONText.h"
 #include "platform/linux/QVPosixAtomicFile.h"
-#include "tools/qvctl/QVDescriptor.h"
 #include "tools/qvctl/QVToolFailure.h"
 
 #include <cerrno>
@@ -71,7 +71,8 @@ void QVReportingSwitch::write(const QVDictionary& values) const {
   if (error) throw QVToolFailure::ofSystem(path.parent_path().string(), error.value());
   struct stat before {};
   const bool isNew = ::stat(path.c_str(), &before) != 0;
-  QVPosixAtomicFile file(path.string());
+  QVPosixAtomicFile file(path.string(), QVDescriptor(::open(path.parent_path().c_str(),
+                                                            O_PATH | O_DIRECTORY | O_CLOEXEC)));
   QVJSONText text;
   file.write(text.write(values));
   file.write("\n");

@@ -1,7 +1,7 @@
 #include "tools/qvctl/QVSessionKeeper.h"
 
 #include "platform/QVText.h"
-#include "tools/qvctl/QVDescriptor.h"
+#include "platform/linux/QVDescriptor.h"
 #include "tools/qvctl/QVSignals.h"
 
 #include <algorithm>

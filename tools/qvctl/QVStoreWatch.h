@@ -1,6 +1,6 @@
 #pragma once
 
-#include "tools/qvctl/QVDescriptor.h"
+#include "platform/linux/QVDescriptor.h"
 
 #include <filesystem>
 

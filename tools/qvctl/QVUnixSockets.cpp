@@ -1,6 +1,6 @@
 #include "tools/qvctl/QVUnixSockets.h"
 
-#include "tools/qvctl/QVDescriptor.h"
+#include "platform/linux/QVDescriptor.h"
 
 #include <array>
 #include <cerrno>

@@ -32,8 +32,8 @@ class QVClientConnectTest : public testing::Test {
     std::filesystem::remove_all(directory_);
   }
   // A socket that accepts nobody by itself.
-  QVClientDescriptor listen(const std::string& path, int queue = 8) {
-    QVClientDescriptor socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+  QVDescriptor listen(const std::string& path, int queue = 8) {
+    QVDescriptor socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
     sockaddr_un address{};
     address.sun_family = AF_UNIX;
     std::copy(path.begin(), path.end(), address.sun_path);
@@ -56,7 +56,7 @@ TEST_F(QVClientConnectTest, OptionsComeBeforeTheEnvironmentBeforeTheDefault) {
 }
 
 TEST_F(QVClientConnectTest, ConnectsAndTalks) {
-  const QVClientDescriptor listener = listen(options_.socketPath);
+  const QVDescriptor listener = listen(options_.socketPath);
   auto connected = QVClient::connect(options_);
   ASSERT_TRUE(connected) << connected.error().text();
   const auto service = QVScriptedService::accepted(accept(listener.get(), nullptr, nullptr));
@@ -69,7 +69,7 @@ TEST_F(QVClientConnectTest, ConnectsAndTalks) {
 }
 
 TEST_F(QVClientConnectTest, AServiceThatStartsLaterGetsWhatWasSentBefore) {
-  const QVClientDescriptor listener = listen(options_.socketPath);
+  const QVDescriptor listener = listen(options_.socketPath);
   auto connected = QVClient::connect(options_);
   EXPECT_FALSE(connected.value()->createReportingSession(1, nullptr));
   const auto service = QVScriptedService::accepted(accept(listener.get(), nullptr, nullptr));
@@ -84,7 +84,7 @@ TEST_F(QVClientConnectTest, AMissingSocketIsNamedWithTheReason) {
 }
 
 TEST_F(QVClientConnectTest, ASocketThatNobodyListensOnIsNamedWithTheReason) {
-  { const QVClientDescriptor gone = listen(options_.socketPath); }
+  { const QVDescriptor gone = listen(options_.socketPath); }
   const auto connected = QVClient::connect(options_);
   EXPECT_EQ(connected.error().text(), options_.socketPath + ": Connection refused");
 }
@@ -96,7 +96,7 @@ TEST_F(QVClientConnectTest, APathThatNoSocketCanHaveIsNamed) {
 }
 
 TEST_F(QVClientConnectTest, DoesNotWaitForEverForAServiceThatAcceptsNobody) {
-  const QVClientDescriptor listener = listen(options_.socketPath, 0);
+  const QVDescriptor listener = listen(options_.socketPath, 0);
   options_.connectTimeLimit = std::chrono::milliseconds(1);
   std::vector<std::unique_ptr<QVClient>> clients;
   QVClientError error;
