@@ -5,8 +5,8 @@ marked `sh` holds shell: each command in it is one of the project's or one that 
 block behind a line `<!-- FILE -->` shows that file: nothing more, nothing less. The change log may
 name what is gone.
 
-With --programs DIR, the programs that are built there are asked what they take, and every option of
-theirs has to be in their manual page; without it, their sources are looked at.
+With --programs DIR, the programs that are built there are asked what they take; without it, their
+sources are looked at. Whether a manual page is complete, tool.py tells.
 """
 
 import fnmatch
@@ -18,7 +18,7 @@ import shlex
 import sys
 
 from project import open_project
-from usage import OPTION, Usages, commands_in, faults
+from usage import Usages, commands_in, faults
 
 SKIPPED = ("CHANGELOG.md",)
 
@@ -37,7 +37,7 @@ CLASS = re.compile(r"\bQV[A-Z]\w*[a-z]\w*")
 PRESET = re.compile(r"--preset[ =](?P<name>[\w-]+)")
 PROGRAM = re.compile(r"\bbuild/(?P<preset>[\w<>*-]+)/bin/(?P<name>[\w-]+)")
 
-MANUAL = re.compile(r"(?:.*/)?(?P<program>[\w-]+)\.[1-8]")
+MANUAL = re.compile(r"(?:.*/)?[\w-]+\.[1-8]")
 MACRO = re.compile(r"\.(?P<name>[A-Z]{1,2})(?: +(?P<arguments>.*))?$")
 # Text that alternates between two fonts has no blanks between.
 ALTERNATING = {"BI", "BR", "IB", "IR", "RB", "RI"}
@@ -91,11 +91,10 @@ def plain(text):
 
 
 def read_manual(text):
-    """(line, text, is it an example, its bold text) of each line of a manual page."""
+    """(line, text, is it an example) of each line of a manual page."""
     example = False
     for line, content in enumerate(text.split("\n"), 1):
         macro = MACRO.match(content)
-        bold = " ".join(re.findall(r"\\f\[?B\]?(.*?)(?=\\f|$)", content))
         if content.startswith((".nf", ".EX")):
             example = True
         elif content.startswith((".fi", ".EE")):
@@ -103,12 +102,10 @@ def read_manual(text):
         elif macro and macro["name"] not in ("TH", "SH", "SS"):
             arguments = macro["arguments"] or ""
             words = [quoted or word for quoted, word in re.findall(r'"([^"]*)"|(\S+)', arguments)]
-            if "B" in macro["name"]:
-                bold = " ".join(words)
             between = "" if macro["name"] in ALTERNATING else " "
-            yield line, plain(between.join(words)), example, plain(bold)
+            yield line, plain(between.join(words)), example
         elif not content.startswith("."):
-            yield line, plain(content), example, plain(bold)
+            yield line, plain(content), example
 
 
 class Documents:
@@ -230,25 +227,11 @@ class Documents:
         for line, content in enumerate(text.split("\n"), 1):
             self.check_links(name, line, content)
 
-    def check_manual(self, name, program):
-        known = None
-        if program in self.usages.programs:
-            complete = self.usages.all_options(program)
-            known = complete if complete is not None else self.usages.program(program).options
-        named = set()
-        for line, text, example, bold in read_manual(self.project.read(name)):
+    def check_manual(self, name):
+        for line, text, example in read_manual(self.project.read(name)):
             self.check_names(name, line, text)
             if example:
                 self.check_line(name, line, text, False)
-            elif known is not None:
-                options = OPTION.findall(bold)
-                named.update(options)
-                for option in options:
-                    if option not in known:
-                        self.report(name, line, f"{program} knows no {option}")
-        if program in self.usages.asked:
-            for option in sorted(known - named):
-                self.report(name, 1, f"says nothing of {option}, which {program} knows")
 
     def check_links(self, name, line, content):
         for match in LINK.finditer(content):
@@ -268,11 +251,10 @@ def main():
     project, arguments = open_project(__doc__, add_arguments)
     documents = Documents(project, arguments.programs)
     for name in project.files:
-        manual = MANUAL.fullmatch(name)
         if name.endswith(".md") and os.path.basename(name) not in SKIPPED:
             documents.check_markdown(name)
-        elif manual:
-            documents.check_manual(name, manual["program"])
+        elif MANUAL.fullmatch(name):
+            documents.check_manual(name)
     if arguments.programs and not documents.usages.asked:
         sys.exit(f"{arguments.programs}: none of the programs that documents name is built there")
     project.finish()

@@ -73,7 +73,7 @@ _ANY = r".*"
 # source: it is linked without the rest.
 _SHARED_WITH_BUS = r"platform/linux/(QVDescriptor|QVThreadAnnotations|QVWakeUpBatch)\.h"
 
-_SHARED_WITH_TOOLS = (r"platform/linux/(QVEventStoreSchema|QVJSONFile|QVJSONText|QVPosixAtomicFile|"
+_SHARED_WITH_TOOLS = (r"platform/linux/(QVDescriptor|QVEventStoreSchema|QVJSONFile|QVJSONText|QVPosixAtomicFile|"
                       r"QVRegularFile|QVServiceDirectories|tally/\w+)\.h")
 
 # The first folder that a file lies in, or the file itself, decides.
@@ -88,7 +88,7 @@ LAYERS = [
           machine=False),
     Layer("QVServices", [_PLATFORM, r"QVServices/Statistics/\w+\.h"], machine=False),
     # The one source of the client that reads a file of the service's.
-    Layer("client/QVReportingPreference.cpp", [r"client/.*\.h"], system=True,
+    Layer("client/QVReportingPreference.cpp", [r"client/.*\.h", _SHARED_WITH_BUS], system=True,
           libraries=["RapidJSON"]),
     Layer("client",
           [_PLATFORM, r"client/.*\.h", r"platform/linux/bus/\w+\.h", _SHARED_WITH_BUS],

@@ -72,18 +72,6 @@ class Usages:
             self._known[name] = self._asked(name) or self._read(name)
         return self._known[name]
 
-    def all_options(self, name):
-        """Options of a program that was asked, subcommands included; None for others."""
-        top = self.program(name)
-        if name not in self.asked:
-            return None
-        found, places = set(), [top]
-        while places:
-            place = places.pop()
-            found |= place.options
-            places += [place.follow(word) for word in place.subcommands]
-        return found
-
     def _literals(self, name):
         folder = self.programs[name]
         for source in self.project.sources(".cpp", ".h", ".c"):

@@ -131,7 +131,6 @@ class QVReportingSession final : public QVReportingSessionInformation,
   void unregisterFromOrientation(const QVLogSite& site);
 
   MessageIdentifier nextIdentifier(uint32_t category, uint16_t type);
-  void record(const QVDictionary& payload, const MessageIdentifier& identifier);
   void replacePayloadArrays(std::shared_ptr<QVReportingPayloadArray> aggregated,
                             std::shared_ptr<QVReportingPayloadArray> nested);
   void makeEmptyPayloadArrays();

@@ -66,6 +66,18 @@ void sendSingleMessageNow(const QVDictionary& message, uint32_t category, uint16
   if (reply) reply(std::move(error));
 }
 
+// Of a message of this identifier, BASE_COUNT.
+void record(const QVReportingSession& session, const QVDictionary& payload, std::string_view base,
+            uint32_t count) {
+  const auto aggregated = session.aggregatedPayloadData();
+  const auto nested = session.nestedAggregatedPayloadData();
+  // Both are there or, after a stop, neither.
+  if (aggregated == nullptr || nested == nullptr) return;
+  if (const auto position = aggregated->append(payload)) {
+    nested->append(base, count, *position);
+  }
+}
+
 }  // namespace
 
 // What a message is called in the session's file: BASE_COUNT.
@@ -98,7 +110,8 @@ void QVReportingSession::sendMessage(const QVDictionary& message, const QVDictio
                                      uint32_t category, uint16_t type) {
   log().verbose(scope(), kSendFunction, "sending message for session owned by ", reporterID_);
   Message outgoing{payload, message, category, type, false};
-  record(outgoing.payload, nextIdentifier(category, type));
+  const MessageIdentifier identifier = nextIdentifier(category, type);
+  record(*this, outgoing.payload, identifier.base, identifier.count);
   platform().tracePoints->mark(kTraceMessageSent);
   outgoing.started = started_;
   beaconQueue_->async([self = shared_from_this(), outgoing = std::move(outgoing)] {
@@ -114,16 +127,6 @@ void QVReportingSession::makeEmptyPayloadArrays() {
       });
   replacePayloadArrays(std::make_shared<QVReportingPayloadArray>(store),
                        std::make_shared<QVReportingPayloadArray>(store));
-}
-
-void QVReportingSession::record(const QVDictionary& payload, const MessageIdentifier& identifier) {
-  const auto aggregated = aggregatedPayloadData();
-  const auto nested = nestedAggregatedPayloadData();
-  // Both are there or, after a stop, neither.
-  if (aggregated == nullptr || nested == nullptr) return;
-  if (const auto position = aggregated->append(payload)) {
-    nested->append(identifier.base, identifier.count, *position);
-  }
 }
 
 void QVReportingSession::sendOnBeaconQueue(const Message& message) {
