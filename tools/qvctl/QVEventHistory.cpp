@@ -80,7 +80,7 @@ void QVEventHistory::readAll(const Receiver& receiver) {
     }
     progress_.show(part);
     if (earliest == nullptr) break;
-    progress_.clear();
+    progress_.makeRoom();
     receiver(earliest->waiting.front());
     earliest->waiting.pop_front();
   }

@@ -17,6 +17,7 @@ constexpr std::chrono::milliseconds kEach{100};
 QVProgress::QVProgress(std::string text)
     : text_(std::move(text)),
       isTerminal_(::isatty(STDERR_FILENO) == 1),
+      sharesTerminal_(::isatty(STDOUT_FILENO) == 1),
       next_(Clock::now() + kFirst) {}
 
 void QVProgress::show(double part) {
@@ -26,6 +27,10 @@ void QVProgress::show(double part) {
   isShown_ = true;
   const int percent = static_cast<int>(std::clamp(part, 0.0, 1.0) * 100);
   std::fprintf(stderr, "\r%s: %d %%", text_.c_str(), percent);
+}
+
+void QVProgress::makeRoom() {
+  if (sharesTerminal_) clear();
 }
 
 void QVProgress::clear() {

@@ -18,6 +18,9 @@ class QVProgress {
 
   // `part` of one whole.
   void show(double part);
+  // Before other text comes to standard output: where that is a terminal, too, the line is taken
+  // away.
+  void makeRoom();
   void clear();
 
  private:
@@ -25,6 +28,7 @@ class QVProgress {
 
   const std::string text_;
   const bool isTerminal_;
+  const bool sharesTerminal_;
   Clock::time_point next_;
   bool isShown_ = false;
 };

@@ -175,10 +175,15 @@ void QVSessionKeeper::serve(QVServiceConnection& service, int64_t reporterID, in
       return;
     }
     const QVDescriptor connection(::accept4(listener, nullptr, nullptr, SOCK_CLOEXEC));
-    if (!connection.isOpen() || !isTrusted(connection.get())) continue;
+    if (!connection.isOpen()) continue;
     char request = 0;
     ::setsockopt(connection.get(), SOL_SOCKET, SO_RCVTIMEO, &kPatience, sizeof kPatience);
     if (::read(connection.get(), &request, 1) != 1) continue;
+    if (!isTrusted(connection.get())) {
+      send(connection.get(),
+           {QVToolStatus::notPermitted, QVText("session ", reporterID, " is another user's")});
+      continue;
+    }
     const bool isEnd = request == static_cast<char>(Request::destroy);
     if (!isEnd && request != static_cast<char>(Request::stop)) continue;
     const Answer answer = carryOut(service, reporterID, static_cast<Request>(request));

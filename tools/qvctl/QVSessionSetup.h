@@ -22,5 +22,5 @@ struct QVSessionSetup {
   // Whether all of it can be understood; before anything is begun.
   void check() const;
   // Creates the session over this connection, to which it belongs; answers its ID.
-  int64_t create(QVServiceConnection& service) const;
+  int64_t create(QVServiceConnection& connection) const;
 };

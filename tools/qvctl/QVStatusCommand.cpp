@@ -98,8 +98,9 @@ QVValue QVStatusCommand::json(const Findings& findings) const {
   const QVServiceState& state = findings.state;
   std::vector<QVValue> clients;
   for (const auto& client : state.clients) {
-    clients.push_back(QVDictionary{{"pid", client.pid == 0 ? QVValue() : QVValue(client.pid)},
-                                   {"name", client.pid == 0 ? QVValue() : QVValue(client.name)}});
+    clients.emplace_back(
+        QVDictionary{{"pid", client.pid == 0 ? QVValue() : QVValue(client.pid)},
+                     {"name", client.pid == 0 ? QVValue() : QVValue(client.name)}});
   }
   std::vector<QVDictionaryEntry> losses;
   for (const auto& [cause, count] : findings.store.losses) losses.push_back({cause, count});

@@ -105,11 +105,11 @@ void QVSummaryCommand::list(const QVToolContext& context) {
   if (context.output.isJSON()) {
     std::vector<QVValue> all;
     for (const QVSummaryFile& file : files) {
-      all.push_back(QVDictionary{{"file", file.path().string()},
-                                 {"date", file.date()},
-                                 {"application", file.application()},
-                                 {"service", file.service()},
-                                 {"bytes", file.bytes()}});
+      all.emplace_back(QVDictionary{{"file", file.path().string()},
+                                    {"date", file.date()},
+                                    {"application", file.application()},
+                                    {"service", file.service()},
+                                    {"bytes", file.bytes()}});
     }
     context.output.json(QVArray::assemble(all));
     return;

@@ -4,11 +4,12 @@
 #include "platform/linux/QVJSONText.h"
 
 #include <cstddef>
+#include <exception>
 #include <string>
 #include <string_view>
 
 // Thrown where the reader of standard output has gone away: the command ends, quietly.
-struct QVReaderGone {};
+struct QVReaderGone : std::exception {};
 
 // qvctl's standard output: lines for people or, with --json, JSON text, one value a line. Colours
 // only on a terminal, and not where the environment variable NO_COLOR says so or TERM is "dumb".

@@ -31,9 +31,6 @@ std::chrono::microseconds durationOf(const std::string& text) {
   return *duration;
 }
 
-// One that was told is enough.
-struct Enough {};
-
 class Watcher {
  public:
   Watcher(const QVToolContext& context, const QVWatchCommand::Options& options)
@@ -51,24 +48,23 @@ class Watcher {
     if (!reader_.filter().since()) follower_.skip();
     printer_.showTitles();
     output_.flush();
-    try {
+    do {
       look();
-      while (wait()) look();
-    } catch (const Enough&) {
-    }
-    output_.flush();
+    } while (!isEnough() && wait());
   }
 
  private:
   void look() {
     changes_.drain();
-    if (left_ && *left_ == 0) throw Enough();
     follower_.readNew([this](const QVStoredEvent& event) {
+      if (isEnough()) return;
       printer_.show(event);
-      if (left_ && --*left_ == 0) throw Enough();
+      if (left_) --*left_;
     });
     output_.flush();
   }
+
+  bool isEnough() const { return left_ == 0U; }
 
   // Milliseconds until the next look that is due; -1 for none.
   int timeLimit() const {

@@ -5,8 +5,12 @@
 #include <csignal>
 #include <filesystem>
 #include <fstream>
+#include <iterator>
 
+#include <fcntl.h>
 #include <gmock/gmock.h>
+#include <sys/stat.h>
+#include <unistd.h>
 
 namespace {
 
@@ -80,6 +84,29 @@ TEST_F(QVToolSessionTest, ChoosesAnID) {
   EXPECT_TRUE(client().isValid(session));
   EXPECT_EQ(run({"session", "destroy", std::to_string(session)}), "");
   EXPECT_FALSE(client().isValid(session));
+}
+
+TEST_F(QVToolSessionTest, IsNotForOtherUsers) {
+  if (::getuid() != 0) GTEST_SKIP() << "only root can turn into another user";
+  service();
+  EXPECT_EQ(run({"session", "create", "7"}), "7\n");
+  // Where the program lies, another user may not even look; it is taken along as a descriptor.
+  const int program = ::open(QVDaemonProcess::program("qvctl").c_str(), O_RDONLY);
+  ASSERT_EQ(::chmod(root_.path().c_str(), 0755), 0);
+  const auto file = root_.path() / "result";
+  auto all = environment();
+  QVSubprocess other({.arguments = {"setpriv", "--reuid=65534", "--regid=65534", "--clear-groups",
+                                    "/proc/self/fd/3", "session", "stop", "7"},
+                      .environment = all,
+                      .standardOutputFile = file,
+                      .standardErrorFile = file,
+                      .inheritedDescriptor = program});
+  EXPECT_EQ(other.wait(std::chrono::seconds(60)), 4);
+  std::ifstream stream(file);
+  const std::string text{std::istreambuf_iterator<char>(stream), {}};
+  EXPECT_THAT(text, HasSubstr("session 7 is another user's"));
+  ::close(program);
+  EXPECT_EQ(run({"session", "destroy", "7"}), "");
 }
 
 TEST_F(QVToolSessionTest, IsEndedWithItsKeeper) {
