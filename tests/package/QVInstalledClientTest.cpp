@@ -66,6 +66,8 @@ class QVInstalledClientTest : public QVEndToEndTest {
   std::filesystem::path buildWithCMake(const std::vector<std::string>& options) {
     const auto build = installation_.work() / "build";
     std::vector<std::string> command{"cmake",
+                                     "-G",
+                                     "Ninja",
                                      "-S",
                                      kPrograms,
                                      "-B",
