@@ -62,12 +62,10 @@ install(FILES ${packaging}/man/libquietvox-client.3
         COMPONENT client-dev DESTINATION ${CMAKE_INSTALL_MANDIR}/man3)
 
 # Tools.
-if(TARGET qvctl)
-  set(qvctl ${PROJECT_SOURCE_DIR}/tools/qvctl)
-  install(TARGETS qvctl COMPONENT tools RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
-  install(FILES ${qvctl}/qvctl.1 COMPONENT tools DESTINATION ${CMAKE_INSTALL_MANDIR}/man1)
-  install(FILES ${qvctl}/completions/qvctl.bash RENAME qvctl
-          COMPONENT tools DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions)
-  install(FILES ${qvctl}/completions/_qvctl
-          COMPONENT tools DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/vendor-completions)
-endif()
+set(qvctl ${PROJECT_SOURCE_DIR}/tools/qvctl)
+install(TARGETS qvctl COMPONENT tools RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
+install(FILES ${qvctl}/qvctl.1 COMPONENT tools DESTINATION ${CMAKE_INSTALL_MANDIR}/man1)
+install(FILES ${qvctl}/completions/qvctl.bash RENAME qvctl
+        COMPONENT tools DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions)
+install(FILES ${qvctl}/completions/_qvctl
+        COMPONENT tools DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/vendor-completions)

@@ -1,8 +1,8 @@
 #include "tools/qvctl/QVReportingCommand.h"
 
-#include "tools/qvctl/QVReportingSwitch.h"
 #include "tools/qvctl/QVServiceConnection.h"
 #include "tools/qvctl/QVServiceState.h"
+#include "tools/qvctl/QVSwitchControl.h"
 
 #include <optional>
 #include <string>
@@ -22,7 +22,7 @@ QVToolStatus QVReportingCommand::run(const QVToolContext& context, const Options
     return QVToolStatus::done;
   }
   const bool isOn = options.operation == Operation::on;
-  const bool isPosted = QVReportingSwitch(context.places).set(isOn);
+  const bool isPosted = QVSwitchControl(context.places).set(isOn);
   if (context.output.isJSON()) {
     context.output.json(QVDictionary{{"reportingPreference", isOn}, {"posted", isPosted}});
   } else if (!isPosted) {
@@ -33,7 +33,7 @@ QVToolStatus QVReportingCommand::run(const QVToolContext& context, const Options
 }
 
 void QVReportingCommand::show(const QVToolContext& context) {
-  const auto isWanted = QVReportingSwitch(context.places).isOn();
+  const auto isWanted = QVSwitchControl(context.places).isOn();
   std::optional<bool> isReporting;
   if (QVServiceState::find(context.places).isRunning()) {
     isReporting = QVServiceConnection(context.places).isReporting();

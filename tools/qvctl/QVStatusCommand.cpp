@@ -3,8 +3,8 @@
 #include "platform/QVText.h"
 #include "tools/qvctl/QVDisplayText.h"
 #include "tools/qvctl/QVReadOnlyStore.h"
-#include "tools/qvctl/QVReportingSwitch.h"
 #include "tools/qvctl/QVServiceConnection.h"
+#include "tools/qvctl/QVSwitchControl.h"
 #include "tools/qvctl/QVTimeText.h"
 
 #include <chrono>
@@ -57,7 +57,7 @@ QVStatusCommand::Findings QVStatusCommand::find(const Options& options) const {
     findings.sessions = service.reporters().size();
     findings.isReporting = service.isReporting();
   }
-  findings.isWanted = QVReportingSwitch(context_.places).isOn();
+  findings.isWanted = QVSwitchControl(context_.places).isOn();
   findings.store = findStore();
   return findings;
 }

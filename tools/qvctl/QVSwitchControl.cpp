@@ -1,4 +1,4 @@
-#include "tools/qvctl/QVReportingSwitch.h"
+#include "tools/qvctl/QVSwitchControl.h"
 
 #include "platform/QVPreferences.h"
 #include "platform/QVText.h"
@@ -33,7 +33,7 @@ void expectWritable(const std::filesystem::path& directory) {
 
 }  // namespace
 
-QVDictionary QVReportingSwitch::read() const {
+QVDictionary QVSwitchControl::read() const {
   const std::string path = places_.servicePreferences().string();
   QVJSONFailure failure;
   auto values = QVJSONFile::readDictionary(path, failure);
@@ -43,7 +43,7 @@ QVDictionary QVReportingSwitch::read() const {
   throw QVToolFailure(QVToolStatus::failed, QVText(path, ": ", failure.description()));
 }
 
-std::optional<bool> QVReportingSwitch::isOn() const {
+std::optional<bool> QVSwitchControl::isOn() const {
   try {
     return !QVPreferences::booleanReading(read().find(kDisableKey));
   } catch (const QVToolFailure&) {
@@ -51,7 +51,7 @@ std::optional<bool> QVReportingSwitch::isOn() const {
   }
 }
 
-bool QVReportingSwitch::set(bool on) const {
+bool QVSwitchControl::set(bool on) const {
   const QVDictionary values = read();
   checkPermission();
   write(values.merging({{kDisableKey, !on}}));
@@ -59,12 +59,12 @@ bool QVReportingSwitch::set(bool on) const {
 }
 
 // Before anything is changed: a preference without its notification would take effect some day.
-void QVReportingSwitch::checkPermission() const {
+void QVSwitchControl::checkPermission() const {
   expectWritable(places_.directories.preferences());
   expectWritable(places_.directories.notifications());
 }
 
-void QVReportingSwitch::write(const QVDictionary& values) const {
+void QVSwitchControl::write(const QVDictionary& values) const {
   const std::filesystem::path path = places_.servicePreferences();
   std::error_code error;
   std::filesystem::create_directories(path.parent_path(), error);
@@ -80,13 +80,14 @@ void QVReportingSwitch::write(const QVDictionary& values) const {
     throw QVToolFailure::ofSystem(path.string(), static_cast<int>(failure->code));
   }
   // Who may read it stays as it was. Only root can give a file away, and need not.
-  if (!isNew) static_cast<void>(::lchown(path.c_str(), before.st_uid, before.st_gid));
+  [[maybe_unused]] const bool kept =
+      isNew || ::lchown(path.c_str(), before.st_uid, before.st_gid) == 0;
   if (::chmod(path.c_str(), isNew ? kPreferencesMode : before.st_mode & 07777U) != 0) {
     throw QVToolFailure::ofSystem(path.string(), errno);
   }
 }
 
-bool QVReportingSwitch::post() const {
+bool QVSwitchControl::post() const {
   const std::string path = places_.reportingNotification().string();
   // Nothing is written through a link, and nobody is waited for.
   const QVDescriptor file(::open(

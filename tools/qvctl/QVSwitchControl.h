@@ -9,9 +9,9 @@
 //
 // Threads: one at a time. Failures: QVToolFailure, notPermitted where the files are not this
 // user's to change; nothing has been changed then.
-class QVReportingSwitch {
+class QVSwitchControl {
  public:
-  explicit QVReportingSwitch(const QVToolPlaces& places) : places_(places) {}
+  explicit QVSwitchControl(const QVToolPlaces& places) : places_(places) {}
 
   // What the preference says; nothing where it cannot be read.
   std::optional<bool> isOn() const;
