@@ -34,9 +34,9 @@
 // changed.
 class QVDirectoryWatcher {
  public:
-  // The service's user and group, with whose permission others post. A directory that is there
-  // keeps its mode.
-  static constexpr unsigned kDirectoryMode = 0770;
+  // The service's user and group post. Everybody may wait for posts, as clients do that go by the
+  // reporting switch; all that they see is names. A directory that is there keeps its mode.
+  static constexpr unsigned kDirectoryMode = 0775;
 
   enum class Kind {
     posts,     // the file is made, touched, written to or replaced

@@ -259,7 +259,7 @@ TEST_F(QVPreferencesTest, HearPostsInADirectoryOfTheServicesOwn) {
   ::umask(before);
   struct stat status {};
   ASSERT_EQ(::stat(directory().c_str(), &status), 0);
-  EXPECT_EQ(status.st_mode & 07777U, 0770U);
+  EXPECT_EQ(status.st_mode & 07777U, 0775U);
   setPreferences(kOff);
   std::filesystem::remove_all(directory());
   // That may have been a post.

@@ -19,6 +19,7 @@ using ::testing::ElementsAre;
 using ::testing::EndsWith;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
+using ::testing::UnorderedElementsAre;
 using Code = QVClientError::Code;
 
 constexpr std::chrono::milliseconds kPatience{60'000};
@@ -66,15 +67,20 @@ class QVReporterTest : public QVEndToEndTest {
     return store().rows("SELECT payload FROM beacon_message WHERE category = 3 AND session_id = " +
                         std::to_string(reporterID) + " ORDER BY id");
   }
-  // A program of the build that finds this service.
-  QVSubprocess::Output run(const std::string& program, const std::string& argument = {}) {
+  // A program that finds this service.
+  QVSubprocess::Output runCommand(const std::vector<std::string>& program) {
     std::vector<std::string> command{
         "env", "QUIETVOX_SOCKET=" + root_.socket().string(),
         "QUIETVOX_RUNTIME_DIRECTORY=" + root_.runtime().string(),
-        "QUIETVOX_CONFIGURATION_DIRECTORY=" + root_.configuration().string(),
-        QVDaemonProcess::program(program)};
-    if (!argument.empty()) command.push_back(argument);
+        "QUIETVOX_CONFIGURATION_DIRECTORY=" + root_.configuration().string()};
+    command.insert(command.end(), program.begin(), program.end());
     return QVSubprocess::run(command);
+  }
+  // One of the build.
+  QVSubprocess::Output run(const std::string& program, const std::string& argument = {}) {
+    std::vector<std::string> command{QVDaemonProcess::program(program)};
+    if (!argument.empty()) command.push_back(argument);
+    return runCommand(command);
   }
 
   std::unique_ptr<QVReporter> reporter_;
@@ -283,6 +289,41 @@ TEST_F(QVReporterTest, ThePlayerInCSaysWhatIsWrong) {
   EXPECT_EQ(off.status, 1) << off.text;
   EXPECT_THAT(off.text, AllOf(HasSubstr("sent 0, dropped 1\n"),
                               HasSubstr("quietvox-player: reporting is switched off\n")));
+}
+
+// ---- Another language
+
+// No part of the library's is compiled here. (An interpreter that is not instrumented cannot load
+// an instrumented library; the presets with sanitizers run none of these tests.)
+TEST_F(QVReporterTest, ReportsByForeignFunctionCallsAlone) {
+  service();
+  const auto output =
+      runCommand({"/usr/bin/python3", QV_PEER_SCRIPTS "/quietvox_ctypes.py", QV_CLIENT_LIBRARY});
+  EXPECT_EQ(output.status, 0) << output.text;
+  EXPECT_EQ(output.text,
+            "open no error\n"
+            "enabled 1\n"
+            "session no error\n"
+            "reporter 7\n"
+            "configure no error\n"
+            "start no error\n"
+            "open array the payload is not in order\n"
+            "send no error\n"
+            "queue no error\n"
+            "commit no error\n"
+            "stop no error\n"
+            "flush no error\n"
+            "counters no error\n"
+            "sent 2 invalid 1\n"
+            "told of 1\n"
+            "nothing an argument is out of its limits\n");
+  endService();
+  EXPECT_THAT(store().rows("SELECT user_info FROM beacon_session WHERE session_id = 7"),
+              ElementsAre(AllOf(HasSubstr(R"("HostApplicationDisplayID":"net.example.ctypes")"),
+                                HasSubstr("telephony_session"))));
+  EXPECT_THAT(messages(7),
+              UnorderedElementsAre(R"({"frames":480,"levels":[-3.5]})", R"({"frames":960})"));
+  EXPECT_THAT(store().rows("SELECT * FROM loss"), IsEmpty());
 }
 
 }  // namespace

@@ -14,12 +14,17 @@
 
 namespace {
 
+using ::testing::ElementsAre;
+using ::testing::EndsWith;
 using ::testing::IsEmpty;
 using ::testing::IsSupersetOf;
 using ::testing::Not;
 
 constexpr const char* kLibrary = QV_BUILD_DIRECTORY "/lib/libquietvox-client.so";
 constexpr const char* kHeaders = QV_BUILD_DIRECTORY "/include/quietvox";
+
+// Of the symbols of C++: programs run with this release's library alone.
+constexpr const char* kCxxVersion = "QUIETVOX_CLIENT_CXX_" QV_VERSION;
 
 std::string outputOf(const std::vector<std::string>& command) {
   const auto output = QVSubprocess::run(command);
@@ -38,15 +43,19 @@ std::vector<std::string> matches(const std::string& text, const char* pattern) {
   return found;
 }
 
+std::string textOf(const std::filesystem::path& file) {
+  std::ostringstream text;
+  text << std::ifstream(file).rdbuf();
+  return text.str();
+}
+
 // What the public headers mark as offered to programs: names of classes and functions.
 std::set<std::string> offeredNames() {
   static const std::regex kPreprocessor(R"(#[^\n]*)");
   static const std::regex kAfterTheName(R"(\bfinal\b|[^:]:[^:].*)");
   std::set<std::string> names;
   for (const auto& entry : std::filesystem::directory_iterator(kHeaders)) {
-    std::ostringstream text;
-    text << std::ifstream(entry.path()).rdbuf();
-    const std::string code = std::regex_replace(text.str(), kPreprocessor, "");
+    const std::string code = std::regex_replace(textOf(entry.path()), kPreprocessor, "");
     for (const std::string& declaration : matches(code, R"(QV_CLIENT_API\s+([^;{(]*))")) {
       // Its last word: "class Name final : Base", "std::string_view name(".
       const auto words = matches(std::regex_replace(declaration, kAfterTheName, ""), R"((\w+))");
@@ -62,32 +71,73 @@ std::set<std::string> exportedNames(const std::string& symbols) {
   for (const std::string& name : matches(
            symbols,
            R"((?:^|\n)[0-9a-f]* *[A-Z] (?:typeinfo for |typeinfo name for |vtable for )?(\w+))")) {
-    names.insert(name);
+    if (!name.starts_with("QUIETVOX_CLIENT_")) names.insert(name);
   }
-  names.erase("QUIETVOX_CLIENT_0");
   return names;
+}
+
+// The library's symbols as "name@version", without those that stand for a version itself.
+std::set<std::string> exportedSymbols() {
+  std::set<std::string> symbols;
+  for (const std::string& symbol :
+       matches(outputOf({"nm", "-D", "--defined-only", kLibrary}), R"([B-Zu] (\S+))")) {
+    const std::size_t at = symbol.find('@');
+    if (at == std::string::npos) {
+      symbols.insert(symbol);
+    } else {
+      symbols.insert(symbol.substr(0, at) + symbol.substr(symbol.rfind('@')));
+    }
+  }
+  return symbols;
+}
+
+bool isOfC(const std::string& symbol) {
+  return symbol.starts_with("quietvox_");
+}
+
+std::string nameOf(const std::string& symbol) {
+  return symbol.substr(0, symbol.find('@'));
 }
 
 TEST(QVClientLibraryTest, ExportsWhatItsHeadersOfferAndNothingElse) {
   const auto exported = exportedNames(outputOf({"nm", "-DC", "--defined-only", kLibrary}));
-  EXPECT_THAT(exported, IsSupersetOf({std::string("QVClient"), std::string("QVClientPayload")}));
+  EXPECT_THAT(exported, IsSupersetOf({std::string("QVClient"), std::string("QVClientPayload"),
+                                      std::string("quietvox_reporter_open")}));
   EXPECT_EQ(exported, offeredNames());
 }
 
-TEST(QVClientLibraryTest, GivesEachSymbolTheVersionOfTheInterface) {
-  std::istringstream symbols(outputOf({"nm", "-D", "--defined-only", kLibrary}));
-  std::vector<std::string> without;
-  std::string line;
-  int count = 0;
-  while (std::getline(symbols, line)) {
-    ++count;
-    if (line.find("@@QUIETVOX_CLIENT_") == std::string::npos &&
-        line.find(" A QUIETVOX_CLIENT_") == std::string::npos) {
-      without.push_back(line);
+TEST(QVClientLibraryTest, GivesCStableVersionsAndCxxThatOfTheRelease) {
+  static const std::regex kStable(R"(\w+@QUIETVOX_CLIENT_\d\w*)");
+  const std::string ofTheRelease = std::string("@").append(kCxxVersion);
+  for (const std::string& symbol : exportedSymbols()) {
+    if (isOfC(symbol)) {
+      EXPECT_TRUE(std::regex_match(symbol, kStable)) << symbol;
+    } else {
+      EXPECT_THAT(symbol, EndsWith(ofTheRelease));
     }
   }
-  EXPECT_GT(count, 1);
-  EXPECT_THAT(without, IsEmpty());
+}
+
+// Where these differ, the packages do not build, or let programs run with a library that lacks what
+// they need.
+TEST(QVClientLibraryTest, HasItsCFunctionsListedForPackages) {
+  std::set<std::string> exported;
+  std::set<std::string> offered;
+  for (const std::string& symbol : exportedSymbols())
+    if (isOfC(symbol)) exported.insert(symbol);
+  for (const std::string& name : offeredNames())
+    if (isOfC(name)) offered.insert(name);
+  const std::string list = textOf(QV_SOURCE_DIRECTORY "/debian/libquietvox-client0.symbols");
+  std::set<std::string> listed;
+  std::set<std::string> listedNames;
+  for (const std::string& symbol : matches(list, R"(\n (quietvox_\w+@\w+) [0-9.]+~(?=\n))")) {
+    listed.insert(symbol);
+    listedNames.insert(nameOf(symbol));
+  }
+  EXPECT_EQ(listed, exported);
+  EXPECT_EQ(listedNames, offered);
+  EXPECT_THAT(matches(list, R"(\n \(symver\)(\S+ \S+ \S+))"),
+              ElementsAre(std::string(kCxxVersion) + " " QV_VERSION "~ 1"));
 }
 
 TEST(QVClientLibraryTest, NeedsNothingButTheLanguagesLibraries) {

@@ -31,6 +31,17 @@ void expectWritable(const std::filesystem::path& directory) {
   }
 }
 
+// Whoever may post in the directory may touch the file, too. It is posted already: what this user
+// may not give away stays this user's.
+void letOthersPost(int file, const std::filesystem::path& directory) {
+  struct stat place {};
+  if (::stat(directory.c_str(), &place) == 0 && ::fchown(file, place.st_uid, place.st_gid) != 0) {
+    static_cast<void>(::fchown(file, static_cast<uid_t>(-1), place.st_gid));
+  }
+  // Made with this user's umask.
+  static_cast<void>(::fchmod(file, kNotificationMode));
+}
+
 }  // namespace
 
 QVDictionary QVSwitchControl::read() const {
@@ -87,14 +98,19 @@ void QVSwitchControl::write(const QVDictionary& values) const {
   }
 }
 
+// With a file of its own in the place of the one that is there, which may be somebody's who lets
+// nobody else touch it. Nothing is written through a link, either.
 bool QVSwitchControl::post() const {
   const std::string path = places_.reportingNotification().string();
-  // Nothing is written through a link, and nobody is waited for.
-  const QVDescriptor file(::open(
-      path.c_str(), O_WRONLY | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, kNotificationMode));
-  if (!file.isOpen() && errno == ENOENT) return false;
-  if (!file.isOpen() || ::futimens(file.get(), nullptr) != 0) {
+  if (::unlink(path.c_str()) != 0 && errno != ENOENT) throw QVToolFailure::ofSystem(path, errno);
+  const QVDescriptor file(
+      ::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kNotificationMode));
+  if (!file.isOpen()) {
+    // Somebody else posted, after the preference was written.
+    if (errno == EEXIST) return true;
+    if (errno == ENOENT) return false;
     throw QVToolFailure::ofSystem(path, errno);
   }
+  letOthersPost(file.get(), places_.directories.notifications());
   return true;
 }

@@ -21,6 +21,9 @@ using ::testing::SizeIs;
 
 constexpr uint16_t kTelephony = 2;
 
+// A user that this program does not run as.
+constexpr uid_t kSomebody = 4711;
+
 class QVToolStatusTest : public QVToolTest {
  protected:
   // A session that is seen to be started: its row is in the store.
@@ -155,6 +158,34 @@ TEST_F(QVToolStatusTest, SwitchesReportingOffAndOn) {
   EXPECT_EQ(run({"reporting", "on"}), "");
   expectLogged("defaults {\"device_name\":\"kitchen\",\"disable_reporting\":false}");
   EXPECT_EQ(at(json({"reporting", "show"}), {"reporting"}), QVValue(true));
+}
+
+TEST_F(QVToolStatusTest, PostsInThePlaceOfAFileThatNobodyElseMayTouch) {
+  service();
+  const auto directory = root_.runtime() / "notify";
+  // Whose the directory is shows where this is somebody else: where the test may give it away.
+  const uid_t owner = ::geteuid() == 0 ? kSomebody : ::geteuid();
+  ASSERT_EQ(::chown(directory.c_str(), owner, static_cast<gid_t>(-1)), 0);
+  const auto notification = directory / "net.quillon.quietvox.reporting";
+  root_.configure("elsewhere", "as it was");
+  std::filesystem::create_symlink(root_.configuration() / "elsewhere", notification);
+  EXPECT_EQ(run({"reporting", "off"}), "");
+  expectLogged("defaults {\"disable_reporting\":true}");
+  ASSERT_EQ(::chmod(notification.c_str(), 0400), 0);
+  const mode_t before = ::umask(0077);
+  EXPECT_EQ(run({"reporting", "on"}), "");
+  ::umask(before);
+  expectLogged("defaults {\"disable_reporting\":false}");
+
+  struct stat file {};
+  struct stat place {};
+  ASSERT_EQ(::lstat(notification.c_str(), &file), 0);
+  ASSERT_EQ(::stat(directory.c_str(), &place), 0);
+  EXPECT_TRUE(S_ISREG(file.st_mode));
+  EXPECT_EQ(file.st_mode & 07777U, 0660U);
+  EXPECT_EQ(file.st_uid, place.st_uid);
+  EXPECT_EQ(file.st_gid, place.st_gid);
+  EXPECT_EQ(std::filesystem::file_size(root_.configuration() / "elsewhere"), 9U);
 }
 
 TEST_F(QVToolStatusTest, WritesTheSwitchWhileTheServiceDoesNotRun) {

@@ -85,11 +85,11 @@ class QVDirectoryWatcherTest : public testing::Test {
   int markerCount_ = 0;
 };
 
-TEST_F(QVDirectoryWatcherTest, MakesAMissingDirectoryForTheServicesGroup) {
+TEST_F(QVDirectoryWatcherTest, MakesAMissingDirectoryThatItsGroupWritesAndAllMayWatch) {
   const mode_t before = ::umask(0077);
   watch("name", Kind::posts, occurrences_);
   ::umask(before);
-  EXPECT_EQ(modeOf(directory_), 0770U);
+  EXPECT_EQ(modeOf(directory_), 0775U);
 }
 
 TEST_F(QVDirectoryWatcherTest, LeavesTheModeOfADirectoryAsItIs) {
@@ -448,7 +448,7 @@ TEST_F(QVDirectoryWatcherTest, MakesADeletedDirectoryAnewAndTellsEveryWatchOnce)
   std::filesystem::remove_all(directory_);
   ASSERT_TRUE(occurrences_.await(1));
   ASSERT_TRUE(others_.await(1));
-  EXPECT_EQ(modeOf(directory_), 0770U);
+  EXPECT_EQ(modeOf(directory_), 0775U);
   settle();
   EXPECT_EQ(occurrences_.count(), 1U);
   EXPECT_EQ(others_.count(), 1U);
