@@ -112,7 +112,6 @@ bool QVReporter::isReportingEnabled() const noexcept {
 }
 
 QVReporterCounters QVReporter::counters() const {
-  core_->collectDrops();
   QVReporterCounters counters = core_->ledger.counters();
   counters.queuedMessages = core_->queue.queuedMessages();
   counters.queuedBytes = core_->queue.queuedBytes();

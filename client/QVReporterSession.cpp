@@ -73,7 +73,8 @@ QVClientResult<std::unique_ptr<QVRealtimeQueue>> QVReporterSession::makeRealtime
   if (slots * options.bytesPerMessage > kMaximumRingBytes) return fail(Code::invalidArgument);
   try {
     auto ring = std::make_shared<QVRealtimeRing>(slots, options.bytesPerMessage, &state_);
-    core_->rings.add(ring);
+    const Code code = core_->rings.add(ring);
+    if (code != Code::none) return fail(code);
     // From now on the reporter's thread looks at it.
     core_->bell.ring();
     return std::unique_ptr<QVRealtimeQueue>(new QVRealtimeQueue(core_, std::move(ring)));

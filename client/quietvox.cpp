@@ -240,5 +240,6 @@ int quietvox_realtime_commit(QuietVoxRealtimeQueue* queue, uint32_t category, ui
   if (queue == nullptr) return QUIETVOX_ERROR_INVALID_ARGUMENT;
   const bool taken = QVFromHandle(queue)->commit(QVClientCategory(category),
                                                  static_cast<QVClientMessageType>(type));
-  return taken ? QUIETVOX_OK : QUIETVOX_ERROR_INVALID_PAYLOAD;
+  if (taken) return QUIETVOX_OK;
+  return QVFromHandle(queue)->isClosed() ? QUIETVOX_ERROR_CLOSED : QUIETVOX_ERROR_INVALID_PAYLOAD;
 }

@@ -81,17 +81,19 @@ QV_CLIENT_API int quietvox_session_send(QuietVoxSession* session, const QuietVox
 QV_CLIENT_API int quietvox_session_stop(QuietVoxSession* session);
 
 // Opens a queue for one thread that must never wait: of 1 to 65,536 messages (rounded up to a power
-// of 2) with payloads of 64 to 65,536 bytes, 64 MiB in all. Answers INVALID_ARGUMENT or
-// OUT_OF_MEMORY.
+// of 2) with payloads of 64 to 65,536 bytes, 64 MiB in all. Answers INVALID_ARGUMENT,
+// OUT_OF_MEMORY, CLOSED, or QUEUE_FULL beyond 1,024 queues or 128 MiB of one reporter, those closed
+// and not sent yet included.
 QV_CLIENT_API int quietvox_realtime_open(QuietVoxSession* session, size_t messages,
                                          size_t bytesPerMessage, QuietVoxRealtimeQueue** queue);
 // Frees the queue; what was committed is still sent.
 QV_CLIENT_API void quietvox_realtime_close(QuietVoxRealtimeQueue* queue);
 // [rt] The next message's payload, empty, which is the queue's own. Null where the message would be
-// dropped: reporting is off, or the queue is full. One thread at a time, as the next.
+// dropped: reporting is off, the queue is full, or its session or reporter is gone. One thread at a
+// time, as the next.
 QV_CLIENT_API QuietVoxPayload* quietvox_realtime_begin(QuietVoxRealtimeQueue* queue);
 // [rt] Hands over what was begun. Answers INVALID_PAYLOAD where it is not in order or did not fit,
-// or nothing was begun.
+// or nothing was begun; CLOSED where its session or reporter is gone.
 QV_CLIENT_API int quietvox_realtime_commit(QuietVoxRealtimeQueue* queue, uint32_t category,
                                            uint16_t type);
 

@@ -225,6 +225,8 @@ TEST_F(QVClientCInterfaceTest, AnswersErrorsOfTheLibrary) {
   quietvox_reporter_close(handle_);
   handle_ = nullptr;
   EXPECT_EQ(quietvox_session_start(session), QUIETVOX_ERROR_CLOSED);
+  EXPECT_EQ(quietvox_realtime_begin(queue), nullptr);
+  EXPECT_EQ(quietvox_realtime_commit(queue, kCategory, 0), QUIETVOX_ERROR_CLOSED);
   quietvox_realtime_close(queue);
   quietvox_session_destroy(session);
 }
