@@ -12,6 +12,9 @@ namespace {
 constexpr uint64_t kMaximumUnderWay = 256;
 constexpr std::size_t kMaximumBytesUnderWay = std::size_t{256} << 10;
 
+// Sessions that are looked up in one go to be restored; more than there are calls to make.
+constexpr std::size_t kRestoredAtOnce = 256;
+
 // Bytes of one session's configuration that are kept for its restoration. Beyond it only the last
 // addition is.
 constexpr std::size_t kMaximumConfigurationBytes = std::size_t{64} << 10;
@@ -40,12 +43,17 @@ void QVReporterCalls::begin(QVClient& client) {
   isLost_ = false;
   isAnswered_ = false;
   isRestored_ = !core_.options.restoreSessions;
+  restoredUpTo_.reset();
 }
 
 void QVReporterCalls::end() {
   client_ = nullptr;
   isLost_ = false;
   isRestored_ = true;
+  // Answers that did not run, for want of memory.
+  core_.countDrop(QVDropReason::connectionLost, std::exchange(messagesUnderWay_, 0));
+  bytesUnderWay_ = 0;
+  answered_ = issued_;
   core_.sessions.forEach([this](QVReporterSessionState& session) {
     session.isPresent = false;
     if (!core_.options.restoreSessions) session.isStarted = false;
@@ -86,12 +94,14 @@ void QVReporterCalls::work() {
 }
 
 bool QVReporterCalls::restore() {
-  bool complete = true;
-  core_.sessions.forEach([this, &complete](QVReporterSessionState& session) {
-    complete = !session.isOpen || session.isPresent || make(session);
-    return complete;
-  });
-  return complete;
+  for (;;) {
+    const auto sessions = core_.sessions.openAbove(restoredUpTo_, kRestoredAtOnce);
+    for (QVReporterSessionState* session : sessions) {
+      if (!session->isPresent && !make(*session)) return false;
+      restoredUpTo_ = session->reporterID;
+    }
+    if (sessions.size() < kRestoredAtOnce) return true;
+  }
 }
 
 // False where a call cannot be made, now or on this connection.
@@ -168,6 +178,7 @@ bool QVReporterCalls::handleMessage(const QVReporterRecord& record, std::span<ch
   const std::size_t bytes = payload.size();
   const auto count = [this, bytes](const QVClientError& error) {
     take(error, bytes);
+    --messagesUnderWay_;
     if (error) {
       core_.countDrop(reasonOf(error));
     } else {
@@ -186,6 +197,7 @@ bool QVReporterCalls::handleMessage(const QVReporterRecord& record, std::span<ch
   }
   if (!issue(error)) return false;
   bytesUnderWay_ += bytes;
+  ++messagesUnderWay_;
   return true;
 }
 

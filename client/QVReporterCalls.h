@@ -5,6 +5,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <optional>
 
 // Turns what lies in a reporter's queues into calls to the service, and counts the answers.
 //
@@ -23,7 +24,7 @@ class QVReporterCalls {
   // A connection is made: the sessions that there are have to be restored on it.
   void begin(QVClient& client);
   // It is of no use any more: it was lost, or a call could not be made. Then end() has to follow,
-  // once the client is gone and all answers have run.
+  // once the client is gone. Answers that have not run by then never will; they count as lost.
   bool isLost() const { return isLost_; }
   void lose() { isLost_ = true; }
   void end();
@@ -82,5 +83,7 @@ class QVReporterCalls {
   uint64_t issued_ = 0;
   uint64_t answered_ = 0;
   std::size_t bytesUnderWay_ = 0;
+  uint64_t messagesUnderWay_ = 0;
+  std::optional<int64_t> restoredUpTo_;  // sessions with higher IDs are not restored yet
   QVClientPayload view_{std::span<char>()};
 };

@@ -37,8 +37,8 @@ extern "C" {
 QV_CLIENT_API const char* quietvox_error_text(int error);
 
 // Opens a reporter, with the defaults where `options` is null. Connects to nothing yet. Answers
-// INVALID_ARGUMENT for options out of their limits, CANNOT_CONNECT without descriptors or threads,
-// OUT_OF_MEMORY. After a fork, only the parent may use it.
+// INVALID_ARGUMENT for options out of their limits, without a size or with flags that there are not;
+// CANNOT_CONNECT without descriptors or threads, OUT_OF_MEMORY. After a fork, only the parent may use it.
 QV_CLIENT_API int quietvox_reporter_open(const QuietVoxReporterOptions* options,
                                          QuietVoxReporter** reporter);
 // Waits up to `endTimeLimit` for what is still to be sent, and frees the reporter. Its sessions
@@ -48,7 +48,8 @@ QV_CLIENT_API void quietvox_reporter_close(QuietVoxReporter* reporter);
 // Waits until everything that was sent before has been taken by the service or dropped. Answers
 // TIMED_OUT, WOULD_DEADLOCK in a drop callback.
 QV_CLIENT_API int quietvox_reporter_flush(QuietVoxReporter* reporter, uint32_t milliseconds);
-// Fills in what `counters->size` has room for. Answers INVALID_ARGUMENT for a size of 0.
+// Fills in what `counters->size` has room for. Answers INVALID_ARGUMENT for a size that was
+// not set.
 QV_CLIENT_API int quietvox_reporter_counters(QuietVoxReporter* reporter,
                                              QuietVoxCounters* counters);
 // [rt] 1 or 0: what the reporting switch says, as it was last read; an error for a null handle.
