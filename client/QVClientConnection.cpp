@@ -90,11 +90,15 @@ void QVClientConnection::close() {
 }
 
 void QVClientConnection::finishClosing() {
-  {
-    QVMutexLock lock(mutex_);
-    if (closing_) end(closedError());
+  try {
+    {
+      QVMutexLock lock(mutex_);
+      if (closing_) end(closedError());
+    }
+    runDueReplies();
+  } catch (const std::bad_alloc&) {
+    // The replies that are left cannot be told; the program goes on.
   }
-  runDueReplies();
 }
 
 void QVClientConnection::runOwnThread() {

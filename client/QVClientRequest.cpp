@@ -7,6 +7,7 @@
 #include <array>
 #include <bit>
 #include <cstring>
+#include <memory>
 
 namespace {
 
@@ -36,10 +37,13 @@ constexpr std::array<Member, 11> kMembers{{{"CreateReportingSession", "x"},
                                            {"KillService", ""}}};
 
 // The headers of all operations, made once: calls to one operation differ only in flags, length
-// and serial.
+// and serial. Never destroyed: a reporter that a program keeps in a global sends what is left when
+// the program has left main(), after constants that were made later are gone.
 const std::string& headerOf(QVClientOperation operation) {
-  static const std::array<std::string, kMembers.size()> kHeaders = [] {
-    std::array<std::string, kMembers.size()> headers;
+  using Headers = std::array<std::string, kMembers.size()>;
+  static const Headers& kHeaders = *[] {
+    auto made = std::make_unique<Headers>();
+    Headers& headers = *made;
     for (std::size_t i = 0; i < kMembers.size(); ++i) {
       QVBusWriter(headers[i])
           .beginMessage({.path = kPath,
@@ -47,7 +51,7 @@ const std::string& headerOf(QVClientOperation operation) {
                          .member = kMembers[i].name,
                          .signature = kMembers[i].signature});
     }
-    return headers;
+    return made.release();
   }();
   return kHeaders[static_cast<std::size_t>(operation)];
 }
@@ -101,14 +105,12 @@ void appendMessageArguments(std::string& out, QVBusWriter& writer, const QVClien
 
 }  // namespace
 
-const QVClientPayload QVClientRequest::kNoPayload;
-
 std::size_t QVClientRequest::messageBytes() const noexcept {
   return headerOf(operation).size() + bodyBytes(*this);
 }
 
 QVClientError QVClientRequest::check() const {
-  if (!payload->ok()) return payload->error();
+  if (payload != nullptr && !payload->ok()) return payload->error();
   if (messageBytes() > kBusMaximumMessageBytes) {
     return {QVClientError::Code::messageTooLarge, "the call is larger than 8 MiB"};
   }

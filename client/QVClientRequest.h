@@ -28,11 +28,9 @@ enum class QVClientOperation : uint8_t {
 //
 // Made by QVClient, turned into bytes by QVClientConnection. Threads: one at a time.
 struct QVClientRequest {
-  static const QVClientPayload kNoPayload;
-
   QVClientOperation operation;
   QVClientTargets targets = QVClientTargets(0);  // the one reporter ID of most operations
-  const QVClientPayload* payload = &kNoPayload;
+  const QVClientPayload* payload = nullptr;      // of a message or a configuration
   QVClientServiceType serviceType = QVClientServiceType::unknown;
   QVClientCategory category{0U};
   QVClientMessageType messageType = QVClientMessageType::generic;

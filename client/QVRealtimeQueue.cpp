@@ -11,19 +11,16 @@ QVRealtimeQueue::QVRealtimeQueue(std::shared_ptr<QVReporterCore> core,
 
 QVRealtimeQueue::~QVRealtimeQueue() {
   ring_->abandon();
+  // The reporter's thread lets go of the memory.
+  core_->bell.ring();
 }
 
 QVClientPayload* QVRealtimeQueue::begin() noexcept {
   begun_ = false;
-  if (core_->isReportingOff()) {
-    ring_->countDrop(QVDropReason::disabled);
-    return nullptr;
-  }
+  if (ring_->isClosed()) return drop(QVDropReason::connectionLost);
+  if (core_->isReportingOff()) return drop(QVDropReason::disabled);
   const std::span<char> slot = ring_->nextSlot();
-  if (slot.empty()) {
-    ring_->countDrop(QVDropReason::queueFull);
-    return nullptr;
-  }
+  if (slot.empty()) return drop(QVDropReason::queueFull);
   payload_.use(slot);
   begun_ = true;
   return &payload_;
@@ -31,10 +28,23 @@ QVClientPayload* QVRealtimeQueue::begin() noexcept {
 
 bool QVRealtimeQueue::commit(QVClientCategory category, QVClientMessageType type) noexcept {
   if (!std::exchange(begun_, false)) return false;
-  if (!payload_.ok()) {
-    ring_->countDrop(QVDropReason::invalid);
-    return false;
+  QVDropReason reason = QVDropReason::invalid;
+  if (payload_.ok()) {
+    if (ring_->push(payload_.entries().size(), category.word, static_cast<uint16_t>(type))) {
+      return true;
+    }
+    reason = QVDropReason::connectionLost;
   }
-  ring_->push(payload_.entries().size(), category.word, static_cast<uint16_t>(type));
-  return true;
+  drop(reason);
+  return false;
+}
+
+bool QVRealtimeQueue::isClosed() const noexcept {
+  return ring_->isClosed();
+}
+
+// Nobody is woken to tell of it, which would take a system call.
+std::nullptr_t QVRealtimeQueue::drop(QVDropReason reason) noexcept {
+  core_->ledger.countDropSilently(reason);
+  return nullptr;
 }

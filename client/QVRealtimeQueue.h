@@ -3,6 +3,7 @@
 #include "client/QVClientExport.h"
 #include "client/QVClientPayload.h"
 #include "client/QVClientVocabulary.h"
+#include "client/QVReporterCounters.h"
 
 #include <cstddef>
 #include <memory>
@@ -31,8 +32,8 @@ struct QVRealtimeQueueOptions {
 //
 // Threads: begin(), the payload and commit() one thread at a time; the rest any. Making and
 // destroying it is not for a real-time thread. Ownership: made by
-// QVReporterSession::makeRealtimeQueue(), may outlive session and reporter; its messages then stay
-// unsent. What was committed before it is destroyed is still sent.
+// QVReporterSession::makeRealtimeQueue(), may outlive session and reporter; its messages are then
+// dropped and counted as connectionLost. What was committed before it is destroyed is still sent.
 class QV_CLIENT_API QVRealtimeQueue {
  public:
   ~QVRealtimeQueue();
@@ -40,15 +41,20 @@ class QV_CLIENT_API QVRealtimeQueue {
   QVRealtimeQueue& operator=(const QVRealtimeQueue&) = delete;
 
   // The next message's payload, empty. Null where the message would be dropped, because reporting
-  // is off or the queue is full; that is counted. Beginning again starts the message anew.
+  // is off, or the queue is full or closed; that is counted. Beginning again starts the message
+  // anew.
   QVClientPayload* begin() noexcept;
-  // Hands over what begin() gave. False where it is not in order or did not fit, which is counted,
-  // or where nothing was begun.
+  // Hands over what begin() gave. False where it is not in order or did not fit, or the queue was
+  // closed meanwhile, which is counted, or where nothing was begun.
   bool commit(QVClientCategory category, QVClientMessageType type) noexcept;
+  // Is its session destroyed, or its reporter gone? Real-time safe.
+  bool isClosed() const noexcept;
 
  private:
   friend class QVReporterSession;
   QVRealtimeQueue(std::shared_ptr<QVReporterCore> core, std::shared_ptr<QVRealtimeRing> ring);
+
+  std::nullptr_t drop(QVDropReason reason) noexcept;
 
   const std::shared_ptr<QVReporterCore> core_;
   const std::shared_ptr<QVRealtimeRing> ring_;

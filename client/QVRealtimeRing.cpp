@@ -9,7 +9,7 @@ QVRealtimeRing::QVRealtimeRing(std::size_t slots, std::size_t slotBytes,
       memory_(new char[slots * slotBytes]()) {}
 
 std::span<char> QVRealtimeRing::nextSlot() noexcept {
-  const std::size_t written = written_.load(std::memory_order_relaxed);
+  const uint64_t written = written_.load(std::memory_order_relaxed) & ~kClosed;
   if (written - takenSeen_ > mask_) {
     takenSeen_ = taken_.load(std::memory_order_acquire);
     if (written - takenSeen_ > mask_) return {};
@@ -17,22 +17,19 @@ std::span<char> QVRealtimeRing::nextSlot() noexcept {
   return {memory_.get() + (written & mask_) * slotBytes_, slotBytes_};
 }
 
-void QVRealtimeRing::push(std::size_t bytes, uint32_t category, uint16_t type) noexcept {
-  const std::size_t written = written_.load(std::memory_order_relaxed);
+bool QVRealtimeRing::push(std::size_t bytes, uint32_t category, uint16_t type) noexcept {
+  uint64_t written = written_.load(std::memory_order_relaxed);
+  if ((written & kClosed) != 0) return false;
   slots_[written & mask_] = {bytes, category, type};
-  written_.store(written + 1, std::memory_order_release);
-}
-
-void QVRealtimeRing::countDrop(QVDropReason reason) noexcept {
-  // Nobody else writes it, so that it takes no locked addition.
-  std::atomic<uint64_t>& count = drops_[static_cast<std::size_t>(reason)];
-  count.store(count.load(std::memory_order_relaxed) + 1, std::memory_order_relaxed);
+  // Nobody else changes it but close(), once: it need not be tried again.
+  return written_.compare_exchange_strong(written, written + 1, std::memory_order_release,
+                                          std::memory_order_relaxed);
 }
 
 bool QVRealtimeRing::front(Message& message) noexcept {
-  const std::size_t taken = taken_.load(std::memory_order_relaxed);
+  const uint64_t taken = taken_.load(std::memory_order_relaxed);
   if (taken == writtenSeen_) {
-    writtenSeen_ = written_.load(std::memory_order_acquire);
+    writtenSeen_ = written();
     if (taken == writtenSeen_) return false;
   }
   const std::size_t at = taken & mask_;
@@ -45,12 +42,7 @@ void QVRealtimeRing::pop() noexcept {
   taken_.store(taken_.load(std::memory_order_relaxed) + 1, std::memory_order_release);
 }
 
-QVDropCounts QVRealtimeRing::takeDrops() noexcept {
-  QVDropCounts news;
-  for (std::size_t i = 0; i < kQVDropReasonCount; ++i) {
-    const uint64_t all = drops_[i].load(std::memory_order_relaxed);
-    news.counts[i] = all - dropsTaken_.counts[i];
-    dropsTaken_.counts[i] = all;
-  }
-  return news;
+bool QVRealtimeRing::isOver() const noexcept {
+  // In this order: what was pushed before it was abandoned is seen.
+  return abandoned_.load(std::memory_order_acquire) && taken() == written();
 }

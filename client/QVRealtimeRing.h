@@ -1,8 +1,5 @@
 #pragma once
 
-#include "client/QVReporterCounters.h"
-
-#include <array>
 #include <atomic>
 #include <cstddef>
 #include <cstdint>
@@ -19,6 +16,11 @@ struct QVReporterSessionState;
 // as it last saw it, and looks again only when that says full or empty, so that messages cost no
 // traffic between the processors but when they are few.
 //
+//   open --close()--> closed: what was pushed before is still there, nothing more is taken in.
+//
+// The bit that says closed lies in `written_` itself, so that a message is either seen by the
+// consumer or refused to the producer, whatever the two do at once.
+//
 // Used by QVRealtimeQueue (producer) and the reporter's thread (consumer). Threads: as marked.
 // Ownership: shared by both.
 class QVRealtimeRing {
@@ -34,22 +36,35 @@ class QVRealtimeRing {
 
   // The producer's. The next slot's memory, empty where all slots are taken.
   std::span<char> nextSlot() noexcept;
-  // Hands over the slot that nextSlot() gave.
-  void push(std::size_t bytes, uint32_t category, uint16_t type) noexcept;
-  void countDrop(QVDropReason reason) noexcept;
+  // Hands over the slot that nextSlot() gave; false where it is closed.
+  bool push(std::size_t bytes, uint32_t category, uint16_t type) noexcept;
   // It will push no more.
   void abandon() noexcept { abandoned_.store(true, std::memory_order_release); }
 
   // The consumer's. False where there is no message; one stays where it is until pop().
   bool front(Message& message) noexcept;
   void pop() noexcept;
-  bool isAbandoned() const noexcept { return abandoned_.load(std::memory_order_acquire); }
+  // Takes in no more.
+  void close() noexcept { written_.fetch_or(kClosed, std::memory_order_acq_rel); }
 
-  // Any thread, one at a time. What was dropped since this was last asked.
-  QVDropCounts takeDrops() noexcept;
+  // Any thread.
+  bool isClosed() const noexcept {
+    return (written_.load(std::memory_order_relaxed) & kClosed) != 0;
+  }
+  // No messages are in it, and none will be.
+  bool isOver() const noexcept;
+  // How many messages were ever pushed, and popped.
+  uint64_t written() const noexcept { return written_.load(std::memory_order_acquire) & ~kClosed; }
+  uint64_t taken() const noexcept { return taken_.load(std::memory_order_acquire); }
+  // Of payloads, as it was made for.
+  std::size_t bytes() const noexcept { return (mask_ + 1) * slotBytes_; }
 
-  // The consumer's; null once the session is destroyed.
+  // The consumer's, as the next two; null once the session is destroyed.
   QVReporterSessionState* session;
+  // How many messages were pushed before the step of the session, and the flush or the end, that is
+  // being worked off: these it waits for, not for those that come meanwhile.
+  uint64_t writtenBeforeStep = 0;
+  uint64_t writtenBeforeFlush = 0;
 
  private:
   struct Slot {
@@ -58,19 +73,17 @@ class QVRealtimeRing {
     uint16_t type = 0;
   };
   static constexpr std::size_t kCacheLine = 64;
+  static constexpr uint64_t kClosed = uint64_t{1} << 63;
 
   const std::size_t mask_;
   const std::size_t slotBytes_;
   const std::unique_ptr<Slot[]> slots_;
   const std::unique_ptr<char[]> memory_;
 
-  alignas(kCacheLine) std::atomic<std::size_t> written_{0};
-  std::size_t takenSeen_ = 0;  // by the producer
-  // Written by the producer alone.
-  std::array<std::atomic<uint64_t>, kQVDropReasonCount> drops_{};
+  alignas(kCacheLine) std::atomic<uint64_t> written_{0};
+  uint64_t takenSeen_ = 0;  // by the producer
   std::atomic<bool> abandoned_{false};
 
-  alignas(kCacheLine) std::atomic<std::size_t> taken_{0};
-  std::size_t writtenSeen_ = 0;  // by the consumer
-  QVDropCounts dropsTaken_;      // by takeDrops()
+  alignas(kCacheLine) std::atomic<uint64_t> taken_{0};
+  uint64_t writtenSeen_ = 0;  // by the consumer
 };

@@ -3,17 +3,26 @@
 #include <algorithm>
 #include <utility>
 
-void QVRealtimeRings::add(std::shared_ptr<QVRealtimeRing> ring) {
+QVClientError::Code QVRealtimeRings::add(std::shared_ptr<QVRealtimeRing> ring) {
+  removeOver();
   QVMutexLock lock(mutex_);
+  if (isClosed_) return QVClientError::Code::closed;
+  std::size_t bytes = ring->bytes();
+  for (const auto& other : rings_) bytes += other->bytes();
+  if (rings_.size() >= kMaximum || bytes > kMaximumBytes) return QVClientError::Code::queueFull;
   rings_.push_back(std::move(ring));
+  return QVClientError::Code::none;
 }
 
 void QVRealtimeRings::remove(const QVRealtimeRing& ring) {
   QVMutexLock lock(mutex_);
   const auto found = std::ranges::find(rings_, &ring, &std::shared_ptr<QVRealtimeRing>::get);
-  if (found == rings_.end()) return;
-  dropsOfRemoved_ += (*found)->takeDrops();
-  rings_.erase(found);
+  if (found != rings_.end()) rings_.erase(found);
+}
+
+void QVRealtimeRings::removeOver() {
+  QVMutexLock lock(mutex_);
+  std::erase_if(rings_, [](const auto& ring) { return ring->isOver(); });
 }
 
 QVRealtimeRings::List QVRealtimeRings::all() {
@@ -21,9 +30,13 @@ QVRealtimeRings::List QVRealtimeRings::all() {
   return rings_;
 }
 
-QVDropCounts QVRealtimeRings::takeDrops() {
+void QVRealtimeRings::forEach(const std::function<void(QVRealtimeRing&)>& visit) {
   QVMutexLock lock(mutex_);
-  QVDropCounts sum = std::exchange(dropsOfRemoved_, {});
-  for (const auto& ring : rings_) sum += ring->takeDrops();
-  return sum;
+  for (const auto& ring : rings_) visit(*ring);
+}
+
+QVRealtimeRings::List QVRealtimeRings::close() {
+  QVMutexLock lock(mutex_);
+  isClosed_ = true;
+  return std::exchange(rings_, {});
 }

@@ -1,26 +1,40 @@
 #pragma once
 
+#include "client/QVClientError.h"
 #include "client/QVRealtimeRing.h"
 #include "platform/linux/QVThreadAnnotations.h"
 
+#include <cstddef>
+#include <functional>
 #include <memory>
 #include <vector>
 
-// The rings of one reporter's real-time queues.
+// The rings of one reporter's real-time queues, those included whose queue is gone and whose
+// messages are not sent yet.
 //
 // Threads: any, at once. A ring is emptied by the reporter's thread, outside of the lock.
 class QVRealtimeRings {
  public:
   using List = std::vector<std::shared_ptr<QVRealtimeRing>>;
 
-  void add(std::shared_ptr<QVRealtimeRing> ring);
+  // How many there may be, and bytes of their payloads in all: a program that makes a queue for
+  // each track while there is no service must not take all memory.
+  static constexpr std::size_t kMaximum = 1'024;
+  static constexpr std::size_t kMaximumBytes = std::size_t{128} << 20;
+
+  // Answers queueFull beyond the bounds, closed once they are closed.
+  QVClientError::Code add(std::shared_ptr<QVRealtimeRing> ring);
   void remove(const QVRealtimeRing& ring);
+  // Lets go of those that are over.
+  void removeOver();
   List all();
-  // What producers dropped since this was last asked, in all.
-  QVDropCounts takeDrops();
+  // Each in its turn, under the lock; needs no memory.
+  void forEach(const std::function<void(QVRealtimeRing&)>& visit);
+  // Hands all of them out and takes in no more. Needs no memory.
+  List close();
 
  private:
   QVMutex mutex_;
   List rings_ QV_GUARDED_BY(mutex_);
-  QVDropCounts dropsOfRemoved_ QV_GUARDED_BY(mutex_);
+  bool isClosed_ QV_GUARDED_BY(mutex_) = false;
 };

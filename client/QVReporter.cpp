@@ -82,12 +82,20 @@ QVClientResult<std::unique_ptr<QVReporterSession>> QVReporter::openSession(
   try {
     QVReporterSessionState* state = core_->sessions.add(options.reporterID, code);
     if (state != nullptr) {
-      code = core_->take({.kind = QVReporterRecord::Kind::open,
-                          .type = static_cast<uint16_t>(options.serviceType),
-                          .session = state});
-      if (code == Code::none) {
-        return std::unique_ptr<QVReporterSession>(new QVReporterSession(core_, *state));
+      // Made first: what is in the queue has to have somebody who destroys it.
+      std::unique_ptr<QVReporterSession> session(new (std::nothrow)
+                                                     QVReporterSession(core_, *state));
+      code = Code::outOfMemory;
+      if (session != nullptr) {
+        code = core_->take({.kind = QVReporterRecord::Kind::open,
+                            .type = static_cast<uint16_t>(options.serviceType),
+                            .session = state});
       }
+      if (code == Code::none) {
+        session->isOpen_ = true;
+        return session;
+      }
+      core_->sessions.release(state->reporterID);
       core_->sessions.remove(*state);
     }
   } catch (const std::bad_alloc&) {
@@ -112,7 +120,6 @@ bool QVReporter::isReportingEnabled() const noexcept {
 }
 
 QVReporterCounters QVReporter::counters() const {
-  core_->collectDrops();
   QVReporterCounters counters = core_->ledger.counters();
   counters.queuedMessages = core_->queue.queuedMessages();
   counters.queuedBytes = core_->queue.queuedBytes();

@@ -12,12 +12,12 @@ namespace {
 constexpr uint64_t kMaximumUnderWay = 256;
 constexpr std::size_t kMaximumBytesUnderWay = std::size_t{256} << 10;
 
+// Sessions that are looked up in one go to be restored; more than there are calls to make.
+constexpr std::size_t kRestoredAtOnce = 256;
+
 // Bytes of one session's configuration that are kept for its restoration. Beyond it only the last
 // addition is.
 constexpr std::size_t kMaximumConfigurationBytes = std::size_t{64} << 10;
-
-// Messages that are taken from one real-time queue in a row.
-constexpr std::size_t kMaximumDrained = 65'536;
 
 using Kind = QVReporterRecord::Kind;
 
@@ -43,12 +43,17 @@ void QVReporterCalls::begin(QVClient& client) {
   isLost_ = false;
   isAnswered_ = false;
   isRestored_ = !core_.options.restoreSessions;
+  restoredUpTo_.reset();
 }
 
 void QVReporterCalls::end() {
   client_ = nullptr;
   isLost_ = false;
   isRestored_ = true;
+  // Answers that did not run, for want of memory.
+  core_.countDrop(QVDropReason::connectionLost, std::exchange(messagesUnderWay_, 0));
+  bytesUnderWay_ = 0;
+  answered_ = issued_;
   core_.sessions.forEach([this](QVReporterSessionState& session) {
     session.isPresent = false;
     if (!core_.options.restoreSessions) session.isStarted = false;
@@ -75,7 +80,7 @@ bool QVReporterCalls::wantsConnection() {
 
 bool QVReporterCalls::isDone() {
   QVReporterRecord record;
-  return !core_.queue.front(record) && issued_ == answered_ && ringsAreEmpty_;
+  return !core_.queue.front(record) && issued_ == answered_ && areRingsWorkedOff();
 }
 
 void QVReporterCalls::work() {
@@ -89,12 +94,14 @@ void QVReporterCalls::work() {
 }
 
 bool QVReporterCalls::restore() {
-  bool complete = true;
-  core_.sessions.forEach([this, &complete](QVReporterSessionState& session) {
-    complete = !session.isOpen || session.isPresent || make(session);
-    return complete;
-  });
-  return complete;
+  for (;;) {
+    const auto sessions = core_.sessions.openAbove(restoredUpTo_, kRestoredAtOnce);
+    for (QVReporterSessionState* session : sessions) {
+      if (!session->isPresent && !make(*session)) return false;
+      restoredUpTo_ = session->reporterID;
+    }
+    if (sessions.size() < kRestoredAtOnce) return true;
+  }
 }
 
 // False where a call cannot be made, now or on this connection.
@@ -171,6 +178,7 @@ bool QVReporterCalls::handleMessage(const QVReporterRecord& record, std::span<ch
   const std::size_t bytes = payload.size();
   const auto count = [this, bytes](const QVClientError& error) {
     take(error, bytes);
+    --messagesUnderWay_;
     if (error) {
       core_.countDrop(reasonOf(error));
     } else {
@@ -189,6 +197,7 @@ bool QVReporterCalls::handleMessage(const QVReporterRecord& record, std::span<ch
   }
   if (!issue(error)) return false;
   bytesUnderWay_ += bytes;
+  ++messagesUnderWay_;
   return true;
 }
 
@@ -196,7 +205,7 @@ bool QVReporterCalls::handleStep(const QVReporterRecord& record, QVReporterSessi
   if (record.kind == Kind::destroy) return destroy(session);
   const bool makes = record.kind == Kind::open || record.kind == Kind::start;
   if (!hasRoom() && (makes || !isGone(session))) return false;
-  if (record.kind == Kind::stop && !drain(session)) return false;
+  if (record.kind == Kind::stop && !drainBeforeStep(session)) return false;
   switch (record.kind) {
     case Kind::open:
       session.isOpen = true;
@@ -228,15 +237,14 @@ bool QVReporterCalls::handleStep(const QVReporterRecord& record, QVReporterSessi
 
 bool QVReporterCalls::destroy(QVReporterSessionState& session) {
   if (session.isPresent) {
-    if (!hasRoom() || !drain(session) ||
+    if (!hasRoom() || !drainBeforeStep(session) ||
         !issue(client_->destroyReportingSession(session.reporterID, acknowledge()))) {
       return false;
     }
   }
   for (const auto& ring : core_.rings.all()) {
     if (ring->session != &session) continue;
-    ring->session = nullptr;
-    drain(*ring);
+    drop(*ring);
     core_.rings.remove(*ring);
   }
   core_.sessions.remove(session);
@@ -245,54 +253,66 @@ bool QVReporterCalls::destroy(QVReporterSessionState& session) {
 
 // Real-time queues.
 
-bool QVReporterCalls::drain(const QVReporterSessionState& session) {
-  for (const auto& ring : core_.rings.all()) {
-    if (ring->session == &session && !drain(*ring)) return false;
+// False where something is left of what was committed before the step at the queue's front. What
+// is committed from then on does not hold the step up.
+bool QVReporterCalls::drainBeforeStep(const QVReporterSessionState& session) {
+  const QVRealtimeRings::List rings = core_.rings.all();
+  if (std::exchange(markedStep_, core_.queue.consumed()) != core_.queue.consumed()) {
+    for (const auto& ring : rings) ring->writtenBeforeStep = ring->written();
+  }
+  for (const auto& ring : rings) {
+    if (ring->session == &session && !drain(*ring, ring->writtenBeforeStep)) return false;
   }
   return true;
 }
 
-// False where something is left in it.
-bool QVReporterCalls::drain(QVRealtimeRing& ring) {
+// False where something is left of its first `upTo` messages.
+bool QVReporterCalls::drain(QVRealtimeRing& ring, uint64_t upTo) {
   QVRealtimeRing::Message message;
-  for (std::size_t i = 0; i < kMaximumDrained; ++i) {
-    if (!ring.front(message)) return true;
-    if (ring.session == nullptr) {
-      core_.countDrop(QVDropReason::connectionLost);
-    } else if (!handleMessage(
-                   {.type = message.type, .category = message.category, .session = ring.session},
-                   message.payload)) {
+  while (ring.taken() < upTo && ring.front(message)) {
+    if (!handleMessage(
+            {.type = message.type, .category = message.category, .session = ring.session},
+            message.payload)) {
       return false;
     }
     ring.pop();
   }
-  return false;
+  return true;
+}
+
+// It takes in no more, and what is in it is lost. Needs no memory.
+void QVReporterCalls::drop(QVRealtimeRing& ring) {
+  ring.close();
+  ring.session = nullptr;
+  QVRealtimeRing::Message message;
+  for (; ring.front(message); ring.pop()) core_.countDrop(QVDropReason::connectionLost);
 }
 
 void QVReporterCalls::drainAll() {
   polls_ = false;
-  ringsAreEmpty_ = true;
   for (const auto& ring : core_.rings.all()) {
     if (!ring->session->isStarted) continue;
-    // In this order: what was committed before it was abandoned is seen.
-    const bool isAbandoned = ring->isAbandoned();
-    if (!drain(*ring)) {
-      ringsAreEmpty_ = false;
-    } else if (isAbandoned) {
-      core_.rings.remove(*ring);
-      continue;
-    }
-    polls_ = true;
+    drain(*ring, ring->written());
+    polls_ = polls_ || !ring->isOver();
   }
+  core_.rings.removeOver();
+}
+
+void QVReporterCalls::markRings() {
+  core_.rings.forEach([](QVRealtimeRing& ring) { ring.writtenBeforeFlush = ring.written(); });
+}
+
+bool QVReporterCalls::areRingsWorkedOff() {
+  bool are = true;
+  core_.rings.forEach([&are](const QVRealtimeRing& ring) {
+    are = are && (!ring.session->isStarted || ring.taken() >= ring.writtenBeforeFlush);
+  });
+  return are;
 }
 
 void QVReporterCalls::abandon() {
   for (QVReporterRecord record; core_.queue.front(record); core_.queue.pop()) {
     if (record.kind == Kind::message) core_.countDrop(QVDropReason::connectionLost);
   }
-  for (const auto& ring : core_.rings.all()) {
-    ring->session = nullptr;
-    drain(*ring);
-  }
-  core_.collectDrops();
+  for (const auto& ring : core_.rings.close()) drop(*ring);
 }

@@ -5,6 +5,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <optional>
 
 // Turns what lies in a reporter's queues into calls to the service, and counts the answers.
 //
@@ -23,7 +24,7 @@ class QVReporterCalls {
   // A connection is made: the sessions that there are have to be restored on it.
   void begin(QVClient& client);
   // It is of no use any more: it was lost, or a call could not be made. Then end() has to follow,
-  // once the client is gone and all answers have run.
+  // once the client is gone. Answers that have not run by then never will; they count as lost.
   bool isLost() const { return isLost_; }
   void lose() { isLost_ = true; }
   void end();
@@ -35,7 +36,7 @@ class QVReporterCalls {
   void work();
   // Is there anything to be done with a connection?
   bool wantsConnection();
-  // Is nothing left of what has been sent?
+  // Is nothing left of what has been sent, in real-time queues before they were marked?
   bool isDone();
   // May more be sent right now?
   bool hasRoom() const;
@@ -45,8 +46,10 @@ class QVReporterCalls {
   // How many calls were made that are answered, and how many of them are.
   uint64_t issued() const { return issued_; }
   uint64_t answered() const { return answered_; }
-  // Have the real-time queues of started sessions been found empty by the last work()?
-  bool ringsAreEmpty() const { return ringsAreEmpty_; }
+  // Notes what the real-time queues hold: a flush, or the end, begins.
+  void markRings();
+  // Has what they held then been worked off, of started sessions?
+  bool areRingsWorkedOff();
 
   // Counts all that is left as lost. The end.
   void abandon();
@@ -61,8 +64,9 @@ class QVReporterCalls {
   bool handleStep(const QVReporterRecord& record, QVReporterSessionState& session);
   bool handleMessage(const QVReporterRecord& record, std::span<char> payload);
   bool destroy(QVReporterSessionState& session);
-  bool drain(const QVReporterSessionState& session);
-  bool drain(QVRealtimeRing& ring);
+  bool drainBeforeStep(const QVReporterSessionState& session);
+  bool drain(QVRealtimeRing& ring, uint64_t upTo);
+  void drop(QVRealtimeRing& ring);
   void drainAll();
 
   bool issue(const QVClientError& error);
@@ -75,9 +79,11 @@ class QVReporterCalls {
   bool isAnswered_ = false;
   bool isRestored_ = true;
   bool polls_ = false;
-  bool ringsAreEmpty_ = true;
+  uint64_t markedStep_ = UINT64_MAX;  // the record that rings were last marked for
   uint64_t issued_ = 0;
   uint64_t answered_ = 0;
   std::size_t bytesUnderWay_ = 0;
+  uint64_t messagesUnderWay_ = 0;
+  std::optional<int64_t> restoredUpTo_;  // sessions with higher IDs are not restored yet
   QVClientPayload view_{std::span<char>()};
 };

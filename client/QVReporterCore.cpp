@@ -58,10 +58,3 @@ QVClientError::Code QVReporterCore::take(const QVReporterRecord& record) {
 void QVReporterCore::countDrop(QVDropReason reason, uint64_t count) {
   if (ledger.countDrop(reason, count)) bell.ring();
 }
-
-void QVReporterCore::collectDrops() {
-  const QVDropCounts drops = rings.takeDrops();
-  for (std::size_t i = 0; i < kQVDropReasonCount; ++i) {
-    countDrop(static_cast<QVDropReason>(i), drops.counts[i]);
-  }
-}

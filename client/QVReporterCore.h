@@ -31,8 +31,6 @@ struct QVReporterCore {
   // Puts a step of a session's life into the queue.
   QVClientError::Code take(const QVReporterRecord& record);
   void countDrop(QVDropReason reason, uint64_t count = 1);
-  // What real-time threads have dropped goes into the ledger.
-  void collectDrops();
 
   const QVReporterOptions options;
   QVClientBell bell;

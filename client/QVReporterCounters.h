@@ -9,7 +9,7 @@ enum class QVDropReason : uint8_t {
   queueFull,       // the service did not keep up: the bound on what waits for it was reached
   disabled,        // reporting is switched off
   connectionLost,  // it was under way when the connection was lost, its session was lost with the
-                   // connection, or the reporter ended before the service took it
+                   // connection or destroyed, or the reporter ended before the service took it
   refused,         // the service answered with an error
   invalid          // its payload is not in order, or larger than a message may be
 };
@@ -33,7 +33,9 @@ struct QVDropCounts {
   }
 };
 
-// What became of a reporter's messages since it was opened. A value.
+// What became of a reporter's messages since it was opened. A value. Messages that are under way,
+// at most 256 or 256 KiB, and what lies in real-time queues are in none of its numbers yet; behind
+// a flush there are none of the former.
 struct QVReporterCounters {
   uint64_t sent = 0;  // the service has taken them
   QVDropCounts dropped{};

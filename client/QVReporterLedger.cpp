@@ -27,13 +27,24 @@ QVReporterCounters QVReporterLedger::counters() const noexcept {
           .connections = connections_.load(std::memory_order_relaxed)};
 }
 
+bool QVReporterLedger::isAnyDue() const noexcept {
+  if (isDue_.load()) return true;
+  if (!callback_ || isSilent_) return false;
+  const QVDropCounts all = drops();
+  for (std::size_t i = 0; i < kQVDropReasonCount; ++i) {
+    const bool isOfSwitch = static_cast<QVDropReason>(i) == QVDropReason::disabled;
+    if (!isOfSwitch && all.counts[i] != reported_.counts[i]) return true;
+  }
+  return false;
+}
+
 std::optional<QVReporterLedger::TimePoint> QVReporterLedger::nextReport() const noexcept {
-  if (!isDue_.load()) return std::nullopt;
+  if (!isAnyDue()) return std::nullopt;
   return notBefore_;
 }
 
 void QVReporterLedger::report(TimePoint now) {
-  if (isDue_.load() && now >= notBefore_) reportAll(now);
+  if (now >= notBefore_ && isAnyDue()) reportAll(now);
 }
 
 void QVReporterLedger::reportAll(TimePoint now) {

@@ -26,6 +26,11 @@ class QVReporterLedger {
   // True where the reporter's thread has to be told that a report is due: for the first drop since
   // the last report. A drop of the switch makes none due, so that it costs no more than the count.
   bool countDrop(QVDropReason reason, uint64_t count = 1) noexcept;
+  // The same where nobody may be told: for threads that must never wait. It is told of when the
+  // reporter's thread next runs.
+  void countDropSilently(QVDropReason reason) noexcept {
+    drops_[static_cast<std::size_t>(reason)].fetch_add(1, std::memory_order_relaxed);
+  }
   // All but what lies in the queue.
   QVReporterCounters counters() const noexcept;
 
@@ -40,6 +45,7 @@ class QVReporterLedger {
 
  private:
   QVDropCounts drops() const noexcept;
+  bool isAnyDue() const noexcept;
 
   const Callback callback_;
   const std::chrono::milliseconds interval_;

@@ -23,12 +23,15 @@ constexpr std::size_t kMaximumRingBytes = std::size_t{64} << 20;
 }  // namespace
 
 QVReporterSession::QVReporterSession(std::shared_ptr<QVReporterCore> core,
-                                     QVReporterSessionState& state)
+                                     QVReporterSessionState& state) noexcept
     : core_(std::move(core)), state_(state), reporterID_(state.reporterID) {}
 
 QVReporterSession::~QVReporterSession() {
+  if (!isOpen_) return;
   // Refused only where there is no memory, or no reporter: then the session ends with it.
-  static_cast<void>(core_->take({.kind = Kind::destroy, .session = &state_}));
+  if (core_->take({.kind = Kind::destroy, .session = &state_}) == Code::none) {
+    core_->sessions.release(reporterID_);
+  }
 }
 
 int64_t QVReporterSession::reporterID() const noexcept {
@@ -73,7 +76,8 @@ QVClientResult<std::unique_ptr<QVRealtimeQueue>> QVReporterSession::makeRealtime
   if (slots * options.bytesPerMessage > kMaximumRingBytes) return fail(Code::invalidArgument);
   try {
     auto ring = std::make_shared<QVRealtimeRing>(slots, options.bytesPerMessage, &state_);
-    core_->rings.add(ring);
+    const Code code = core_->rings.add(ring);
+    if (code != Code::none) return fail(code);
     // From now on the reporter's thread looks at it.
     core_->bell.ring();
     return std::unique_ptr<QVRealtimeQueue>(new QVRealtimeQueue(core_, std::move(ring)));

@@ -33,7 +33,7 @@ struct QVReporterSessionOptions {
 // Limits: beyond those of the queue, calls that control sessions have 64 KiB of their own.
 class QV_CLIENT_API QVReporterSession {
  public:
-  // Destroys the session; the service stops it where it runs.
+  // Destroys the session; the service stops it where it runs. Its ID may be used again at once.
   ~QVReporterSession();
   QVReporterSession(const QVReporterSession&) = delete;
   QVReporterSession& operator=(const QVReporterSession&) = delete;
@@ -49,16 +49,18 @@ class QV_CLIENT_API QVReporterSession {
                                   QVClientMessageType type);
   QVClientError::Code stop();
 
-  // A way into this session for a thread that must never wait. Answers invalidArgument or
-  // outOfMemory.
+  // A way into this session for a thread that must never wait. Answers invalidArgument,
+  // outOfMemory, closed, or queueFull: a reporter has at most 1,024 of them, with 128 MiB in all,
+  // those included that are destroyed and whose messages are not sent yet.
   QVClientResult<std::unique_ptr<QVRealtimeQueue>> makeRealtimeQueue(
       QVRealtimeQueueOptions options = {});
 
  private:
   friend class QVReporter;
-  QVReporterSession(std::shared_ptr<QVReporterCore> core, QVReporterSessionState& state);
+  QVReporterSession(std::shared_ptr<QVReporterCore> core, QVReporterSessionState& state) noexcept;
 
   const std::shared_ptr<QVReporterCore> core_;
   QVReporterSessionState& state_;  // lives in the core until the destruction is worked off
   const int64_t reporterID_;
+  bool isOpen_ = false;  // its opening lies in the queue: it has to be destroyed
 };

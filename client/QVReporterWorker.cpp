@@ -58,8 +58,11 @@ bool QVReporterWorker::work() {
   if (client_ != nullptr && std::exchange(hasAnswers_, false)) client_->dispatch();
   const TimePoint now = Clock::now();
   if (calls_.isLost()) loseConnection(now);
-  calls_.work();
+  // Before the queues are looked at: what was committed before a flush or the end belongs to it.
+  beginFlush();
   const bool isEnding = core_.deadline.load() != TimePoint::max();
+  if (isEnding && !std::exchange(isEnding_, true)) calls_.markRings();
+  calls_.work();
   // At the end, once more at once, and only for what is still to be sent.
   const bool mayConnect = isEnding ? !hasTriedAtEnd_ && !mayEnd(now) : now >= delay_.nextAttempt();
   if (client_ == nullptr && mayConnect && calls_.wantsConnection()) {
@@ -71,8 +74,7 @@ bool QVReporterWorker::work() {
     // The service runs, and has made what was missing to hear of its switch.
     core_.reportingSwitch.lookAgain();
   }
-  workOffFlushes();
-  core_.collectDrops();
+  workOffFlush();
   core_.ledger.report(now);
   return !isEnding || !mayEnd(now);
 }
@@ -103,10 +105,15 @@ void QVReporterWorker::loseConnection(TimePoint now) {
   delay_.failed(now);
 }
 
-void QVReporterWorker::workOffFlushes() {
-  if (flush_ == Flush::none && core_.flushes.begin(flushedRecords_)) flush_ = Flush::queued;
+void QVReporterWorker::beginFlush() {
+  if (flush_ != Flush::none || !core_.flushes.begin(flushedRecords_)) return;
+  calls_.markRings();
+  flush_ = Flush::queued;
+}
+
+void QVReporterWorker::workOffFlush() {
   if (flush_ == Flush::queued && core_.queue.consumed() >= flushedRecords_ &&
-      calls_.ringsAreEmpty()) {
+      calls_.areRingsWorkedOff()) {
     flush_ = Flush::underWay;
     flushedCalls_ = calls_.issued();
   }

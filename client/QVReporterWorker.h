@@ -35,7 +35,8 @@ class QVReporterWorker {
   bool work();
   void connect(TimePoint now);
   void loseConnection(TimePoint now);
-  void workOffFlushes();
+  void beginFlush();
+  void workOffFlush();
   bool mayEnd(TimePoint now);
   std::optional<TimePoint> nextWakeUp(TimePoint now);
   void wait();
@@ -47,6 +48,7 @@ class QVReporterWorker {
   std::unique_ptr<QVClient> client_;  // before calls_ goes, its answers run
   bool hasNewsOfSwitch_ = false;
   bool hasAnswers_ = false;
+  bool isEnding_ = false;
   bool hasTriedAtEnd_ = false;
   bool isSwitchSettled_ = false;  // looked at since the service answered on this connection
 

@@ -79,7 +79,8 @@ void QVReportingSwitch::readNews() {
       std::memcpy(&event, buffer.data() + at, sizeof event);
       const char* name = event.len != 0 ? buffer.data() + at + sizeof event : "";
       at += sizeof event + event.len;
-      if ((event.mask & IN_Q_OVERFLOW) != 0) isNews = true;
+      // What was lost may have been the end of the directory, or its beginning.
+      if ((event.mask & IN_Q_OVERFLOW) != 0) isAnew = true;
       // Others are of watches that are over.
       if (event.wd != watch_) continue;
       if ((event.mask & kGone) != 0) {

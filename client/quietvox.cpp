@@ -5,6 +5,8 @@
 
 #include <algorithm>
 #include <chrono>
+#include <cstddef>
+#include <cstdint>
 #include <cstring>
 #include <new>
 #include <utility>
@@ -50,6 +52,14 @@ void fill(QuietVoxCounters& out, const QVDropCounts& dropped) {
   out.droppedInvalid = dropped.of(QVDropReason::invalid);
 }
 
+// Of the structs as they first were: no program has shorter ones.
+constexpr std::size_t kLeastOptionsBytes =
+    offsetof(QuietVoxReporterOptions, context) + sizeof(QuietVoxReporterOptions::context);
+constexpr std::size_t kLeastCountersBytes =
+    offsetof(QuietVoxCounters, queuedBytes) + sizeof(QuietVoxCounters::queuedBytes);
+
+constexpr uint32_t kFlags = QUIETVOX_FORGET_SESSIONS | QUIETVOX_END_AT_ONCE;
+
 // The caller's struct may be an older, shorter one or a newer, longer one.
 QuietVoxReporterOptions completed(const QuietVoxReporterOptions& given) {
   QuietVoxReporterOptions options{};
@@ -65,11 +75,15 @@ QVReporterOptions optionsOf(const QuietVoxReporterOptions& given) {
   const auto takeTime = [](milliseconds& time, uint32_t value) {
     if (value != 0) time = milliseconds(value);
   };
+  // What is beyond the machine's sizes is beyond the limits as well.
+  const auto takeSize = [](std::size_t& size, uint64_t value) {
+    if (value != 0) size = static_cast<std::size_t>(std::min<uint64_t>(value, SIZE_MAX));
+  };
   takeText(options.socketPath, given.socketPath);
   takeText(options.configurationDirectory, given.configurationDirectory);
   takeText(options.runtimeDirectory, given.runtimeDirectory);
-  if (given.maximumQueuedBytes != 0) options.maximumQueuedBytes = given.maximumQueuedBytes;
-  if (given.maximumQueuedMessages != 0) options.maximumQueuedMessages = given.maximumQueuedMessages;
+  takeSize(options.maximumQueuedBytes, given.maximumQueuedBytes);
+  takeSize(options.maximumQueuedMessages, given.maximumQueuedMessages);
   options.restoreSessions = (given.flags & QUIETVOX_FORGET_SESSIONS) == 0;
   takeTime(options.shortestReconnectDelay, given.shortestReconnectDelay);
   takeTime(options.longestReconnectDelay, given.longestReconnectDelay);
@@ -115,10 +129,12 @@ const char* quietvox_error_text(int error) {
 int quietvox_reporter_open(const QuietVoxReporterOptions* options, QuietVoxReporter** reporter) {
   if (reporter == nullptr) return QUIETVOX_ERROR_INVALID_ARGUMENT;
   *reporter = nullptr;
-  return guarded([options, reporter] {
-    return handOver(
-        QVReporter::open(options != nullptr ? optionsOf(completed(*options)) : QVReporterOptions()),
-        reporter);
+  return guarded([options, reporter]() -> int {
+    if (options == nullptr) return handOver(QVReporter::open(), reporter);
+    if (options->size < kLeastOptionsBytes) return QUIETVOX_ERROR_INVALID_ARGUMENT;
+    const QuietVoxReporterOptions given = completed(*options);
+    if ((given.flags & ~kFlags) != 0) return QUIETVOX_ERROR_INVALID_ARGUMENT;
+    return handOver(QVReporter::open(optionsOf(given)), reporter);
   });
 }
 
@@ -134,7 +150,7 @@ int quietvox_reporter_flush(QuietVoxReporter* reporter, uint32_t limit) {
 }
 
 int quietvox_reporter_counters(QuietVoxReporter* reporter, QuietVoxCounters* counters) {
-  if (reporter == nullptr || counters == nullptr || counters->size == 0) {
+  if (reporter == nullptr || counters == nullptr || counters->size < kLeastCountersBytes) {
     return QUIETVOX_ERROR_INVALID_ARGUMENT;
   }
   const QVReporterCounters now = QVFromHandle(reporter)->counters();
@@ -240,5 +256,6 @@ int quietvox_realtime_commit(QuietVoxRealtimeQueue* queue, uint32_t category, ui
   if (queue == nullptr) return QUIETVOX_ERROR_INVALID_ARGUMENT;
   const bool taken = QVFromHandle(queue)->commit(QVClientCategory(category),
                                                  static_cast<QVClientMessageType>(type));
-  return taken ? QUIETVOX_OK : QUIETVOX_ERROR_INVALID_PAYLOAD;
+  if (taken) return QUIETVOX_OK;
+  return QVFromHandle(queue)->isClosed() ? QUIETVOX_ERROR_CLOSED : QUIETVOX_ERROR_INVALID_PAYLOAD;
 }

@@ -37,8 +37,8 @@ extern "C" {
 QV_CLIENT_API const char* quietvox_error_text(int error);
 
 // Opens a reporter, with the defaults where `options` is null. Connects to nothing yet. Answers
-// INVALID_ARGUMENT for options out of their limits, CANNOT_CONNECT without descriptors or threads,
-// OUT_OF_MEMORY. After a fork, only the parent may use it.
+// INVALID_ARGUMENT for options out of their limits, without a size or with flags that there are not;
+// CANNOT_CONNECT without descriptors or threads, OUT_OF_MEMORY. After a fork, only the parent may use it.
 QV_CLIENT_API int quietvox_reporter_open(const QuietVoxReporterOptions* options,
                                          QuietVoxReporter** reporter);
 // Waits up to `endTimeLimit` for what is still to be sent, and frees the reporter. Its sessions
@@ -48,7 +48,8 @@ QV_CLIENT_API void quietvox_reporter_close(QuietVoxReporter* reporter);
 // Waits until everything that was sent before has been taken by the service or dropped. Answers
 // TIMED_OUT, WOULD_DEADLOCK in a drop callback.
 QV_CLIENT_API int quietvox_reporter_flush(QuietVoxReporter* reporter, uint32_t milliseconds);
-// Fills in what `counters->size` has room for. Answers INVALID_ARGUMENT for a size of 0.
+// Fills in what `counters->size` has room for. Answers INVALID_ARGUMENT for a size that was
+// not set.
 QV_CLIENT_API int quietvox_reporter_counters(QuietVoxReporter* reporter,
                                              QuietVoxCounters* counters);
 // [rt] 1 or 0: what the reporting switch says, as it was last read; an error for a null handle.
@@ -81,17 +82,19 @@ QV_CLIENT_API int quietvox_session_send(QuietVoxSession* session, const QuietVox
 QV_CLIENT_API int quietvox_session_stop(QuietVoxSession* session);
 
 // Opens a queue for one thread that must never wait: of 1 to 65,536 messages (rounded up to a power
-// of 2) with payloads of 64 to 65,536 bytes, 64 MiB in all. Answers INVALID_ARGUMENT or
-// OUT_OF_MEMORY.
+// of 2) with payloads of 64 to 65,536 bytes, 64 MiB in all. Answers INVALID_ARGUMENT,
+// OUT_OF_MEMORY, CLOSED, or QUEUE_FULL beyond 1,024 queues or 128 MiB of one reporter, those closed
+// and not sent yet included.
 QV_CLIENT_API int quietvox_realtime_open(QuietVoxSession* session, size_t messages,
                                          size_t bytesPerMessage, QuietVoxRealtimeQueue** queue);
 // Frees the queue; what was committed is still sent.
 QV_CLIENT_API void quietvox_realtime_close(QuietVoxRealtimeQueue* queue);
 // [rt] The next message's payload, empty, which is the queue's own. Null where the message would be
-// dropped: reporting is off, or the queue is full. One thread at a time, as the next.
+// dropped: reporting is off, the queue is full, or its session or reporter is gone. One thread at a
+// time, as the next.
 QV_CLIENT_API QuietVoxPayload* quietvox_realtime_begin(QuietVoxRealtimeQueue* queue);
 // [rt] Hands over what was begun. Answers INVALID_PAYLOAD where it is not in order or did not fit,
-// or nothing was begun.
+// or nothing was begun; CLOSED where its session or reporter is gone.
 QV_CLIENT_API int quietvox_realtime_commit(QuietVoxRealtimeQueue* queue, uint32_t category,
                                            uint16_t type);
 

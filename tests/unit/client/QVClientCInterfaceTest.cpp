@@ -172,33 +172,65 @@ TEST_F(QVClientCInterfaceTest, HandlesThatAreNoneAreAnswered) {
   quietvox_payload_free(payload);
 }
 
-TEST_F(QVClientCInterfaceTest, StructsMayBeOfAnotherLength) {
+TEST_F(QVClientCInterfaceTest, StructsMayBeLonger) {
   openReporter();
-  QuietVoxCounters shorter{};
-  shorter.size = offsetof(QuietVoxCounters, droppedDisabled);
-  shorter.connections = 4711;
-  EXPECT_EQ(quietvox_reporter_counters(handle_, &shorter), QUIETVOX_OK);
-  EXPECT_EQ(shorter.size, offsetof(QuietVoxCounters, droppedDisabled));
-  EXPECT_EQ(shorter.connections, 4711U);
-  shorter.size = 0;
-  EXPECT_EQ(quietvox_reporter_counters(handle_, &shorter), QUIETVOX_ERROR_INVALID_ARGUMENT);
+  struct LongerCounters {
+    QuietVoxCounters counters;
+    uint64_t more;
+  };
+  LongerCounters counters{};
+  counters.counters.size = sizeof counters;
+  counters.more = 4711;
+  EXPECT_EQ(quietvox_reporter_counters(handle_, &counters.counters), QUIETVOX_OK);
+  EXPECT_EQ(counters.counters.size, sizeof counters);
+  EXPECT_EQ(counters.more, 4711U);
 
-  struct Longer {
+  struct LongerOptions {
     QuietVoxReporterOptions options;
     std::array<char, 64> more;
   };
-  Longer longer{};
-  longer.options.size = sizeof longer;
-  longer.more.fill('x');
+  LongerOptions options{};
+  options.options.size = sizeof options;
+  options.more.fill('x');
   QuietVoxReporter* reporter = nullptr;
-  EXPECT_EQ(quietvox_reporter_open(&longer.options, &reporter), QUIETVOX_OK);
+  EXPECT_EQ(quietvox_reporter_open(&options.options, &reporter), QUIETVOX_OK);
   quietvox_reporter_close(reporter);
-  // What lies behind the size given is not looked at.
-  QuietVoxReporterOptions older{};
-  std::memset(&older, 0xFF, sizeof older);
-  older.size = offsetof(QuietVoxReporterOptions, socketPath);
-  EXPECT_EQ(quietvox_reporter_open(&older, &reporter), QUIETVOX_OK);
-  quietvox_reporter_close(reporter);
+}
+
+TEST_F(QVClientCInterfaceTest, StructsMustHaveASize) {
+  openReporter();
+  QuietVoxReporter* reporter = nullptr;
+  for (const std::size_t size :
+       {std::size_t{0}, std::size_t{1}, offsetof(QuietVoxReporterOptions, socketPath) + 1,
+        offsetof(QuietVoxReporterOptions, context)}) {
+    QuietVoxReporterOptions options{};
+    options.size = size;
+    EXPECT_EQ(quietvox_reporter_open(&options, &reporter), QUIETVOX_ERROR_INVALID_ARGUMENT) << size;
+    EXPECT_EQ(reporter, nullptr);
+  }
+  for (const std::size_t size :
+       {std::size_t{0}, std::size_t{1}, offsetof(QuietVoxCounters, queuedBytes)}) {
+    QuietVoxCounters counters{};
+    counters.size = size;
+    counters.connections = 4711;
+    EXPECT_EQ(quietvox_reporter_counters(handle_, &counters), QUIETVOX_ERROR_INVALID_ARGUMENT);
+    EXPECT_EQ(counters.connections, 4711U);
+  }
+}
+
+TEST_F(QVClientCInterfaceTest, RefusesOptionsThatThereAreNot) {
+  QuietVoxReporter* reporter = nullptr;
+  QuietVoxReporterOptions options{};
+  options.size = sizeof options;
+  options.flags = 4;
+  EXPECT_EQ(quietvox_reporter_open(&options, &reporter), QUIETVOX_ERROR_INVALID_ARGUMENT);
+  options.flags = 0;
+  options.maximumQueuedBytes = (uint64_t{1} << 32) + 1;
+  EXPECT_EQ(quietvox_reporter_open(&options, &reporter), QUIETVOX_ERROR_INVALID_ARGUMENT);
+  options.maximumQueuedBytes = 0;
+  options.maximumQueuedMessages = (uint64_t{1} << 32) + 1;
+  EXPECT_EQ(quietvox_reporter_open(&options, &reporter), QUIETVOX_ERROR_INVALID_ARGUMENT);
+  EXPECT_EQ(reporter, nullptr);
 }
 
 TEST_F(QVClientCInterfaceTest, AnswersErrorsOfTheLibrary) {
@@ -225,6 +257,8 @@ TEST_F(QVClientCInterfaceTest, AnswersErrorsOfTheLibrary) {
   quietvox_reporter_close(handle_);
   handle_ = nullptr;
   EXPECT_EQ(quietvox_session_start(session), QUIETVOX_ERROR_CLOSED);
+  EXPECT_EQ(quietvox_realtime_begin(queue), nullptr);
+  EXPECT_EQ(quietvox_realtime_commit(queue, kCategory, 0), QUIETVOX_ERROR_CLOSED);
   quietvox_realtime_close(queue);
   quietvox_session_destroy(session);
 }

@@ -1,9 +1,11 @@
 // Real-time queues: the ring by itself, and as a session's reporter empties it.
 
 #include "client/QVRealtimeRing.h"
+#include "client/QVRealtimeRings.h"
 #include "tests/unit/client/QVReporterFixture.h"
 
 #include <cstring>
+#include <future>
 #include <thread>
 
 #include <gmock/gmock.h>
@@ -18,8 +20,7 @@ class QVRealtimeRingTest : public testing::Test {
     const std::span<char> slot = ring.nextSlot();
     if (slot.empty()) return false;
     std::memcpy(slot.data(), &number, sizeof number);
-    ring.push(sizeof number, number, static_cast<uint16_t>(number));
-    return true;
+    return ring.push(sizeof number, number, static_cast<uint16_t>(number));
   }
   static uint32_t numberIn(const QVRealtimeRing::Message& message) {
     uint32_t number = 0;
@@ -51,7 +52,7 @@ TEST_F(QVRealtimeRingTest, TakesAsManyAsItHasSlots) {
 }
 
 TEST_F(QVRealtimeRingTest, HandsOverEveryMessageBetweenTwoThreads) {
-  constexpr uint32_t kMessages = 200'000;
+  constexpr uint32_t kMessages = 20'000;
   QVRealtimeRing ring(16, 64, nullptr);
   std::thread producer([&] {
     for (uint32_t i = 0; i < kMessages;) {
@@ -74,15 +75,85 @@ TEST_F(QVRealtimeRingTest, HandsOverEveryMessageBetweenTwoThreads) {
   producer.join();
 }
 
-TEST_F(QVRealtimeRingTest, TellsOfEachDropOnce) {
-  QVRealtimeRing ring(1, 64, nullptr);
-  ring.countDrop(QVDropReason::queueFull);
-  ring.countDrop(QVDropReason::queueFull);
-  ring.countDrop(QVDropReason::disabled);
-  const QVDropCounts drops = ring.takeDrops();
-  EXPECT_EQ(drops.of(QVDropReason::queueFull), 2U);
-  EXPECT_EQ(drops.of(QVDropReason::disabled), 1U);
-  EXPECT_EQ(ring.takeDrops().inAll(), 0U);
+TEST_F(QVRealtimeRingTest, TakesNothingOnceItIsClosed) {
+  QVRealtimeRing ring(4, 64, nullptr);
+  EXPECT_TRUE(push(ring, 0));
+  const std::span<char> begun = ring.nextSlot();
+  ring.close();
+  EXPECT_TRUE(ring.isClosed());
+  ASSERT_EQ(begun.size(), 64U);
+  EXPECT_FALSE(ring.push(4, 1, 1));
+  EXPECT_EQ(ring.written(), 1U);
+  ASSERT_TRUE(ring.front(message_));
+  EXPECT_EQ(numberIn(message_), 0U);
+  ring.pop();
+  EXPECT_FALSE(ring.front(message_));
+}
+
+TEST_F(QVRealtimeRingTest, ClosingItLosesNoMessageUnnoticed) {
+  for (int round = 0; round < 200; ++round) {
+    QVRealtimeRing ring(1'024, 64, nullptr);
+    uint32_t taken = 0;
+    std::thread producer([&] {
+      while (taken < 1'024 && push(ring, taken)) ++taken;
+    });
+    while (!ring.front(message_)) std::this_thread::yield();
+    ring.close();
+    uint32_t seen = 0;
+    for (; ring.front(message_); ring.pop()) ++seen;
+    producer.join();
+    EXPECT_EQ(seen, taken);
+    EXPECT_FALSE(ring.front(message_));
+  }
+}
+
+class QVRealtimeRingsTest : public QVRealtimeRingTest {
+ protected:
+  std::shared_ptr<QVRealtimeRing> add(std::size_t slots, std::size_t slotBytes) {
+    auto ring = std::make_shared<QVRealtimeRing>(slots, slotBytes, nullptr);
+    code_ = rings_.add(ring);
+    return ring;
+  }
+
+  using Code = QVClientError::Code;
+  QVRealtimeRings rings_;
+  Code code_ = Code::none;
+};
+
+TEST_F(QVRealtimeRingsTest, BoundsTheirNumber) {
+  std::vector<std::shared_ptr<QVRealtimeRing>> rings;
+  for (std::size_t i = 0; i < QVRealtimeRings::kMaximum; ++i) {
+    rings.push_back(add(1, 64));
+    EXPECT_EQ(code_, Code::none);
+  }
+  add(1, 64);
+  EXPECT_EQ(code_, Code::queueFull);
+  // One that holds a message still counts, one that is empty does not.
+  EXPECT_TRUE(push(*rings[0], 1));
+  rings[0]->abandon();
+  add(1, 64);
+  EXPECT_EQ(code_, Code::queueFull);
+  rings[1]->abandon();
+  add(1, 64);
+  EXPECT_EQ(code_, Code::none);
+  EXPECT_EQ(rings_.all().size(), QVRealtimeRings::kMaximum);
+}
+
+TEST_F(QVRealtimeRingsTest, BoundsTheirBytes) {
+  for (int i = 0; i < 2; ++i) {
+    add(1'024, 65'536);
+    EXPECT_EQ(code_, Code::none);
+  }
+  add(1, 64);
+  EXPECT_EQ(code_, Code::queueFull);
+}
+
+TEST_F(QVRealtimeRingsTest, TakeInNothingOnceTheyAreClosed) {
+  add(1, 64);
+  EXPECT_EQ(rings_.close().size(), 1U);
+  add(1, 64);
+  EXPECT_EQ(code_, Code::closed);
+  EXPECT_TRUE(rings_.all().empty());
 }
 
 class QVRealtimeQueueTest : public QVReporterFixture {
@@ -183,14 +254,103 @@ TEST_F(QVRealtimeQueueTest, MayGoBeforeWhatItHolds) {
               ElementsAre("create 7", "type 7 2", "start 7", "valid 7", "send 7 1"));
 }
 
-TEST_F(QVRealtimeQueueTest, MayOutliveItsSessionAndItsReporter) {
+TEST_F(QVRealtimeQueueTest, DropsAndCountsWhatComesWithoutItsSession) {
   begin();
   session_.reset();
   const auto service = accept();
   EXPECT_THAT(serve(*service, 3), ElementsAre("create 7", "type 7 2", "destroy 7"));
+  EXPECT_EQ(reporter_->flush(kPatience), Code::none);
+  EXPECT_TRUE(queue_->isClosed());
+  for (int64_t i = 1; i <= 1'000; ++i) EXPECT_FALSE(commit(i));
+  EXPECT_EQ(reporter_->counters().dropped.of(QVDropReason::connectionLost), 1'000U);
+}
+
+TEST_F(QVRealtimeQueueTest, DropsAndCountsWhatIsHalfWrittenWhenItsSessionGoes) {
+  begin();
+  QVClientPayload* message = queue_->begin();
+  ASSERT_NE(message, nullptr);
+  session_.reset();
+  const auto service = accept();
+  serve(*service, 3);
+  EXPECT_EQ(reporter_->flush(kPatience), Code::none);
+  message->set("n", 1);
+  EXPECT_FALSE(queue_->commit(kPlayback, QVClientMessageType::generic));
+  EXPECT_EQ(reporter_->counters().dropped.of(QVDropReason::connectionLost), 1U);
+}
+
+TEST_F(QVRealtimeQueueTest, MayOutliveItsReporter) {
+  begin();
+  EXPECT_FALSE(queue_->isClosed());
   EXPECT_TRUE(commit(1));
   reporter_.reset();
-  EXPECT_TRUE(commit(2));
+  EXPECT_EQ(awaitDrops(1).of(QVDropReason::connectionLost), 1U);
+  EXPECT_TRUE(queue_->isClosed());
+  EXPECT_FALSE(commit(2));
+  EXPECT_EQ(session_->makeRealtimeQueue().error().code(), Code::closed);
+}
+
+TEST_F(QVRealtimeQueueTest, AreBoundedWhileTheirSessionIsNotStarted) {
+  begin({.messages = 1, .bytesPerMessage = 64});
+  // Closed without a message, they take nothing.
+  for (int i = 0; i < 2'000; ++i) ASSERT_TRUE(session_->makeRealtimeQueue({.messages = 1}));
+  QVClientResult<std::unique_ptr<QVRealtimeQueue>> made = QVClientError();
+  std::size_t kept = 1;
+  while ((made = session_->makeRealtimeQueue({.messages = 1, .bytesPerMessage = 64}))) {
+    ASSERT_NE(made.value()->begin(), nullptr);
+    ASSERT_TRUE(made.value()->commit(kPlayback, QVClientMessageType::generic));
+    ASSERT_LE(++kept, 1'024U);
+  }
+  EXPECT_EQ(made.error().code(), Code::queueFull);
+  EXPECT_EQ(kept, 1'024U);
+}
+
+// A thread that keeps its queue full: for each message that the service answers there is another.
+class QVFullRealtimeQueueTest : public QVRealtimeQueueTest {
+ protected:
+  static constexpr std::size_t kSlots = 1'024;  // more than may be under way
+
+  void beginFull() {
+    begin({.messages = kSlots, .bytesPerMessage = 64});
+    session_->start();
+    service_ = accept();
+    serve(*service_, 4);
+    EXPECT_EQ(reporter_->flush(kPatience), Code::none);
+    fillUp();
+  }
+  void fillUp() {
+    while (queue_->begin() != nullptr) {
+      EXPECT_TRUE(queue_->commit(kPlayback, QVClientMessageType::generic));
+    }
+  }
+  std::string serveFull() {
+    fillUp();
+    return serve(*service_);
+  }
+
+  std::unique_ptr<QVScriptedService> service_;
+};
+
+TEST_F(QVFullRealtimeQueueTest, HoldsUpNoStop) {
+  beginFull();
+  session_->stop();
+  std::string call;
+  for (std::size_t i = 0; i < 3 * kSlots && call != "stop 7"; ++i) call = serveFull();
+  EXPECT_EQ(call, "stop 7");
+}
+
+TEST_F(QVFullRealtimeQueueTest, HoldsUpNoDestruction) {
+  beginFull();
+  session_.reset();
+  std::string call;
+  for (std::size_t i = 0; i < 3 * kSlots && call != "destroy 7"; ++i) call = serveFull();
+  EXPECT_EQ(call, "destroy 7");
+}
+
+TEST_F(QVFullRealtimeQueueTest, HoldsUpNoFlush) {
+  beginFull();
+  auto flushed = std::async(std::launch::async, [this] { return reporter_->flush(kPatience); });
+  while (flushed.wait_for(std::chrono::seconds(0)) != std::future_status::ready) serveFull();
+  EXPECT_EQ(flushed.get(), Code::none);
 }
 
 TEST_F(QVRealtimeQueueTest, KeepsItsMessagesWhileThereIsNoService) {

@@ -190,6 +190,18 @@ TEST_F(QVReporterLedgerTest, TheSwitchMakesNoReportDue) {
   EXPECT_EQ(reports_.size(), 1U);
 }
 
+TEST_F(QVReporterLedgerTest, TellsOfWhatWasCountedSilently) {
+  ledger_.countDropSilently(QVDropReason::disabled);
+  EXPECT_FALSE(ledger_.nextReport());
+  ledger_.countDropSilently(QVDropReason::queueFull);
+  EXPECT_TRUE(ledger_.nextReport());
+  ledger_.report(start_);
+  ASSERT_EQ(reports_.size(), 1U);
+  EXPECT_EQ(reports_[0].of(QVDropReason::queueFull), 1U);
+  EXPECT_EQ(reports_[0].of(QVDropReason::disabled), 1U);
+  EXPECT_FALSE(ledger_.nextReport());
+}
+
 TEST_F(QVReporterLedgerTest, CountsWithNobodyToTell) {
   QVReporterLedger ledger(nullptr, seconds(1));
   EXPECT_FALSE(ledger.countDrop(QVDropReason::invalid));

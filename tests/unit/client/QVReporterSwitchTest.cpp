@@ -6,6 +6,7 @@
 #include "platform/linux/QVJSONFile.h"
 #include "tests/unit/client/QVReporterFixture.h"
 
+#include <array>
 #include <filesystem>
 #include <fstream>
 #include <thread>
@@ -177,6 +178,24 @@ TEST_F(QVReportingSwitchTest, HearsOfADirectoryThatIsMadeAnew) {
   switchReporting(true);
   awaitNews(reportingSwitch);
   EXPECT_FALSE(reportingSwitch.isOff());
+}
+
+TEST_F(QVReportingSwitchTest, HearsOfADirectoryThatIsMadeAnewBehindLostEvents) {
+  QVReportingSwitch reportingSwitch = makeSwitch();
+  std::size_t kept = 0;
+  std::ifstream("/proc/sys/fs/inotify/max_queued_events") >> kept;
+  ASSERT_GT(kept, 0U);
+  // Equal events in a row are one, so they come of two files in turn.
+  const std::array<std::string, 2> files{notifications() / "a", notifications() / "b"};
+  for (const std::string& file : files) std::ofstream(file) << "posted";
+  for (std::size_t i = 0; i <= kept; ++i) ASSERT_EQ(::chmod(files[i % 2].c_str(), 0600), 0);
+  std::filesystem::remove_all(notifications());
+  std::filesystem::create_directory(notifications());
+  awaitNews(reportingSwitch);
+  configureOff(true);
+  post();
+  awaitNews(reportingSwitch);
+  EXPECT_TRUE(reportingSwitch.isOff());
 }
 
 TEST_F(QVReportingSwitchTest, LooksAgainForWhatWasNotThere) {
