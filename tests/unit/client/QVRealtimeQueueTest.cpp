@@ -53,7 +53,7 @@ TEST_F(QVRealtimeRingTest, TakesAsManyAsItHasSlots) {
 
 TEST_F(QVRealtimeRingTest, HandsOverEveryMessageBetweenTwoThreads) {
   constexpr uint32_t kMessages = 20'000;
-  QVRealtimeRing ring(16, 64, nullptr);
+  QVRealtimeRing ring(256, 64, nullptr);
   std::thread producer([&] {
     for (uint32_t i = 0; i < kMessages;) {
       if (push(ring, i)) {
