@@ -140,8 +140,7 @@ def check_bash(project, program, comparison):
     text = project.read(BASH)
     for name, real in (("_qvctl_commands", {path: set(commands) for path, commands
                                             in program.commands.items() if commands}),
-                       ("_qvctl_options", {path: long_options(options) for path, options
-                                           in program.options.items()})):
+                       ("_qvctl_options", program.options)):
         table, line = bash_table(text, name)
         if table is None:
             project.report(BASH, 1, "tool", f"has no table {name}")

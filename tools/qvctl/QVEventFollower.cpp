@@ -21,6 +21,8 @@ void QVEventFollower::skip() {
     after_[static_cast<std::size_t>(kind)] = reader_.range(kind).last;
   }
   addSessionRows(QVEventRowReader::Sessions::running);
+  // Those above the running ones have stopped, and are left out, too.
+  openAfter_ = after_[static_cast<std::size_t>(Kind::start)];
 }
 
 void QVEventFollower::noticeOtherStore() {

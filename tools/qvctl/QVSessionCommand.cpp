@@ -25,11 +25,22 @@ QVToolStatus QVSessionCommand::run(const QVToolContext& context, const Options& 
 
 void QVSessionCommand::create(const QVToolContext& context, const Options& options) {
   options.setup.check();
-  const auto kept = QVSessionKeeper(context.places).start(options.setup, options.start);
-  if (context.output.isJSON()) {
-    context.output.json(QVDictionary{{"session", kept.reporterID}, {"keeper", kept.keeper}});
-  } else {
-    context.output.line(std::to_string(kept.reporterID));
+  const QVSessionKeeper keeper(context.places);
+  const auto kept = keeper.start(options.setup, options.start);
+  try {
+    if (context.output.isJSON()) {
+      context.output.json(QVDictionary{{"session", kept.reporterID}, {"keeper", kept.keeper}});
+    } else {
+      context.output.line(std::to_string(kept.reporterID));
+    }
+    context.output.flush();
+  } catch (const QVReaderGone&) {
+    keeper.ask(kept.reporterID, QVSessionKeeper::Request::destroy);
+    throw QVToolFailure(QVToolStatus::failed, "nobody reads which session was created");
+  } catch (const QVToolFailure&) {
+    // A session that nobody knows of would stay for good.
+    keeper.ask(kept.reporterID, QVSessionKeeper::Request::destroy);
+    throw;
   }
 }
 

@@ -18,6 +18,7 @@
 #include <sys/stat.h>
 #include <sys/time.h>
 #include <sys/wait.h>
+#include <unistd.h>
 
 namespace {
 
@@ -74,6 +75,15 @@ QVDescriptor makeSocket() {
 
 const sockaddr* generic(const sockaddr_un& address) {
   return reinterpret_cast<const sockaddr*>(&address);
+}
+
+// The caller's locks and pipes would otherwise last as long as the keeper.
+void closeInherited(int kept) {
+  const auto next = static_cast<unsigned>(kept) + 1;
+  if (kept > STDERR_FILENO + 1) {
+    ::close_range(STDERR_FILENO + 1, next - 2, 0);
+  }
+  ::close_range(std::max<unsigned>(next, STDERR_FILENO + 1), ~0U, 0);
 }
 
 // Nothing of the caller's is held: neither its terminal, nor its directory, nor its pipes.
@@ -134,6 +144,7 @@ QVSessionKeeper::Kept QVSessionKeeper::start(const QVSessionSetup& setup, bool s
 }
 
 void QVSessionKeeper::keep(const QVSessionSetup& setup, bool startSession, int report) const {
+  closeInherited(report);
   try {
     const QVDescriptor lost(::eventfd(0, EFD_CLOEXEC));
     QVServiceConnection service(places_, [&lost] { ::eventfd_write(lost.get(), 1); });

@@ -10,6 +10,7 @@
 #include <chrono>
 #include <cstdint>
 #include <filesystem>
+#include <functional>
 #include <optional>
 #include <system_error>
 
@@ -60,21 +61,35 @@ class Session {
 
   int64_t reporterID() const { return reporterID_; }
 
-  void end(const Outcome& outcome) {
-    QVClientPayload message;
-    message.set("command", program_)
-        .set("exit_status", outcome.exitStatus())
-        .set("wall_seconds", std::chrono::duration<double>(outcome.wall).count())
+  // `ownPeak`: of this process's memory when the command began.
+  void end(const Outcome& outcome, int64_t ownPeak) {
+    QVClientPayload message = endMessage(outcome.exitStatus());
+    message.set("wall_seconds", std::chrono::duration<double>(outcome.wall).count())
         .set("user_seconds", secondsOf(outcome.used.ru_utime))
-        .set("system_seconds", secondsOf(outcome.used.ru_stime))
-        .set("max_resident_kib", outcome.used.ru_maxrss);
+        .set("system_seconds", secondsOf(outcome.used.ru_stime));
+    // The kernel counts what this process had before the command took its place: a smaller peak is
+    // not to be told from it.
+    if (outcome.used.ru_maxrss > ownPeak) message.set("max_resident_kib", outcome.used.ru_maxrss);
     if (WIFSIGNALED(outcome.status)) message.set("signal", WTERMSIG(outcome.status));
+    finish(message);
+  }
+
+  // The command never began.
+  void endWithoutCommand(int status) { finish(endMessage(status)); }
+
+ private:
+  QVClientPayload endMessage(int exitStatus) const {
+    QVClientPayload message;
+    message.set("command", program_).set("exit_status", exitStatus);
+    return message;
+  }
+
+  void finish(const QVClientPayload& message) {
     send(message, QVClientMessageType::stop);
     QVServiceConnection::answer(service_.client().stopReportingSessionForIDAndWait(
         reporterID_, QVServiceConnection::kTimeLimit));
   }
 
- private:
   // Reporting that is switched off is no reason not to run the command.
   void send(const QVClientPayload& message, QVClientMessageType type) {
     const QVClientError error = service_.client().sendMessageAndWait(
@@ -149,6 +164,22 @@ Outcome await(pid_t pid, const QVSignals& signals, Clock::time_point began) {
   return outcome;
 }
 
+// Of this process, whose memory the command began with.
+int64_t ownPeakKiB() {
+  rusage used{};
+  ::getrusage(RUSAGE_SELF, &used);
+  return used.ru_maxrss;
+}
+
+// Reports the end: how the command ended is what counts, not whether the service hears of it.
+void report(const std::function<void()>& end) {
+  try {
+    end();
+  } catch (const QVToolFailure& failure) {
+    QVToolOutput::note(QVText("not reported: ", failure.what()));
+  }
+}
+
 }  // namespace
 
 QVToolStatus QVSessionRunCommand::run(const QVToolContext& context, const Options& options) {
@@ -160,8 +191,6 @@ QVToolStatus QVSessionRunCommand::run(const QVToolContext& context, const Option
     throw QVToolFailure(QVToolStatus::wrongUsage,
                         QVText("no category is called \"", options.category, "\""));
   }
-  // Before the client library has its thread.
-  const QVSignals signals{SIGINT, SIGTERM, SIGHUP, SIGQUIT, SIGUSR1, SIGUSR2};
   std::optional<Session> session;
   try {
     session.emplace(context, options);
@@ -169,19 +198,24 @@ QVToolStatus QVSessionRunCommand::run(const QVToolContext& context, const Option
     if (!options.anyway || failure.status() == QVToolStatus::wrongUsage) throw;
     QVToolOutput::note(failure.what());
   }
+  // Not before: whoever waits for a silent service shall be able to end it. The client library's
+  // thread takes no signals.
+  const QVSignals signals{SIGINT, SIGTERM, SIGHUP, SIGQUIT, SIGUSR1, SIGUSR2};
   const auto began = Clock::now();
   pid_t pid = -1;
   const auto reporterID = session ? std::optional(session->reporterID()) : std::nullopt;
   if (const int error = spawn(options.command, reporterID, signals, pid)) {
     QVToolOutput::note(options.command[0] + ": " + std::generic_category().message(error));
-    return static_cast<QVToolStatus>(error == ENOENT ? kNotFound : kCannotRun);
+    const int status = error == ENOENT ? kNotFound : kCannotRun;
+    report([&] {
+      if (session) session->endWithoutCommand(status);
+    });
+    return static_cast<QVToolStatus>(status);
   }
+  const int64_t ownPeak = ownPeakKiB();
   const Outcome outcome = await(pid, signals, began);
-  try {
-    if (session) session->end(outcome);
-  } catch (const QVToolFailure& failure) {
-    // The command has run; how it ended is what counts.
-    QVToolOutput::note(QVText("not reported: ", failure.what()));
-  }
+  report([&] {
+    if (session) session->end(outcome, ownPeak);
+  });
   return static_cast<QVToolStatus>(outcome.exitStatus());
 }

@@ -310,6 +310,19 @@ TEST_F(QVToolWatchTest, ShowsASessionThatWasStartedBeforeIt) {
   EXPECT_EQ(at(events[0], {"session"}), QVValue(7));
 }
 
+TEST_F(QVToolWatchTest, LeavesOutSessionsThatHaveStoppedBeforeIt) {
+  startSession(6, kTelephony);
+  expectStored("SELECT id FROM beacon_session", 1);
+  startSession(7, kTelephony);
+  client().stop(7);
+  expectStored("SELECT id FROM beacon_session WHERE flushed_at IS NOT NULL", 1);
+  const auto watch = terminal({"watch", "--kind", "stop", "--count", "1"});
+  ASSERT_TRUE(watch->await("CONTENTS"));
+  client().stop(6);
+  EXPECT_EQ(watch->wait(), 0);
+  EXPECT_THAT(watch->shown(), HasSubstr("    6  telephony"));
+}
+
 TEST_F(QVToolWatchTest, BeginsWithWhatHasComeBefore) {
   fillStore();
   const auto events =

@@ -2,6 +2,7 @@
 
 #include "tests/e2e/qvctl/QVToolTest.h"
 
+#include <array>
 #include <csignal>
 #include <filesystem>
 #include <fstream>
@@ -9,7 +10,10 @@
 
 #include <fcntl.h>
 #include <gmock/gmock.h>
+#include <poll.h>
+#include <sys/socket.h>
 #include <sys/stat.h>
+#include <sys/un.h>
 #include <unistd.h>
 
 namespace {
@@ -117,6 +121,33 @@ TEST_F(QVToolSessionTest, IsEndedWithItsKeeper) {
   expectLogged("destroying 7");
 }
 
+TEST_F(QVToolSessionTest, KeepsNoDescriptorOfTheCaller) {
+  service();
+  std::array<int, 2> ends{-1, -1};
+  ASSERT_EQ(::pipe2(ends.data(), O_CLOEXEC), 0);
+  QVSubprocess create({.arguments = command({"session", "create", "7"}),
+                       .environment = environment(),
+                       .standardOutputFile = root_.path() / "out",
+                       .inheritedDescriptor = ends[1]});
+  EXPECT_EQ(create.wait(std::chrono::seconds(60)), 0);
+  ::close(ends[1]);
+  // The other end is closed with the last copy.
+  pollfd entry{ends[0], POLLIN, 0};
+  EXPECT_EQ(::poll(&entry, 1, 10'000), 1);
+  EXPECT_EQ(run({"session", "destroy", "7"}), "");
+  ::close(ends[0]);
+}
+
+TEST_F(QVToolSessionTest, LeavesNoSessionThatNobodyKnowsOf) {
+  service();
+  QVSubprocess create({.arguments = command({"session", "create", "7"}),
+                       .environment = environment(),
+                       .standardOutputFile = "/dev/full",
+                       .standardErrorFile = root_.path() / "error"});
+  EXPECT_EQ(create.wait(std::chrono::seconds(60)), 1);
+  EXPECT_FALSE(client().isValid(7));
+}
+
 TEST_F(QVToolSessionTest, RefusesWhatTheServiceWouldTakeWithoutAWord) {
   startSession(7, kTelephony);
   EXPECT_THAT(qvctl({"session", "create", "7"}).error, HasSubstr("a session 7 already"));
@@ -163,9 +194,37 @@ TEST_F(QVToolSessionTest, ReportsTheLifeOfACommand) {
   EXPECT_GT(at(last[0], {"wall_seconds"}).doubleValue(), 0);
   EXPECT_EQ(at(last[0], {"user_seconds"}).kind(), QVValue::Kind::real);
   EXPECT_EQ(at(last[0], {"system_seconds"}).kind(), QVValue::Kind::real);
-  EXPECT_GT(at(last[0], {"max_resident_kib"}).integerValue(), 0);
   EXPECT_TRUE(at(last[0], {"signal"}).isAbsent());
   EXPECT_EQ(store().number("SELECT count(*) FROM beacon_session WHERE flushed_at IS NULL"), 0);
+}
+
+TEST_F(QVToolSessionTest, ReportsMemoryThatIsTheCommandsOwn) {
+  service();
+  EXPECT_EQ(run({"session", "run", "--id", "7", "--", "true"}), "");
+  EXPECT_EQ(run({"session", "run", "--id", "8", "--", "/usr/bin/python3", "-c",
+                 "bytearray(b'x' * (64 << 20))"}),
+            "");
+  endService();
+  // qvctl itself had more than "true" takes.
+  EXPECT_TRUE(at(parseLines(messages(7).back().substr(4))[0], {"max_resident_kib"}).isAbsent());
+  EXPECT_GT(at(parseLines(messages(8).back().substr(4))[0], {"max_resident_kib"}).integerValue(),
+            64 << 10);
+}
+
+TEST_F(QVToolSessionTest, CanBeEndedWhileTheServiceIsSilent) {
+  // Something that is connected to, and never answers.
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  root_.socket().string().copy(address.sun_path, sizeof address.sun_path - 1);
+  const int silent = ::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+  ASSERT_EQ(::bind(silent, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+  ASSERT_EQ(::listen(silent, 1), 0);
+  const auto ran = terminal({"session", "run", "--", "true"});
+  pollfd entry{silent, POLLIN, 0};
+  ASSERT_EQ(::poll(&entry, 1, 60'000), 1);
+  ran->signal(SIGTERM);
+  EXPECT_EQ(ran->wait(), -SIGTERM);
+  ::close(silent);
 }
 
 TEST_F(QVToolSessionTest, PassesSignalsOnToTheCommand) {
@@ -204,7 +263,10 @@ TEST_F(QVToolSessionTest, SaysThatThereIsNoSuchCommand) {
   service();
   EXPECT_EQ(qvctl({"session", "run", "--", "/nowhere/command"}).status, 127);
   std::ofstream(root_.path() / "file") << "no program";
-  EXPECT_EQ(qvctl({"session", "run", "--", root_.path() / "file"}).status, 126);
+  EXPECT_EQ(qvctl({"session", "run", "--id", "7", "--", root_.path() / "file"}).status, 126);
+  endService();
+  EXPECT_THAT(messages(7), ElementsAre(R"(1|1|{"command":"file"})",
+                                       R"(1|2|{"command":"file","exit_status":126})"));
 }
 
 TEST_F(QVToolSessionTest, RunsTheCommandAnyway) {
