@@ -26,6 +26,8 @@ constexpr std::size_t kLabelColumns = 12;
 constexpr std::size_t kSmallestColumns = 8;
 constexpr std::size_t kLargestColumns = 1000;
 constexpr std::size_t kLargestRows = 200;
+// Of applications and files in the list, on a narrow terminal.
+constexpr std::size_t kLeastOfNames = 11;
 
 std::string environment(const char* name) {
   // There is one thread.
@@ -117,9 +119,9 @@ void QVSummaryCommand::list(const QVToolContext& context) {
   QVTable table(context.output, {{"N", QVTable::Align::right},
                                  {"STOPPED"},
                                  {"SERVICE"},
-                                 {"APPLICATION"},
+                                 {.title = "APPLICATION", .least = kLeastOfNames},
                                  {"BYTES", QVTable::Align::right},
-                                 {"FILE"}});
+                                 {.title = "FILE", .least = kLeastOfNames}});
   for (std::size_t i = 0; i < files.size(); ++i) {
     const QVSummaryFile& file = files[i];
     table.add({std::to_string(i + 1), file.dateText(), file.service(), file.application(),

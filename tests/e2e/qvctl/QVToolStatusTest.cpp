@@ -130,6 +130,15 @@ TEST_F(QVToolStatusTest, ListsSessions) {
               AllOf(HasSubstr("SESSION"), HasSubstr("telephony"), HasSubstr("net.example.\\x1Bx")));
 }
 
+TEST_F(QVToolStatusTest, KeepsLongApplicationsFromPushingTheOwnerAway) {
+  startStoredSession(7, kTelephony, {{"HostApplicationDisplayID", std::string(200, 'a')}});
+  auto all = environment();
+  all["TERM"] = "dumb";
+  QVTerminal shown({.arguments = command({"sessions"}), .environment = all, .columns = 80});
+  ASSERT_EQ(shown.wait(), 0);
+  EXPECT_THAT(shown.shown(), AllOf(HasSubstr("aaa…"), HasSubstr("qv_tool_e2e")));
+}
+
 TEST_F(QVToolStatusTest, EndsTheService) {
   service();
   EXPECT_EQ(run({"kill"}), "");
