@@ -1,8 +1,9 @@
 #include "tools/qvctl/QVCommandLine.h"
 
 #include "tools/qvctl/QVCommandLineState.h"
+#include "tools/qvctl/QVToolOutput.h"
 
-#include <iostream>
+#include <sstream>
 
 QVCommandLine::QVCommandLine() : state_(std::make_unique<State>()) {
   CLI::App& app = state_->app;
@@ -25,8 +26,18 @@ bool QVCommandLine::parse(int argc, const char* const* argv, QVToolStatus& statu
     state_->app.parse(argc, argv);
     return true;
   } catch (const CLI::ParseError& error) {
-    const int result = state_->app.exit(error, std::cout, std::cerr);
-    status = result == 0 ? QVToolStatus::done : QVToolStatus::wrongUsage;
+    const bool isAnswer = error.get_exit_code() == 0;
+    status = isAnswer ? QVToolStatus::done : QVToolStatus::wrongUsage;
+    if (isAnswer) {
+      // The help, or the version: output like any other.
+      std::ostringstream text;
+      state_->app.exit(error, text, text);
+      QVToolOutput output(false);
+      output.raw(text.str());
+      output.flush();
+    } else {
+      QVToolOutput::note(State::complaint(state_->app, error) + " (--help says what there is)");
+    }
     return false;
   }
 }

@@ -38,7 +38,10 @@ void addFilter(CLI::App& command, QVEventFilter::Words& words) {
   command.add_option("--name", words.names, "Of these names, * and ? match anything")
       ->option_text("PATTERN")
       ->allow_extra_args(false);
-  command.add_option("--since", words.since, "From then on: a time, or how long ago")
+  command
+      .add_option_function<std::string>(
+          "--since", [&words](const std::string& word) { words.since = word; },
+          "From then on: a time, or how long ago")
       ->option_text("TIME");
 }
 
@@ -63,8 +66,10 @@ void QVCommandLine::addInspection() {
         state.add<QVEventsCommand>(state.app, "events", "What the store has kept");
     state.addJSON(*command);
     addFilter(*command, options->filter);
-    command->add_option("--until", options->filter.until, "Up to then")->option_text("TIME");
-    command->add_option("--last,-n", options->last, "The last N of them")->option_text("N");
+    const auto take = [to = options](const std::string& word) { to->filter.until = word; };
+    command->add_option_function<std::string>("--until", take, "Up to then")->option_text("TIME");
+    State::addNumber<std::size_t>(*command, "--last,-n", options->last, "The last N of them")
+        ->option_text("N");
     command->add_flag("--full", options->full, kFull);
   }
   {
@@ -72,7 +77,8 @@ void QVCommandLine::addInspection() {
         state.add<QVWatchCommand>(state.app, "watch", "What reaches the store, as it does");
     state.addJSON(*command);
     addFilter(*command, options->filter);
-    command->add_option("--count", options->count, "End after N of them")->option_text("N");
+    State::addNumber<std::size_t>(*command, "--count", options->count, "End after N of them", 1)
+        ->option_text("N");
     command->add_option("--for", options->duration, "End after so long")->option_text("DURATION");
     command->add_flag("--full", options->full, kFull);
   }
@@ -83,7 +89,8 @@ void QVCommandLine::addInspection() {
     command->add_option("--group", options->group, "Of this group alone")->option_text("NAME");
     command->add_option("--interval", options->interval, "Again and again, and what has grown")
         ->option_text("DURATION");
-    command->add_option("--count", options->count, "End after N readings")->option_text("N");
+    State::addNumber<std::size_t>(*command, "--count", options->count, "End after N readings", 1)
+        ->option_text("N");
   }
   addSummary();
 }
@@ -110,7 +117,11 @@ void QVCommandLine::addSummary() {
       ->option_text("PATTERN,...")
       ->delimiter(',')
       ->allow_extra_args(false);
-  plot->add_option("--width", options->width, "Columns of the whole")->option_text("N");
-  plot->add_option("--height", options->height, "Rows of each picture")->option_text("N");
+  State::addNumber<std::size_t>(*plot, "--width", options->width, "Columns of the whole", 1,
+                                QVSummaryCommand::kLargestColumns)
+      ->option_text("N");
+  State::addNumber<std::size_t>(*plot, "--height", options->height, "Rows of each picture", 1,
+                                QVSummaryCommand::kLargestRows)
+      ->option_text("N");
   plot->add_flag("--ascii", options->ascii, "Draw with ASCII alone");
 }

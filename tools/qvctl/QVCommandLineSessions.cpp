@@ -33,7 +33,13 @@ void QVCommandLine::addSessions() {
   const std::string footer = std::string(State::kEntries).append("\n\n").append(State::kFooter);
   const auto [send, sendOptions] =
       state.add<QVSendCommand>(state.app, "send", "Send one message to sessions");
-  send->add_option("--session", sendOptions->sessions, "To these sessions")
+  const auto takeSessions = [to = sendOptions](const std::vector<std::string>& words) {
+    for (const std::string& word : words) {
+      to->sessions.push_back(State::number<int64_t>("--session", word));
+    }
+  };
+  send->add_option_function<std::vector<std::string>>("--session", takeSessions,
+                                                      "To these sessions")
       ->option_text("ID,...")
       ->delimiter(',')
       ->allow_extra_args(false);
@@ -48,7 +54,7 @@ void QVCommandLine::addSessions() {
     const auto added = state.add<QVSessionCommand>(session, name, description);
     added.second->operation = operation;
     if (operation != Operation::create) {
-      added.first->add_option("id", added.second->reporterID, "The session")
+      State::addNumber<int64_t>(*added.first, "id", added.second->reporterID, "The session")
           ->option_text("ID")
           ->required();
     }
@@ -56,7 +62,8 @@ void QVCommandLine::addSessions() {
   };
   const auto [create, createOptions] = add(Operation::create, "create", "Create one, and keep it");
   state.addJSON(*create);
-  create->add_option("id", createOptions->setup.reporterID, "Its ID; else one is chosen")
+  State::addNumber<int64_t>(*create, "id", createOptions->setup.reporterID,
+                            "Its ID; else one is chosen")
       ->option_text("ID");
   addSetup(*create, createOptions->setup);
   create->add_flag("--start", createOptions->start, "Start it, too");
@@ -65,8 +72,12 @@ void QVCommandLine::addSessions() {
   {
     const auto [command, options] =
         state.add<QVSendCommand>(session, "send", "Send it one message");
-    const auto take = [to = options](int64_t id) { to->sessions = {id}; };
-    command->add_option_function<int64_t>("id", take, "The session")->option_text("ID")->required();
+    const auto take = [to = options](const std::string& id) {
+      to->sessions = {State::number<int64_t>("id", id)};
+    };
+    command->add_option_function<std::string>("id", take, "The session")
+        ->option_text("ID")
+        ->required();
     addMessage(*command, *options);
     command->footer(footer);
   }
@@ -75,7 +86,8 @@ void QVCommandLine::addSessions() {
 
   const auto [run, runOptions] =
       state.add<QVSessionRunCommand>(session, "run", "Run a command, and report its life");
-  run->add_option("--id", runOptions->setup.reporterID, "The session's ID")->option_text("ID");
+  State::addNumber<int64_t>(*run, "--id", runOptions->setup.reporterID, "The session's ID")
+      ->option_text("ID");
   addSetup(*run, runOptions->setup);
   run->add_option("--category", runOptions->category, "Of its messages (Session.Generic)")
       ->option_text("NAME");

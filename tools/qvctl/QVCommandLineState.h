@@ -2,9 +2,13 @@
 
 #include "tools/qvctl/QVCommandLine.h"
 
+#include <charconv>
+#include <cstdint>
+#include <limits>
 #include <memory>
 #include <string>
 #include <utility>
+#include <vector>
 
 #include <CLI/App.hpp>
 #include <CLI/Config.hpp>
@@ -31,6 +35,19 @@ struct QVCommandLine::State {
       "string; KEY:KIND=VALUE gives the kind, int, uint, double, bool, string or json:\n"
       "gain:double=1 name:string=5 device:json={\"a\":[1,2]}";
 
+  // What is wrong. Where a command is missing, the parser does not say what stands in its place.
+  static std::string complaint(const CLI::App& app, const CLI::ParseError& error) {
+    const std::vector<std::string> left = app.remaining(true);
+    const bool isMissing = error.get_exit_code() == static_cast<int>(CLI::ExitCodes::RequiredError);
+    if (!isMissing || left.empty()) return error.what();
+    const char* const what = left.front().starts_with('-') ? "option" : "command";
+    return std::string("no ")
+        .append(what)
+        .append(" is called \"")
+        .append(left.front())
+        .append("\"");
+  }
+
   // Options of every command.
   void addPlaces(CLI::App& command) {
     command.add_option("--socket", socket, "The service's socket")->option_text("PATH");
@@ -39,6 +56,36 @@ struct QVCommandLine::State {
   }
   void addJSON(CLI::App& command) {
     command.add_flag("--json", json, "Print JSON, one value a line");
+  }
+  // The whole of a word as a number within limits; the parser itself takes "-1" for a very large
+  // number of no sign, and cuts what is too large.
+  template <class Number>
+  static Number number(const std::string& name, const std::string& word,
+                       Number least = std::numeric_limits<Number>::min(),
+                       Number most = std::numeric_limits<Number>::max()) {
+    Number value{};
+    const char* const end = word.data() + word.size();
+    const auto [stop, problem] = std::from_chars(word.data(), end, value);
+    if (problem != std::errc() || stop != end || value < least || value > most) {
+      throw CLI::ValidationError(name, std::string("\"")
+                                           .append(word)
+                                           .append("\" is no number from ")
+                                           .append(std::to_string(least))
+                                           .append(" to ")
+                                           .append(std::to_string(most)));
+    }
+    return value;
+  }
+  // An option or argument that is such a number. What `target` is in is kept by the command.
+  template <class Number, class Target>
+  static CLI::Option* addNumber(CLI::App& command, const std::string& name, Target& target,
+                                const char* description,
+                                Number least = std::numeric_limits<Number>::min(),
+                                Number most = std::numeric_limits<Number>::max()) {
+    const auto take = [name, &target, least, most](const std::string& word) {
+      target = number<Number>(name, word, least, most);
+    };
+    return command.add_option_function<std::string>(name, take, description);
   }
   // A command that is carried out by Command::run(context, options).
   template <class Command>

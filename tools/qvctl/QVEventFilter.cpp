@@ -35,12 +35,12 @@ std::optional<int64_t> parseSession(std::string_view text) {
   return session;
 }
 
-std::optional<int64_t> parseTime(const std::string& text, int64_t now) {
-  if (text.empty()) return std::nullopt;
-  const auto time = QVParseTime(text, now);
+std::optional<int64_t> parseTime(const std::optional<std::string>& text, int64_t now) {
+  if (!text) return std::nullopt;
+  const auto time = QVParseTime(*text, now);
   if (!time) {
     throw QVToolFailure(QVToolStatus::wrongUsage,
-                        QVText("\"", text, "\" is no time and no duration"));
+                        QVText("\"", *text, "\" is no time and no duration"));
   }
   return time;
 }

@@ -23,8 +23,8 @@ class QVEventFilter {
     std::vector<std::string> categories = {};  // "Playback", "Session", "Session.Playback", numbers
     std::vector<std::string> types = {};
     std::vector<std::string> names = {};  // patterns with * and ?
-    std::string since = {};
-    std::string until = {};
+    std::optional<std::string> since = {};
+    std::optional<std::string> until = {};
   };
 
   QVEventFilter();

@@ -42,37 +42,55 @@ Style styleOf(Kind kind) {
 
 // On a narrower terminal little would be left for the contents: then lines have the time of day
 // alone, and each day begins with its date.
-constexpr std::size_t kWideColumns = 130;
+constexpr std::size_t kWideColumns = 140;
+// On a still narrower one columns are left out, unless lines are not cut: the service first, which
+// the session tells, then category and type.
+constexpr std::size_t kServiceColumns = 100;
+constexpr std::size_t kCategoryColumns = 72;
+// Names that are longer than their columns are cut, though not to less.
+constexpr std::size_t kLeastOfNames = 5;
 constexpr std::size_t kDateBytes = std::string_view("2026-11-21").size();
 
 bool isNarrow(const QVToolOutput& output) {
   return output.columns() > 0 && output.columns() < kWideColumns;
 }
 
-std::vector<QVTable::Column> columnsFor(const QVToolOutput& output) {
+bool hasRoom(const QVToolOutput& output, bool isInFull, std::size_t columns) {
+  return isInFull || !isNarrow(output) || output.columns() >= columns;
+}
+
+std::vector<QVTable::Column> columnsFor(const QVToolOutput& output, bool isInFull) {
   using Align = QVTable::Align;
   if (isNarrow(output)) {
-    return {{"TIME", Align::left, 15},
-            {"KIND", Align::left, 9},
-            {"SESSION", Align::right, 7},
-            {"SERVICE", Align::left, 9},
-            {"CATEGORY", Align::left, 10},
-            {"TYPE", Align::left, 5},
-            {"CONTENTS"}};
+    std::vector<QVTable::Column> columns{
+        {"TIME", Align::left, 15}, {"KIND", Align::left, 9}, {"SESSION", Align::right, 7}};
+    if (hasRoom(output, isInFull, kServiceColumns)) {
+      columns.push_back({"SERVICE", Align::left, 9, kLeastOfNames});
+    }
+    if (hasRoom(output, isInFull, kCategoryColumns)) {
+      columns.push_back({"CATEGORY", Align::left, 10, kLeastOfNames});
+      columns.push_back({"TYPE", Align::left, 5, kLeastOfNames});
+    }
+    columns.push_back({"CONTENTS"});
+    return columns;
   }
   return {{"TIME", Align::left, 26},
           {"KIND", Align::left, 9},
           {"SESSION", Align::right, 8},
-          {"SERVICE", Align::left, 13},
-          {"CATEGORY", Align::left, 16},
-          {"TYPE", Align::left, 8},
+          {"SERVICE", Align::left, 16, kLeastOfNames},
+          {"CATEGORY", Align::left, 20, kLeastOfNames},
+          {"TYPE", Align::left, 8, kLeastOfNames},
           {"CONTENTS"}};
 }
 
 }  // namespace
 
 QVEventPrinter::QVEventPrinter(QVToolOutput& output, bool isInFull)
-    : output_(output), isNarrow_(isNarrow(output)), table_(output, columnsFor(output)) {
+    : output_(output),
+      isNarrow_(isNarrow(output)),
+      hasService_(hasRoom(output, isInFull, kServiceColumns)),
+      hasCategory_(hasRoom(output, isInFull, kCategoryColumns)),
+      table_(output, columnsFor(output, isInFull)) {
   if (isInFull) table_.showInFull();
 }
 
@@ -92,11 +110,14 @@ void QVEventPrinter::show(const QVStoredEvent& event) {
     date_ = date;
     time.erase(0, kDateBytes + 1);
   }
-  table_.show({time,
-               {std::string(QVStoredEvent::kindName(event.kind)), styleOf(event.kind)},
-               event.session ? std::to_string(*event.session) : std::string(),
-               event.service,
-               event.categoryText(),
-               event.typeText(),
-               contentsOf(event)});
+  QVTable::Row row{time,
+                   {std::string(QVStoredEvent::kindName(event.kind)), styleOf(event.kind)},
+                   event.session ? std::to_string(*event.session) : std::string()};
+  if (hasService_) row.emplace_back(event.service);
+  if (hasCategory_) {
+    row.emplace_back(event.categoryText());
+    row.emplace_back(event.typeText());
+  }
+  row.emplace_back(contentsOf(event));
+  table_.show(std::move(row));
 }

@@ -20,6 +20,8 @@ class QVEventPrinter {
  private:
   QVToolOutput& output_;
   const bool isNarrow_;
+  const bool hasService_;
+  const bool hasCategory_;
   QVTable table_;
   std::string date_;  // of the last event, where lines have none
 };

@@ -18,7 +18,12 @@ void addSessionOfEnvironment(std::vector<int64_t>& sessions) {
   const std::string_view text = value == nullptr ? "" : value;
   int64_t session = 0;
   const auto [end, problem] = std::from_chars(text.data(), text.data() + text.size(), session);
-  if (problem == std::errc() && end == text.data() + text.size()) sessions.push_back(session);
+  if (text.empty()) return;
+  if (problem != std::errc() || end != text.data() + text.size()) {
+    throw QVToolFailure(QVToolStatus::wrongUsage, QVText(QVSendCommand::kSessionVariable, ": \"",
+                                                         text, "\" is no session's ID"));
+  }
+  sessions.push_back(session);
 }
 
 }  // namespace

@@ -22,6 +22,9 @@ constexpr int64_t kMaximumStarts = 100'000;
 // A process's start is known to the second only, in microseconds.
 constexpr int64_t kStartTolerance = 2'000'000;
 
+// Columns that are left of applications and owners on a narrow terminal, where there is room.
+constexpr std::size_t kLeastOfNames = 11;
+
 std::string applicationIn(std::string_view userInfo) {
   QVJSONFailure failure;
   const auto value = QVJSONFile::parse(userInfo, failure);
@@ -41,9 +44,11 @@ QVToolStatus QVSessionsCommand::run(const QVToolContext& context, const Options&
     context.output.json(QVArray::assemble(all));
     return QVToolStatus::done;
   }
-  QVTable table(
-      context.output,
-      {{"SESSION", QVTable::Align::right}, {"SERVICE"}, {"STARTED"}, {"APPLICATION"}, {"OWNER"}});
+  QVTable table(context.output, {{"SESSION", QVTable::Align::right},
+                                 {"SERVICE"},
+                                 {"STARTED"},
+                                 {.title = "APPLICATION", .least = kLeastOfNames},
+                                 {.title = "OWNER", .least = kLeastOfNames}});
   for (const Session& session : sessions) {
     table.add({std::to_string(session.reporterID),
                session.serviceType ? QVServiceTypeText(*session.serviceType) : "-",

@@ -9,7 +9,7 @@
 #include <string>
 #include <vector>
 
-// qvctl sessions: all reporters that the service knows, with type and owner.
+// qvctl sessions: all reporters that the service knows, with type, and owner where it is known.
 //
 // The service tells IDs and types alone. When a session was started, and the application that it
 // reports for, is what the store says of its latest start. The owning process is known where all

@@ -17,6 +17,8 @@ namespace {
 
 using Style = QVToolOutput::Style;
 
+constexpr std::size_t kTitleColumns = 11;
+
 std::string sizeText(int64_t bytes) {
   constexpr double kMebibyte = 1024.0 * 1024.0;
   char text[48];
@@ -132,7 +134,7 @@ QVValue QVStatusCommand::json(const Findings& findings) const {
 
 void QVStatusCommand::showLine(const char* title, const std::string& text, Style style) const {
   std::string line(title);
-  line.resize(11, ' ');
+  line.resize(kTitleColumns, ' ');
   context_.output.line(context_.output.painted(Style::title, line) +
                        context_.output.painted(style, text));
 }
@@ -156,6 +158,8 @@ void QVStatusCommand::show(const Findings& findings) const {
       text.append(name == names.begin()->first ? ": " : ", ").append(QVDisplayText(name));
       if (count > 1) text.append(QVText(" (", count, ")"));
     }
+    const std::size_t columns = context_.output.columns();
+    if (columns > kTitleColumns) text = QVClippedText(text, columns - kTitleColumns);
     showLine("clients", text);
   }
   if (findings.sessions) showLine("sessions", std::to_string(*findings.sessions));

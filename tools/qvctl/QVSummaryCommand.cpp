@@ -8,6 +8,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <csignal>
+#include <cstdio>
 #include <cstdlib>
 #include <string_view>
 #include <utility>
@@ -22,10 +23,10 @@ using Style = QVToolOutput::Style;
 // Where there is no terminal to ask.
 constexpr std::size_t kUsualColumns = 80;
 // Of the numbers beside a picture.
-constexpr std::size_t kLabelColumns = 12;
+constexpr std::size_t kLabelColumns = 13;
 constexpr std::size_t kSmallestColumns = 8;
-constexpr std::size_t kLargestColumns = 1000;
-constexpr std::size_t kLargestRows = 200;
+// Of applications and files in the list, on a narrow terminal.
+constexpr std::size_t kLeastOfNames = 11;
 
 std::string environment(const char* name) {
   // There is one thread.
@@ -45,6 +46,13 @@ bool isWanted(const std::vector<std::string>& patterns, const std::string& key) 
   return patterns.empty() || std::ranges::any_of(patterns, [&key](const std::string& pattern) {
            return ::fnmatch(pattern.c_str(), key.c_str(), 0) == 0;
          });
+}
+
+// Six digits, which is no more than a label has room for: "-1.79769e+308".
+std::string edgeText(double number) {
+  char text[32];
+  std::snprintf(text, sizeof text, "%.6g", number);
+  return text;
 }
 
 std::string label(std::string text) {
@@ -67,8 +75,8 @@ void drawColumn(QVToolOutput& output, const std::string& key, const QVSummaryFil
   for (std::size_t i = 0; i < rows.size(); ++i) {
     std::string edge;
     const bool isLevel = lowest == highest;
-    if (isLevel ? i == rows.size() / 2 : i == 0) edge = QVText(highest);
-    if (!isLevel && i + 1 == rows.size()) edge = QVText(lowest);
+    if (isLevel ? i == rows.size() / 2 : i == 0) edge = edgeText(highest);
+    if (!isLevel && i + 1 == rows.size()) edge = edgeText(lowest);
     std::string line = label(edge) + rows[i];
     line.erase(line.find_last_not_of(' ') + 1);
     output.line(line);
@@ -117,9 +125,9 @@ void QVSummaryCommand::list(const QVToolContext& context) {
   QVTable table(context.output, {{"N", QVTable::Align::right},
                                  {"STOPPED"},
                                  {"SERVICE"},
-                                 {"APPLICATION"},
+                                 {.title = "APPLICATION", .least = kLeastOfNames},
                                  {"BYTES", QVTable::Align::right},
-                                 {"FILE"}});
+                                 {.title = "FILE", .least = kLeastOfNames}});
   for (std::size_t i = 0; i < files.size(); ++i) {
     const QVSummaryFile& file = files[i];
     table.add({std::to_string(i + 1), file.dateText(), file.service(), file.application(),

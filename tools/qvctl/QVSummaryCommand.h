@@ -13,6 +13,10 @@
 // Threads: one.
 class QVSummaryCommand {
  public:
+  // Of a plot.
+  static constexpr std::size_t kLargestColumns = 1000;
+  static constexpr std::size_t kLargestRows = 200;
+
   enum class Operation { list, show, open, plot };
   struct Options {
     Operation operation = Operation::list;

@@ -87,9 +87,12 @@ bool takeDate(std::string_view& text, tm& parts) {
       !takeNumber(text, 2, parts.tm_mday)) {
     return false;
   }
+  const std::chrono::year_month_day date{std::chrono::year(parts.tm_year),
+                                         std::chrono::month(static_cast<unsigned>(parts.tm_mon)),
+                                         std::chrono::day(static_cast<unsigned>(parts.tm_mday))};
   parts.tm_year -= 1900;
   parts.tm_mon -= 1;
-  return parts.tm_mon >= 0 && parts.tm_mon < 12 && parts.tm_mday >= 1 && parts.tm_mday <= 31;
+  return date.ok();
 }
 
 tm midnight(int64_t now, int daysBefore) {

@@ -171,6 +171,7 @@ TEST_F(QVToolEventsTest, AreShownWithTheTimeOfDayOnANarrowTerminal) {
        .environment = all,
        .columns = 80});
   ASSERT_EQ(shown.wait(), 0);
+  EXPECT_THAT(shown.shown(), Not(HasSubstr("SERVICE")));
   EXPECT_THAT(shown.shown(), MatchesRegex("TIME[^\n]*\n20[0-9-]+\r\n"
                                           "[0-9:]+\\.[0-9]+  message[^\n]*\n"
                                           "[0-9:]+\\.[0-9]+  message[^\n]*\n"));

@@ -104,9 +104,9 @@ TEST_F(QVToolFilesTest, DrawsNumbersOverMessages) {
   const std::string ascii =
       show({"summary", "plot", "--ascii", "--height", "3", "--width", "25", "--key", "fra*"},
            {{"NO_COLOR", "1"}});
-  EXPECT_THAT(ascii, HasSubstr("        2400 |       **\r\n"
-                               "             |   ****\r\n"
-                               "         480 |***\r\n"));
+  EXPECT_THAT(ascii, HasSubstr("         2400 |      **\r\n"
+                               "              |   ***\r\n"
+                               "          480 |***\r\n"));
   EXPECT_THAT(show({"summary", "plot"}, {{"LC_ALL", "C"}}), Not(HasSubstr("\xE2\xA0")));
   EXPECT_EQ(qvctl({"summary", "plot", "--key", "route"}).status, 1);
 }

@@ -18,6 +18,7 @@ using ::testing::HasSubstr;
 using ::testing::IsEmpty;
 using ::testing::Not;
 using ::testing::SizeIs;
+using ::testing::StartsWith;
 
 constexpr uint16_t kTelephony = 2;
 
@@ -128,6 +129,15 @@ TEST_F(QVToolStatusTest, ListsSessions) {
   EXPECT_EQ(at(started, {"owner", "pid"}), QVValue(::getpid()));
   EXPECT_THAT(show({"sessions"}),
               AllOf(HasSubstr("SESSION"), HasSubstr("telephony"), HasSubstr("net.example.\\x1Bx")));
+}
+
+TEST_F(QVToolStatusTest, KeepsLongApplicationsFromPushingTheOwnerAway) {
+  startStoredSession(7, kTelephony, {{"HostApplicationDisplayID", std::string(200, 'a')}});
+  auto all = environment();
+  all["TERM"] = "dumb";
+  QVTerminal shown({.arguments = command({"sessions"}), .environment = all, .columns = 80});
+  ASSERT_EQ(shown.wait(), 0);
+  EXPECT_THAT(shown.shown(), AllOf(HasSubstr("aaa…"), HasSubstr("qv_tool_e2e")));
 }
 
 TEST_F(QVToolStatusTest, EndsTheService) {
@@ -253,6 +263,41 @@ TEST_F(QVToolStatusTest, SaysWhatIsWrongWithACommandLine) {
     EXPECT_EQ(output.status, 2) << testing::PrintToString(arguments) << output.error;
     EXPECT_THAT(output.error, Not(IsEmpty()));
     EXPECT_EQ(output.out, "");
+  }
+}
+
+TEST_F(QVToolStatusTest, NamesTheWordThatIsWrong) {
+  const std::vector<std::pair<Arguments, std::string>> wrong{
+      {{"nonsense"}, "\"nonsense\""},
+      {{"reporting", "maybe"}, "\"maybe\""},
+      {{"events", "--last", "-5"}, "\"-5\""},
+      {{"events", "--since", ""}, "\"\" is no time"},
+      {{"events", "--since", "2026-02-30"}, "\"2026-02-30\""},
+      {{"watch", "--count", "-1"}, "\"-1\""},
+      {{"channels", "--interval", "1s", "--count", "-1"}, "\"-1\""},
+      {{"summary", "plot", "--width", "-5"}, "\"-5\""},
+      {{"summary", "plot", "--height", "0"}, "\"0\""},
+      {{"session", "create", "99999999999999999999"}, "\"99999999999999999999\""},
+      {{"session", "destroy", "7x"}, "\"7x\""},
+      {{"send", "--session", "", "a=1"}, "\"\""}};
+  for (const auto& [arguments, word] : wrong) {
+    const Output output = qvctl(arguments);
+    EXPECT_EQ(output.status, 2) << testing::PrintToString(arguments) << output.error;
+    EXPECT_THAT(output.error, AllOf(StartsWith("qvctl: "), HasSubstr(word)));
+  }
+  const Output output = qvctl({"send", "a=1"}, {"env", "QUIETVOX_SESSION=abc"});
+  EXPECT_EQ(output.status, 2);
+  EXPECT_THAT(output.error, HasSubstr("\"abc\""));
+}
+
+TEST_F(QVToolStatusTest, SaysThatItsHelpCouldNotBeWritten) {
+  for (const char* option : {"--help", "--version"}) {
+    const std::string tool = QVDaemonProcess::program("qvctl").string();
+    QVSubprocess process({.arguments = {tool, option},
+                          .environment = environment(),
+                          .standardOutputFile = "/dev/full",
+                          .standardErrorFile = root_.path() / "error"});
+    EXPECT_EQ(process.wait(std::chrono::seconds(60)), 1) << option;
   }
 }
 

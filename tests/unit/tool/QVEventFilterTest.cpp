@@ -100,7 +100,8 @@ TEST(QVEventFilterTest, RefusesWordsThatAreNone) {
   for (const Words& words :
        {Words{.kinds = {"nothing"}}, Words{.sessions = {"x"}}, Words{.sessions = {""}},
         Words{.services = {"nothing"}}, Words{.categories = {"nothing"}},
-        Words{.types = {"nothing"}}, Words{.since = "nothing"}, Words{.until = "nothing"}}) {
+        Words{.types = {"nothing"}}, Words{.since = "nothing"}, Words{.until = "nothing"},
+        Words{.since = ""}, Words{.until = ""}}) {
     try {
       QVEventFilter(words, kNow);
       ADD_FAILURE() << "taken";

@@ -58,8 +58,9 @@ TEST_F(QVTimeTextTest, ReadsTimes) {
 }
 
 TEST_F(QVTimeTextTest, RefusesWhatIsNoTime) {
-  for (const char* text : {"", "tomorrow", "2026-13-01", "2026-1-1", "2026-11-21 25:00", "@", "@x",
-                           "2026-11-21Tx", "08:61", "2026-11-21 08:20Zz", "08:20:01."}) {
+  for (const char* text :
+       {"", "tomorrow", "2026-13-01", "2026-1-1", "2026-02-30", "2026-02-29", "2026-11-21 25:00",
+        "@", "@x", "2026-11-21Tx", "08:61", "2026-11-21 08:20Zz", "08:20:01."}) {
     EXPECT_FALSE(QVParseTime(text, kNow)) << text;
   }
 }
