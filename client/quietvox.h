@@ -37,8 +37,9 @@ extern "C" {
 QV_CLIENT_API const char* quietvox_error_text(int error);
 
 // Opens a reporter, with the defaults where `options` is null. Connects to nothing yet. Answers
-// INVALID_ARGUMENT for options out of their limits, without a size or with flags that there are not;
-// CANNOT_CONNECT without descriptors or threads, OUT_OF_MEMORY. After a fork, only the parent may use it.
+// INVALID_ARGUMENT for options out of their limits, without a size or with flags that there are
+// not; CANNOT_CONNECT without descriptors or threads, OUT_OF_MEMORY. After a fork, only the parent
+// may use it.
 QV_CLIENT_API int quietvox_reporter_open(const QuietVoxReporterOptions* options,
                                          QuietVoxReporter** reporter);
 // Waits up to `endTimeLimit` for what is still to be sent, and frees the reporter. Its sessions

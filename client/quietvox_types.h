@@ -32,7 +32,8 @@ typedef struct QuietVoxRealtimeQueue QuietVoxRealtimeQueue;
 
 // What became of a reporter's messages. The caller sets `size` to the size of the struct as it
 // knows it; only so much is filled in. Messages that are neither sent nor dropped are queued, under
-// way (at most 256, or 256 KiB), or in real-time queues; of these, the first alone are counted here.
+// way (at most 256, or 256 KiB), or in real-time queues; of these, the first alone are counted
+// here.
 typedef struct QuietVoxCounters {
   size_t size;
   uint64_t sent;                   // the service has taken them

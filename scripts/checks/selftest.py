@@ -228,11 +228,11 @@ TOOL_BASH = """declare -gA _qvctl_commands=(
   ['tool group']='list'
 )
 declare -gA _qvctl_options=(
-  ['tool']='--help --version'
-  ['tool look']='--help
-    --last'
-  ['tool group']='--help'
-  ['tool group list']='--help'
+  ['tool']='-h --help --version'
+  ['tool look']='-h --help
+    -n --last'
+  ['tool group']='-h --help'
+  ['tool group list']='-h --help'
 )
 """
 TOOL_ZSH = """_qvctl_places=('(- *)--help[text]')
@@ -290,9 +290,9 @@ TOOL_FAULTS = [
     fault("tool", "tool", f"{MAN}:15", MAN, TOOL_MAN.replace("Fl n , ", "")),
     fault("tool", "tool", f"{MAN}:7", MAN, TOOL_MAN.replace(".It Fl -version\nVersion.\n", "")),
     fault("tool", "tool", f"{MAN}:1", MAN, TOOL_MAN + ".Ss gone\nText.\n"),
-    fault("tool", "tool", f"{BASH}:5", BASH, TOOL_BASH.replace("'--help --version'", "'--help --gone --version'")),
+    fault("tool", "tool", f"{BASH}:5", BASH, TOOL_BASH.replace("--help --version", "--help --gone --version")),
     fault("tool", "tool", f"{BASH}:1", BASH, TOOL_BASH.replace("'look group'", "'look group gone'")),
-    fault("tool", "tool", f"{BASH}:5", BASH, TOOL_BASH.replace("  ['tool group']='--help'\n", "")),
+    fault("tool", "tool", f"{BASH}:5", BASH, TOOL_BASH.replace("  ['tool group']='-h --help'\n", "")),
     fault("tool", "tool", f"{ZSH}:2", ZSH, TOOL_ZSH.replace("number:'", "number:' '--gone[text]'")),
     fault("tool", "tool", f"{ZSH}:1", ZSH, TOOL_ZSH.replace("_qvctl_look()", "_qvctl_gone()")),
     fault("tool", "tool", f"{ZSH}:5", ZSH, TOOL_ZSH.replace("'list:text'", "'list:text'\n    'gone:text'")),
