@@ -64,6 +64,11 @@ void enter(char* at, uint32_t number) noexcept {
 // A dictionary's length, and the padding in front of its entries.
 constexpr std::size_t kBeforeEntries = 8;
 
+// Of a call that has a payload.
+std::size_t entryBytes(const QVClientRequest& request) noexcept {
+  return request.payload == nullptr ? 0 : request.payload->entries().size();
+}
+
 std::size_t bodyBytes(const QVClientRequest& request) noexcept {
   switch (request.operation) {
     case QVClientOperation::getAllReporters:
@@ -72,9 +77,9 @@ std::size_t bodyBytes(const QVClientRequest& request) noexcept {
     case QVClientOperation::setServiceType:
       return 16;
     case QVClientOperation::setConfiguration:
-      return QVBusAlign(kBeforeEntries + request.payload->entries().size(), 8) + 8;
+      return QVBusAlign(kBeforeEntries + entryBytes(request), 8) + 8;
     case QVClientOperation::sendMessage: {
-      const std::size_t numbers = QVBusAlign(kBeforeEntries + request.payload->entries().size(), 4);
+      const std::size_t numbers = QVBusAlign(kBeforeEntries + entryBytes(request), 4);
       const auto reporterIDs = request.targets.reporterIDs();
       // Category, type, everySession and the list's length take 4 bytes each with their padding.
       return QVBusAlign(numbers + 16, 8) + reporterIDs.size() * sizeof(int64_t);

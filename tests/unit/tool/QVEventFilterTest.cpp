@@ -103,7 +103,7 @@ TEST(QVEventFilterTest, RefusesWordsThatAreNone) {
         Words{.types = {"nothing"}}, Words{.since = "nothing"}, Words{.until = "nothing"},
         Words{.since = ""}, Words{.until = ""}}) {
     try {
-      QVEventFilter(words, kNow);
+      [[maybe_unused]] const QVEventFilter filter(words, kNow);
       ADD_FAILURE() << "taken";
     } catch (const QVToolFailure& failure) {
       EXPECT_EQ(failure.status(), QVToolStatus::wrongUsage);
