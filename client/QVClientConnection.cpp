@@ -1,7 +1,6 @@
 #include "client/QVClientConnection.h"
 
 #include "client/QVClientSocket.h"
-#include "client/QVClientThread.h"
 #include "platform/linux/bus/QVBusAuthClient.h"
 #include "platform/linux/bus/QVBusMessage.h"
 
@@ -64,7 +63,7 @@ QVClientError QVClientConnection::start() {
   if (send) sendPending();
   if (!hasOwnThread()) return {};
 
-  return QVClientStartThread(thread_, [self = shared_from_this()] { self->runOwnThread(); });
+  return thread_.start([self = shared_from_this()] { self->runOwnThread(); });
 }
 
 void QVClientConnection::close() {

@@ -6,6 +6,7 @@
 #include "client/QVClientOptions.h"
 #include "client/QVClientPoller.h"
 #include "client/QVClientRequest.h"
+#include "client/QVClientThread.h"
 #include "platform/linux/QVDescriptor.h"
 #include "platform/linux/QVThreadAnnotations.h"
 
@@ -110,7 +111,7 @@ class QVClientConnection : public std::enable_shared_from_this<QVClientConnectio
   const QVClientOptions options_;
   const QVDescriptor socket_;
   QVClientPoller poller_;
-  std::thread thread_;                             // set by start()
+  QVClientThread thread_;                          // started by start()
   std::atomic<std::thread::id> callbackThread_{};  // while it may run replies
   QVClientInbox inbox_;                            // used by the holder of reading_
   std::string sendingBuffer_;  // used by whoever made sending_ underWay, as is sent_:

@@ -3,6 +3,7 @@
 #include "client/QVRealtimeRing.h"
 #include "client/QVReporterCore.h"
 
+#include <string_view>
 #include <utility>
 
 QVRealtimeQueue::QVRealtimeQueue(std::shared_ptr<QVReporterCore> core,
@@ -16,27 +17,35 @@ QVRealtimeQueue::~QVRealtimeQueue() {
 }
 
 QVClientPayload* QVRealtimeQueue::begin() noexcept {
-  begun_ = false;
+  detach();
   if (ring_->isClosed()) return drop(QVDropReason::connectionLost);
   if (core_->isReportingOff()) return drop(QVDropReason::disabled);
   const std::span<char> slot = ring_->nextSlot();
   if (slot.empty()) return drop(QVDropReason::queueFull);
   payload_.use(slot);
-  begun_ = true;
+  slot_ = slot.data();
   return &payload_;
 }
 
 bool QVRealtimeQueue::commit(QVClientCategory category, QVClientMessageType type) noexcept {
-  if (!std::exchange(begun_, false)) return false;
-  QVDropReason reason = QVDropReason::invalid;
-  if (payload_.ok()) {
-    if (ring_->push(payload_.entries().size(), category.word, static_cast<uint16_t>(type))) {
-      return true;
-    }
-    reason = QVDropReason::connectionLost;
+  if (slot_ == nullptr) return false;
+  const std::string_view entries = payload_.entries();
+  // Another payload may have been moved into it, whose entries lie elsewhere.
+  const bool isInOrder = payload_.ok() && entries.data() == slot_;
+  detach();
+  if (!isInOrder) {
+    drop(QVDropReason::invalid);
+    return false;
   }
-  drop(reason);
+  if (ring_->push(entries.size(), category.word, static_cast<uint16_t>(type))) return true;
+  drop(QVDropReason::connectionLost);
   return false;
+}
+
+// The slot is written no more, whoever still holds the payload.
+void QVRealtimeQueue::detach() noexcept {
+  payload_.use({});
+  slot_ = nullptr;
 }
 
 bool QVRealtimeQueue::isClosed() const noexcept {

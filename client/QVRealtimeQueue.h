@@ -44,8 +44,9 @@ class QV_CLIENT_API QVRealtimeQueue {
   // is off, or the queue is full or closed; that is counted. Beginning again starts the message
   // anew.
   QVClientPayload* begin() noexcept;
-  // Hands over what begin() gave. False where it is not in order or did not fit, or the queue was
-  // closed meanwhile, which is counted, or where nothing was begun.
+  // Hands over what begin() gave, which from then on takes nothing in. False where it is not in
+  // order or did not fit, another payload was moved into it, or the queue was closed meanwhile,
+  // which is counted, or where nothing was begun.
   bool commit(QVClientCategory category, QVClientMessageType type) noexcept;
   // Is its session destroyed, or its reporter gone? Real-time safe.
   bool isClosed() const noexcept;
@@ -54,10 +55,11 @@ class QV_CLIENT_API QVRealtimeQueue {
   friend class QVReporterSession;
   QVRealtimeQueue(std::shared_ptr<QVReporterCore> core, std::shared_ptr<QVRealtimeRing> ring);
 
+  void detach() noexcept;
   std::nullptr_t drop(QVDropReason reason) noexcept;
 
   const std::shared_ptr<QVReporterCore> core_;
   const std::shared_ptr<QVRealtimeRing> ring_;
   QVClientPayload payload_;
-  bool begun_ = false;
+  const char* slot_ = nullptr;  // where the payload is written, while one is begun
 };

@@ -24,6 +24,13 @@ struct QVReporterSessionState;
 // Used by QVRealtimeQueue (producer) and the reporter's thread (consumer). Threads: as marked.
 // Ownership: shared by both.
 class QVRealtimeRing {
+ private:
+  struct Slot {
+    std::size_t bytes = 0;
+    uint32_t category = 0;
+    uint16_t type = 0;
+  };
+
  public:
   struct Message {
     std::span<char> payload;
@@ -31,6 +38,10 @@ class QVRealtimeRing {
     uint16_t type = 0;
   };
 
+  // Bytes of memory that a ring takes, but for its members.
+  static constexpr std::size_t bytesOf(std::size_t slots, std::size_t slotBytes) {
+    return slots * (slotBytes + sizeof(Slot));
+  }
   // `slots` a power of 2. The session is the consumer's alone.
   QVRealtimeRing(std::size_t slots, std::size_t slotBytes, QVReporterSessionState* owner);
 
@@ -56,8 +67,7 @@ class QVRealtimeRing {
   // How many messages were ever pushed, and popped.
   uint64_t written() const noexcept { return written_.load(std::memory_order_acquire) & ~kClosed; }
   uint64_t taken() const noexcept { return taken_.load(std::memory_order_acquire); }
-  // Of payloads, as it was made for.
-  std::size_t bytes() const noexcept { return (mask_ + 1) * slotBytes_; }
+  std::size_t bytes() const noexcept { return bytesOf(mask_ + 1, slotBytes_); }
 
   // The consumer's, as the next two; null once the session is destroyed.
   QVReporterSessionState* session;
@@ -67,11 +77,6 @@ class QVRealtimeRing {
   uint64_t writtenBeforeFlush = 0;
 
  private:
-  struct Slot {
-    std::size_t bytes = 0;
-    uint32_t category = 0;
-    uint16_t type = 0;
-  };
   static constexpr std::size_t kCacheLine = 64;
   static constexpr uint64_t kClosed = uint64_t{1} << 63;
 

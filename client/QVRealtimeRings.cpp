@@ -3,15 +3,25 @@
 #include <algorithm>
 #include <utility>
 
+QVClientError::Code QVRealtimeRings::admitLocked(std::size_t bytes) const {
+  if (isClosed_) return QVClientError::Code::closed;
+  for (const auto& ring : rings_) bytes += ring->bytes();
+  const bool fits = rings_.size() < kMaximum && bytes <= kMaximumBytes;
+  return fits ? QVClientError::Code::none : QVClientError::Code::queueFull;
+}
+
+QVClientError::Code QVRealtimeRings::admit(std::size_t bytes) {
+  removeOver();
+  QVMutexLock lock(mutex_);
+  return admitLocked(bytes);
+}
+
 QVClientError::Code QVRealtimeRings::add(std::shared_ptr<QVRealtimeRing> ring) {
   removeOver();
   QVMutexLock lock(mutex_);
-  if (isClosed_) return QVClientError::Code::closed;
-  std::size_t bytes = ring->bytes();
-  for (const auto& other : rings_) bytes += other->bytes();
-  if (rings_.size() >= kMaximum || bytes > kMaximumBytes) return QVClientError::Code::queueFull;
-  rings_.push_back(std::move(ring));
-  return QVClientError::Code::none;
+  const QVClientError::Code code = admitLocked(ring->bytes());
+  if (code == QVClientError::Code::none) rings_.push_back(std::move(ring));
+  return code;
 }
 
 void QVRealtimeRings::remove(const QVRealtimeRing& ring) {

@@ -17,12 +17,15 @@ class QVRealtimeRings {
  public:
   using List = std::vector<std::shared_ptr<QVRealtimeRing>>;
 
-  // How many there may be, and bytes of their payloads in all: a program that makes a queue for
-  // each track while there is no service must not take all memory.
+  // How many there may be, and bytes of theirs in all: a program that makes a queue for each track
+  // while there is no service must not take all memory.
   static constexpr std::size_t kMaximum = 1'024;
   static constexpr std::size_t kMaximumBytes = std::size_t{128} << 20;
 
-  // Answers queueFull beyond the bounds, closed once they are closed.
+  // May one more of so many bytes be added? Answers none, queueFull beyond the bounds, or closed
+  // once they are closed.
+  QVClientError::Code admit(std::size_t bytes);
+  // Answers the same, and takes it in where that is none.
   QVClientError::Code add(std::shared_ptr<QVRealtimeRing> ring);
   void remove(const QVRealtimeRing& ring);
   // Lets go of those that are over.
@@ -35,6 +38,8 @@ class QVRealtimeRings {
 
  private:
   QVMutex mutex_;
+  QVClientError::Code admitLocked(std::size_t bytes) const QV_REQUIRES(mutex_);
+
   List rings_ QV_GUARDED_BY(mutex_);
   bool isClosed_ QV_GUARDED_BY(mutex_) = false;
 };

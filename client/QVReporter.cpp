@@ -1,6 +1,5 @@
 #include "client/QVReporter.h"
 
-#include "client/QVClientThread.h"
 #include "client/QVReporterCore.h"
 #include "client/QVReporterWorker.h"
 
@@ -48,7 +47,7 @@ QVClientResult<std::unique_ptr<QVReporter>> QVReporter::open(QVReporterOptions o
       return QVClientError(Code::cannotConnect, "no descriptors left for the reporter");
     }
     std::unique_ptr<QVReporter> reporter(new QVReporter(core));
-    const QVClientError error = QVClientStartThread(core->thread, [core] {
+    const QVClientError error = core->thread.start([core] {
       core->threadID = std::this_thread::get_id();
       QVReporterWorker(*core).run();
       // The system may give the same ID to a thread of the program's.

@@ -3,6 +3,7 @@
 #include "client/QVClientBatch.h"
 #include "client/QVReporterConfiguration.h"
 
+#include <algorithm>
 #include <utility>
 
 namespace {
@@ -18,6 +19,10 @@ constexpr std::size_t kRestoredAtOnce = 256;
 // Bytes of one session's configuration that are kept for its restoration. Beyond it only the last
 // addition is.
 constexpr std::size_t kMaximumConfigurationBytes = std::size_t{64} << 10;
+
+// What the queue and each real-time queue get done in a turn: none of them, however full, keeps the
+// others from what room there is.
+constexpr std::size_t kTurn = 32;
 
 using Kind = QVReporterRecord::Kind;
 
@@ -87,10 +92,29 @@ void QVReporterCalls::work() {
   std::optional<QVClientBatch> batch;
   if (client_ != nullptr) batch.emplace(*client_);
   if (!isRestored_) isRestored_ = restore();
-  if (isRestored_) {
-    for (QVReporterRecord record; core_.queue.front(record) && handle(record);) core_.queue.pop();
+  const QVRealtimeRings::List rings = core_.rings.all();
+  const std::size_t takers = 1 + rings.size();
+  // Until all of them in a row had nothing to do, or no room. The next time goes on with whose turn
+  // it then is.
+  for (std::size_t idle = 0; idle < takers; ++turn_) {
+    turn_ %= takers;
+    const std::size_t done = turn_ == 0 ? workQueue() : workRing(*rings[turn_ - 1]);
+    idle = done == 0 ? idle + 1 : 0;
   }
-  drainAll();
+  polls_ = std::ranges::any_of(rings, [this](const auto& ring) {
+    return isSent(*ring) && ring->session->isStarted && !ring->isOver();
+  });
+  core_.rings.removeOver();
+}
+
+std::size_t QVReporterCalls::workQueue() {
+  if (!isRestored_) return 0;
+  std::size_t done = 0;
+  for (QVReporterRecord record; done < kTurn && core_.queue.front(record) && handle(record);
+       ++done) {
+    core_.queue.pop();
+  }
+  return done;
 }
 
 bool QVReporterCalls::restore() {
@@ -208,9 +232,9 @@ bool QVReporterCalls::handleStep(const QVReporterRecord& record, QVReporterSessi
   if (record.kind == Kind::stop && !drainBeforeStep(session)) return false;
   switch (record.kind) {
     case Kind::open:
-      session.isOpen = true;
       session.serviceType = static_cast<QVClientServiceType>(record.type);
-      return session.isPresent || make(session);
+      session.isOpen = make(session);
+      return session.isOpen;
     case Kind::setServiceType:
       session.serviceType = static_cast<QVClientServiceType>(record.type);
       return !session.isPresent ||
@@ -222,6 +246,8 @@ bool QVReporterCalls::handleStep(const QVReporterRecord& record, QVReporterSessi
       return !session.isPresent || configure(session);
     }
     case Kind::start:
+      // What was committed since it was lost does not belong to the new one.
+      if (isGone(session)) drainBeforeStep(session);
       session.isStarted = true;
       return session.isPresent ? start(session) : make(session);
     case Kind::stop:
@@ -236,11 +262,13 @@ bool QVReporterCalls::handleStep(const QVReporterRecord& record, QVReporterSessi
 }
 
 bool QVReporterCalls::destroy(QVReporterSessionState& session) {
-  if (session.isPresent) {
-    if (!hasRoom() || !drainBeforeStep(session) ||
-        !issue(client_->destroyReportingSession(session.reporterID, acknowledge()))) {
-      return false;
-    }
+  if (session.isPresent && !hasRoom()) return false;
+  // One that was lost and is to be restored waits for that, where its real-time queues hold
+  // something.
+  if ((session.isPresent || session.isStarted) && !drainBeforeStep(session)) return false;
+  if (session.isPresent &&
+      !issue(client_->destroyReportingSession(session.reporterID, acknowledge()))) {
+    return false;
   }
   for (const auto& ring : core_.rings.all()) {
     if (ring->session != &session) continue;
@@ -266,6 +294,19 @@ bool QVReporterCalls::drainBeforeStep(const QVReporterSessionState& session) {
   return true;
 }
 
+// Are its messages to be sent now, or dropped because its session was lost?
+bool QVReporterCalls::isSent(const QVRealtimeRing& ring) const {
+  const QVReporterSessionState* session = ring.session;
+  return session != nullptr && (session->isStarted || (session->isOpen && isGone(*session)));
+}
+
+std::size_t QVReporterCalls::workRing(QVRealtimeRing& ring) {
+  if (!isSent(ring)) return 0;
+  const uint64_t before = ring.taken();
+  drain(ring, std::min(before + kTurn, ring.written()));
+  return ring.taken() - before;
+}
+
 // False where something is left of its first `upTo` messages.
 bool QVReporterCalls::drain(QVRealtimeRing& ring, uint64_t upTo) {
   QVRealtimeRing::Message message;
@@ -288,24 +329,14 @@ void QVReporterCalls::drop(QVRealtimeRing& ring) {
   for (; ring.front(message); ring.pop()) core_.countDrop(QVDropReason::connectionLost);
 }
 
-void QVReporterCalls::drainAll() {
-  polls_ = false;
-  for (const auto& ring : core_.rings.all()) {
-    if (!ring->session->isStarted) continue;
-    drain(*ring, ring->written());
-    polls_ = polls_ || !ring->isOver();
-  }
-  core_.rings.removeOver();
-}
-
 void QVReporterCalls::markRings() {
   core_.rings.forEach([](QVRealtimeRing& ring) { ring.writtenBeforeFlush = ring.written(); });
 }
 
 bool QVReporterCalls::areRingsWorkedOff() {
   bool are = true;
-  core_.rings.forEach([&are](const QVRealtimeRing& ring) {
-    are = are && (!ring.session->isStarted || ring.taken() >= ring.writtenBeforeFlush);
+  core_.rings.forEach([this, &are](const QVRealtimeRing& ring) {
+    are = are && (!isSent(ring) || ring.taken() >= ring.writtenBeforeFlush);
   });
   return are;
 }

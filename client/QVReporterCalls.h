@@ -31,8 +31,8 @@ class QVReporterCalls {
   // Has the service answered on this connection?
   bool isAnswered() const { return isAnswered_; }
 
-  // Does as much as can be done: restores, works off the queue, then the real-time queues. Without
-  // a connection, drops what reporting that is off drops.
+  // Does as much as can be done: restores, then works off the queue and the real-time queues, in
+  // turns. Without a connection, drops what reporting that is off drops.
   void work();
   // Is there anything to be done with a connection?
   bool wantsConnection();
@@ -67,7 +67,10 @@ class QVReporterCalls {
   bool drainBeforeStep(const QVReporterSessionState& session);
   bool drain(QVRealtimeRing& ring, uint64_t upTo);
   void drop(QVRealtimeRing& ring);
-  void drainAll();
+  bool isSent(const QVRealtimeRing& ring) const;
+  // How many records, or messages, of a turn were worked off.
+  std::size_t workQueue();
+  std::size_t workRing(QVRealtimeRing& ring);
 
   bool issue(const QVClientError& error);
   QVClientBooleanReply acknowledge();
@@ -79,6 +82,7 @@ class QVReporterCalls {
   bool isAnswered_ = false;
   bool isRestored_ = true;
   bool polls_ = false;
+  std::size_t turn_ = 0;  // 0: the queue's, else a real-time queue's
   uint64_t markedStep_ = UINT64_MAX;  // the record that rings were last marked for
   uint64_t issued_ = 0;
   uint64_t answered_ = 0;

@@ -2,6 +2,7 @@
 
 #include "client/QVClientBell.h"
 #include "client/QVClientPayload.h"
+#include "client/QVClientThread.h"
 #include "client/QVRealtimeRings.h"
 #include "client/QVReporterFlushes.h"
 #include "client/QVReporterLedger.h"
@@ -40,9 +41,9 @@ struct QVReporterCore {
   QVReporterSessions sessions;
   QVRealtimeRings rings;
   QVReporterFlushes flushes;
-  // The thread itself: set as it starts; joined or detached by the reporter.
-  std::thread thread;
-  std::atomic<std::thread::id> threadID{};
+  // Started, joined or detached by the reporter.
+  QVClientThread thread;
+  std::atomic<std::thread::id> threadID{};  // while it runs
   // When the thread has to end at the latest.
   std::atomic<TimePoint> deadline{TimePoint::max()};
 };

@@ -8,7 +8,8 @@ QVClientError::Code QVReporterFlushes::wait(uint64_t lastRecord,
                                             const std::function<void()>& wake) {
   // Beyond this the sum with the current time could overflow.
   constexpr std::chrono::milliseconds kLongest = std::chrono::hours(24 * 365);
-  const auto deadline = std::chrono::steady_clock::now() + std::min(timeLimit, kLongest);
+  const auto deadline = std::chrono::steady_clock::now() +
+                        std::clamp(timeLimit, std::chrono::milliseconds::zero(), kLongest);
   QVMutexLock lock(mutex_);
   const uint64_t mine = ++requested_;
   lastRecord_ = std::max(lastRecord_, lastRecord);

@@ -75,8 +75,11 @@ QVClientResult<std::unique_ptr<QVRealtimeQueue>> QVReporterSession::makeRealtime
   const std::size_t slots = std::bit_ceil(options.messages);
   if (slots * options.bytesPerMessage > kMaximumRingBytes) return fail(Code::invalidArgument);
   try {
+    // Asked before: one that is not admitted must not take the memory that is kept from it.
+    Code code = core_->rings.admit(QVRealtimeRing::bytesOf(slots, options.bytesPerMessage));
+    if (code != Code::none) return fail(code);
     auto ring = std::make_shared<QVRealtimeRing>(slots, options.bytesPerMessage, &state_);
-    const Code code = core_->rings.add(ring);
+    code = core_->rings.add(ring);
     if (code != Code::none) return fail(code);
     // From now on the reporter's thread looks at it.
     core_->bell.ring();
