@@ -1,7 +1,7 @@
 #include "platform/QVText.h"
 #include "platform/linux/bus/QVBusValueDecoder.h"
 #include "platform/linux/bus/QVBusWriter.h"
-#include "tests/unit/bus/QVTestWire.h"
+#include "tests/support/QVTestWire.h"
 
 #include <limits>
 #include <string>
