@@ -10,6 +10,8 @@
 
 namespace {
 
+using Operation = QVReportingServiceOperation;
+
 // No reply is a reply of no type: then no answer is asked for.
 template <class Outcome>
 QVClientCall::Reply replyOrNone(std::function<void(const Outcome&)>&& reply) {
@@ -35,20 +37,18 @@ QVClientResult<Value> callAndWait(QVClientConnection& connection, const QVClient
 }
 
 QVClientRequest serviceTypeRequest(QVClientServiceType serviceType, int64_t reporterID) {
-  return {.operation = QVClientOperation::setServiceType,
-          .targets = reporterID,
-          .serviceType = serviceType};
+  return {
+      .operation = Operation::setServiceType, .targets = reporterID, .serviceType = serviceType};
 }
 
 QVClientRequest configurationRequest(const QVClientPayload& configuration, int64_t reporterID) {
-  return {.operation = QVClientOperation::setConfiguration,
-          .targets = reporterID,
-          .payload = &configuration};
+  return {
+      .operation = Operation::setConfiguration, .targets = reporterID, .payload = &configuration};
 }
 
 QVClientRequest messageRequest(const QVClientPayload& message, QVClientCategory category,
                                QVClientMessageType type, const QVClientTargets& targets) {
-  return {.operation = QVClientOperation::sendMessage,
+  return {.operation = Operation::sendMessage,
           .targets = targets,
           .payload = &message,
           .category = category,
@@ -88,7 +88,7 @@ QVClient::~QVClient() {
 // The operations, sent.
 
 QVClientError QVClient::createReportingSession(int64_t reporterID, QVClientBooleanReply reply) {
-  return connection_->issue({QVClientOperation::createReportingSession, reporterID},
+  return connection_->issue({Operation::createReportingSession, reporterID},
                             replyOrNone(std::move(reply)));
 }
 
@@ -100,7 +100,7 @@ QVClientError QVClient::setServiceType(QVClientServiceType serviceType, int64_t 
 
 QVClientError QVClient::getServiceNameForReporterID(int64_t reporterID,
                                                     QVClientServiceTypeReply reply) {
-  return connection_->issue({QVClientOperation::getServiceNameForReporterID, reporterID},
+  return connection_->issue({Operation::getServiceNameForReporterID, reporterID},
                             replyOrNone(std::move(reply)));
 }
 
@@ -112,7 +112,7 @@ QVClientError QVClient::setConfiguration(const QVClientPayload& configuration,
 
 QVClientError QVClient::startReportingSessionForID(int64_t reporterID,
                                                    QVClientBooleanReply completed) {
-  return connection_->issue({QVClientOperation::startReportingSessionForID, reporterID},
+  return connection_->issue({Operation::startReportingSessionForID, reporterID},
                             replyOrNone(std::move(completed)));
 }
 
@@ -125,32 +125,32 @@ QVClientError QVClient::sendMessage(const QVClientPayload& message, QVClientCate
 }
 
 QVClientError QVClient::stopReportingSessionForID(int64_t reporterID, QVClientBooleanReply reply) {
-  return connection_->issue({QVClientOperation::stopReportingSessionForID, reporterID},
+  return connection_->issue({Operation::stopReportingSessionForID, reporterID},
                             replyOrNone(std::move(reply)));
 }
 
 QVClientError QVClient::destroyReportingSession(int64_t reporterID, QVClientBooleanReply reply) {
-  return connection_->issue({QVClientOperation::destroyReportingSession, reporterID},
+  return connection_->issue({Operation::destroyReportingSession, reporterID},
                             replyOrNone(std::move(reply)));
 }
 
 QVClientError QVClient::reporterIDValid(int64_t reporterID, QVClientReporterReply reply) {
-  return connection_->issue({QVClientOperation::reporterIDValid, reporterID},
+  return connection_->issue({Operation::reporterIDValid, reporterID},
                             replyOrNone(std::move(reply)));
 }
 
 QVClientError QVClient::getAllReporters(QVClientReportersReply reply) {
-  return connection_->issue({QVClientOperation::getAllReporters}, replyOrNone(std::move(reply)));
+  return connection_->issue({Operation::getAllReporters}, replyOrNone(std::move(reply)));
 }
 
 QVClientError QVClient::killService(QVClientBooleanReply reply) {
-  return connection_->issue({QVClientOperation::killService}, replyOrNone(std::move(reply)));
+  return connection_->issue({Operation::killService}, replyOrNone(std::move(reply)));
 }
 
 // The operations, waited for.
 
 QVClientResult<bool> QVClient::createReportingSessionAndWait(int64_t reporterID, TimeLimit limit) {
-  return callAndWait<bool>(*connection_, {QVClientOperation::createReportingSession, reporterID},
+  return callAndWait<bool>(*connection_, {Operation::createReportingSession, reporterID},
                            deadlineOf(limit));
 }
 
@@ -163,8 +163,7 @@ QVClientResult<bool> QVClient::setServiceTypeAndWait(QVClientServiceType service
 QVClientResult<QVClientServiceType> QVClient::getServiceNameForReporterIDAndWait(int64_t reporterID,
                                                                                  TimeLimit limit) {
   return callAndWait<QVClientServiceType>(
-      *connection_, {QVClientOperation::getServiceNameForReporterID, reporterID},
-      deadlineOf(limit));
+      *connection_, {Operation::getServiceNameForReporterID, reporterID}, deadlineOf(limit));
 }
 
 QVClientResult<bool> QVClient::setConfigurationAndWait(const QVClientPayload& configuration,
@@ -178,12 +177,12 @@ QVClientResult<bool> QVClient::startReportingSessionForIDAndWait(int64_t reporte
                                                                  TimeLimit limit) {
   const QVClientConnection::Deadline deadline = deadlineOf(limit);
   if (QVClientError error =
-          connection_->issueWithin({QVClientOperation::startReportingSessionForID, reporterID},
+          connection_->issueWithin({Operation::startReportingSessionForID, reporterID},
                                    replyOrNone(std::move(completed)), deadline)) {
     return error;
   }
   const auto reporter = callAndWait<QVClientReporter>(
-      *connection_, {QVClientOperation::reporterIDValid, reporterID}, deadline);
+      *connection_, {Operation::reporterIDValid, reporterID}, deadline);
   if (!reporter) return reporter.error();
   return reporterID != 0 && reporter.value().reporterID == reporterID;
 }
@@ -205,28 +204,28 @@ QVClientError QVClient::sendMessageAndWait(const QVClientPayload& message,
 
 QVClientResult<bool> QVClient::stopReportingSessionForIDAndWait(int64_t reporterID,
                                                                 TimeLimit limit) {
-  return callAndWait<bool>(*connection_, {QVClientOperation::stopReportingSessionForID, reporterID},
+  return callAndWait<bool>(*connection_, {Operation::stopReportingSessionForID, reporterID},
                            deadlineOf(limit));
 }
 
 QVClientResult<bool> QVClient::destroyReportingSessionAndWait(int64_t reporterID, TimeLimit limit) {
-  return callAndWait<bool>(*connection_, {QVClientOperation::destroyReportingSession, reporterID},
+  return callAndWait<bool>(*connection_, {Operation::destroyReportingSession, reporterID},
                            deadlineOf(limit));
 }
 
 QVClientResult<QVClientReporter> QVClient::reporterIDValidAndWait(int64_t reporterID,
                                                                   TimeLimit limit) {
-  return callAndWait<QVClientReporter>(
-      *connection_, {QVClientOperation::reporterIDValid, reporterID}, deadlineOf(limit));
+  return callAndWait<QVClientReporter>(*connection_, {Operation::reporterIDValid, reporterID},
+                                       deadlineOf(limit));
 }
 
 QVClientResult<std::vector<int64_t>> QVClient::getAllReportersAndWait(TimeLimit limit) {
-  return callAndWait<std::vector<int64_t>>(*connection_, {QVClientOperation::getAllReporters},
+  return callAndWait<std::vector<int64_t>>(*connection_, {Operation::getAllReporters},
                                            deadlineOf(limit));
 }
 
 QVClientResult<bool> QVClient::killServiceAndWait(TimeLimit limit) {
-  return callAndWait<bool>(*connection_, {QVClientOperation::killService}, deadlineOf(limit));
+  return callAndWait<bool>(*connection_, {Operation::killService}, deadlineOf(limit));
 }
 
 // The loop.

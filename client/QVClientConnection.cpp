@@ -14,6 +14,8 @@
 
 namespace {
 
+using Operation = QVReportingServiceOperation;
+
 // Bytes of calls that a batch keeps together. A write of this size costs next to nothing more per
 // call than a larger one, and the service gets to work meanwhile.
 constexpr std::size_t kBatchBytes = std::size_t{64} << 10;
@@ -145,7 +147,7 @@ void QVClientConnection::work() {
 
 QVClientError QVClientConnection::issue(const QVClientRequest& request, QVClientCall::Reply reply) {
   if (QVClientError error = request.check()) return error;
-  QVClientCall call{std::move(reply), nullptr, request.operation == QVClientOperation::killService};
+  QVClientCall call{std::move(reply), nullptr, request.operation == Operation::killService};
   uint32_t serial = 0;
   for (bool again = true;; again = false) {
     QVClientError error;
@@ -165,7 +167,7 @@ QVClientError QVClientConnection::issue(const QVClientRequest& request, QVClient
 
 QVClientError QVClientConnection::issueWithin(const QVClientRequest& request,
                                               QVClientCall::Reply reply, Deadline deadline) {
-  QVClientCall call{std::move(reply), nullptr, request.operation == QVClientOperation::killService};
+  QVClientCall call{std::move(reply), nullptr, request.operation == Operation::killService};
   uint32_t serial = 0;
   return issueWithin(request, call, serial, deadline);
 }
@@ -195,7 +197,7 @@ QVClientError QVClientConnection::issueAndWait(const QVClientRequest& request,
                                                QVClientCall::Reply reply, Deadline deadline) {
   bool done = false;
   uint32_t serial = 0;
-  QVClientCall call{std::move(reply), &done, request.operation == QVClientOperation::killService};
+  QVClientCall call{std::move(reply), &done, request.operation == Operation::killService};
   if (QVClientError error = issueWithin(request, call, serial, deadline)) return error;
   QVMutexLock lock(mutex_);
   while (!done) {

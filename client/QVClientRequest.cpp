@@ -11,45 +11,28 @@
 
 namespace {
 
-constexpr const char* kPath = "/net/quillon/quietvox/ReportingService";
-constexpr const char* kInterface = "net.quillon.quietvox.ReportingService";
+using Operation = QVReportingServiceOperation;
 
 // Where a header holds its flags, the body's length and the serial.
 constexpr std::size_t kFlagsAt = 2;
 constexpr std::size_t kBodyLengthAt = 4;
 constexpr std::size_t kSerialAt = 8;
 
-struct Member {
-  const char* name;
-  const char* signature;
-};
-
-constexpr std::array<Member, 11> kMembers{{{"CreateReportingSession", "x"},
-                                           {"SetServiceType", "qx"},
-                                           {"GetServiceNameForReporterID", "x"},
-                                           {"SetConfiguration", "a{sv}x"},
-                                           {"StartReportingSessionForID", "x"},
-                                           {"SendMessage", "a{sv}uqbax"},
-                                           {"StopReportingSessionForID", "x"},
-                                           {"DestroyReportingSession", "x"},
-                                           {"ReporterIDValid", "x"},
-                                           {"GetAllReporters", ""},
-                                           {"KillService", ""}}};
-
 // The headers of all operations, made once: calls to one operation differ only in flags, length
 // and serial. Never destroyed: a reporter that a program keeps in a global sends what is left when
 // the program has left main(), after constants that were made later are gone.
-const std::string& headerOf(QVClientOperation operation) {
-  using Headers = std::array<std::string, kMembers.size()>;
+const std::string& headerOf(Operation operation) {
+  using Headers = std::array<std::string, kReportingServiceMembers.size()>;
   static const Headers& kHeaders = *[] {
     auto made = std::make_unique<Headers>();
     Headers& headers = *made;
-    for (std::size_t i = 0; i < kMembers.size(); ++i) {
+    for (std::size_t i = 0; i < headers.size(); ++i) {
+      const QVBusMemberDescription& member = kReportingServiceMembers[i];
       QVBusWriter(headers[i])
-          .beginMessage({.path = kPath,
-                         .interface = kInterface,
-                         .member = kMembers[i].name,
-                         .signature = kMembers[i].signature});
+          .beginMessage({.path = kReportingServicePath,
+                         .interface = member.interface,
+                         .member = member.member,
+                         .signature = member.in});
     }
     return made.release();
   }();
@@ -71,14 +54,14 @@ std::size_t entryBytes(const QVClientRequest& request) noexcept {
 
 std::size_t bodyBytes(const QVClientRequest& request) noexcept {
   switch (request.operation) {
-    case QVClientOperation::getAllReporters:
-    case QVClientOperation::killService:
+    case Operation::getAllReporters:
+    case Operation::killService:
       return 0;
-    case QVClientOperation::setServiceType:
+    case Operation::setServiceType:
       return 16;
-    case QVClientOperation::setConfiguration:
+    case Operation::setConfiguration:
       return QVBusAlign(kBeforeEntries + entryBytes(request), 8) + 8;
-    case QVClientOperation::sendMessage: {
+    case Operation::sendMessage: {
       const std::size_t numbers = QVBusAlign(kBeforeEntries + entryBytes(request), 4);
       const auto reporterIDs = request.targets.reporterIDs();
       // Category, type, everySession and the list's length take 4 bytes each with their padding.
@@ -129,18 +112,18 @@ void QVClientRequest::appendTo(std::string& out, uint32_t serial, bool answered)
   QVBusWriter writer(out);
   out.append(header);
   switch (operation) {
-    case QVClientOperation::getAllReporters:
-    case QVClientOperation::killService:
+    case Operation::getAllReporters:
+    case Operation::killService:
       break;
-    case QVClientOperation::setServiceType:
+    case Operation::setServiceType:
       writer.writeNumber(static_cast<uint16_t>(serviceType));
       writer.writeNumber(targets.reporterIDs().front());
       break;
-    case QVClientOperation::setConfiguration:
+    case Operation::setConfiguration:
       appendPayload(out, *payload);
       writer.writeNumber(targets.reporterIDs().front());
       break;
-    case QVClientOperation::sendMessage:
+    case Operation::sendMessage:
       appendMessageArguments(out, writer, *this);
       break;
     default:

@@ -3,32 +3,18 @@
 #include "client/QVClientPayload.h"
 #include "client/QVClientReplies.h"
 #include "client/QVClientVocabulary.h"
+#include "platform/linux/bus/QVReportingServiceInterface.h"
 
 #include <cstddef>
 #include <cstdint>
 #include <string>
-
-// The service's operations, in the order of its interface.
-enum class QVClientOperation : uint8_t {
-  createReportingSession,
-  setServiceType,
-  getServiceNameForReporterID,
-  setConfiguration,
-  startReportingSessionForID,
-  sendMessage,
-  stopReportingSessionForID,
-  destroyReportingSession,
-  reporterIDValid,
-  getAllReporters,
-  killService
-};
 
 // One call as the program asked for it: an operation and those arguments that it takes. Refers to
 // the program's payload and list of reporters; lives as long as the program's call.
 //
 // Made by QVClient, turned into bytes by QVClientConnection. Threads: one at a time.
 struct QVClientRequest {
-  QVClientOperation operation;
+  QVReportingServiceOperation operation;
   QVClientTargets targets = QVClientTargets(0);  // the one reporter ID of most operations
   const QVClientPayload* payload = nullptr;      // of a message or a configuration
   QVClientServiceType serviceType = QVClientServiceType::unknown;

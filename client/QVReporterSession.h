@@ -49,7 +49,7 @@ class QV_CLIENT_API QVReporterSession {
                                   QVClientMessageType type);
   QVClientError::Code stop();
 
-  // A way into this session for a thread that must never wait. Answers invalidArgument,
+  // A way into the session for a thread that must never wait. Answers invalidArgument,
   // outOfMemory, closed, or queueFull: a reporter has at most 1,024 of them, with 128 MiB in all,
   // those included that are destroyed and whose messages are not sent yet.
   QVClientResult<std::unique_ptr<QVRealtimeQueue>> makeRealtimeQueue(

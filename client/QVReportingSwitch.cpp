@@ -1,6 +1,7 @@
 #include "client/QVReportingSwitch.h"
 
-#include "client/QVReportingPreference.h"
+#include "platform/QVPreferences.h"
+#include "platform/linux/files/QVJSONFile.h"
 
 #include <array>
 #include <cstddef>
@@ -14,7 +15,8 @@
 
 namespace {
 
-constexpr const char* kPreference = "/preferences/net.quillon.quietvox.json";
+constexpr const char* kPreferences = "/preferences/net.quillon.quietvox.json";
+constexpr std::string_view kPreference = "disable_reporting";
 constexpr std::string_view kNotifications = "notify";
 constexpr std::string_view kNotification = "net.quillon.quietvox.reporting";
 
@@ -28,7 +30,7 @@ constexpr std::size_t kBufferBytes = std::size_t{16} << 10;
 
 QVReportingSwitch::QVReportingSwitch(const std::string& configurationDirectory,
                                      std::string runtimeDirectory)
-    : preference_(configurationDirectory + kPreference),
+    : preferences_(configurationDirectory + kPreferences),
       runtimeDirectory_(std::move(runtimeDirectory)),
       inotify_(inotify_init1(IN_CLOEXEC | IN_NONBLOCK)) {
   // In this order: a post in between is a second reading.
@@ -37,7 +39,11 @@ QVReportingSwitch::QVReportingSwitch(const std::string& configurationDirectory,
 }
 
 void QVReportingSwitch::readPreference() {
-  isOff_.store(QVReportingIsSwitchedOffByFile(preference_), std::memory_order_relaxed);
+  // Why a file cannot be read is for the service to say.
+  QVJSONFailure failure;
+  const auto values = QVJSONFile::readDictionary(preferences_, failure);
+  isOff_.store(values && QVPreferences::booleanReading(values->find(kPreference)),
+               std::memory_order_relaxed);
 }
 
 int QVReportingSwitch::add(const std::string& directory) const {

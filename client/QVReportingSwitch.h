@@ -34,7 +34,7 @@ class QVReportingSwitch {
   int add(const std::string& directory) const;
   void readPreference();
 
-  const std::string preference_;
+  const std::string preferences_;
   const std::string runtimeDirectory_;
   std::atomic<bool> isOff_{false};
   const QVDescriptor inotify_;

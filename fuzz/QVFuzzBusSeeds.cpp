@@ -1,6 +1,6 @@
 #include "fuzz/QVFuzzBusSeeds.h"
 
-#include "tests/unit/bus/QVTestMessage.h"
+#include "tests/support/QVTestMessage.h"
 
 #include <string_view>
 

@@ -1,6 +1,6 @@
 #include "platform/linux/QVFileOrientation.h"
 
-#include "platform/linux/QVRegularFile.h"
+#include "platform/linux/files/QVRegularFile.h"
 
 #include <string>
 #include <string_view>

@@ -1,6 +1,6 @@
 #include "platform/linux/QVJSONConfiguration.h"
 
-#include "platform/linux/QVJSONFile.h"
+#include "platform/linux/files/QVJSONFile.h"
 
 #include <optional>
 #include <utility>

@@ -73,25 +73,26 @@ _ANY = r".*"
 # source: it is linked without the rest.
 _SHARED_WITH_BUS = r"platform/linux/(QVDescriptor|QVThreadAnnotations|QVWakeUpBatch)\.h"
 
-_SHARED_WITH_TOOLS = (r"platform/linux/(QVDescriptor|QVEventStoreSchema|QVJSONFile|QVJSONText|QVPosixAtomicFile|"
-                      r"QVRegularFile|QVServiceDirectories|tally/\w+)\.h")
+_SHARED_WITH_TOOLS = (r"platform/linux/(QVDescriptor|QVEventStoreSchema|QVJSONText|QVPosixAtomicFile|"
+                      r"QVServiceDirectories|files/\w+|tally/\w+)\.h")
 
 # The first folder that a file lies in, or the file itself, decides.
 LAYERS = [
     Layer("platform/fake", [_PLATFORM, r"platform/fake/\w+\.h"]),
     Layer("platform/linux/bus", [_PLATFORM, r"platform/linux/bus/\w+\.h", _SHARED_WITH_BUS],
           system=True, libraries=LIBRARIES),
+    # As the codec, this goes into the client without the rest of the adapters.
+    Layer("platform/linux/files",
+          [_PLATFORM, r"platform/linux/files/\w+\.h", r"platform/linux/QVDescriptor\.h"],
+          system=True, libraries=["RapidJSON"]),
     Layer("platform/linux", [_PLATFORM, r"platform/linux/(\w+/)*\w+\.h"],
           system=True, libraries=LIBRARIES),
     Layer("platform", [_PLATFORM], machine=False),
     Layer("QVServices/Statistics/Service", [_PLATFORM, r"QVServices/Statistics/(Service/)?\w+\.h"],
           machine=False),
     Layer("QVServices", [_PLATFORM, r"QVServices/Statistics/\w+\.h"], machine=False),
-    # The one source of the client that reads a file of the service's.
-    Layer("client/QVReportingPreference.cpp", [r"client/.*\.h", _SHARED_WITH_BUS], system=True,
-          libraries=["RapidJSON"]),
     Layer("client",
-          [_PLATFORM, r"client/.*\.h", r"platform/linux/bus/\w+\.h", _SHARED_WITH_BUS],
+          [_PLATFORM, r"client/.*\.h", r"platform/linux/(bus|files)/\w+\.h", _SHARED_WITH_BUS],
           system=True),
     Layer("daemon", [_PLATFORM, r"platform/linux/(\w+/)*\w+\.h", r"QVServices/.*\.h", r"daemon/.*\.h"],
           system=True),

@@ -63,7 +63,12 @@ GOOD = {
         '#include "platform/QVThing.h"\n\n#include <string>\n\n'
         'int exitCode(int value) {\n  return value;  // no getenv here, no exit(1)\n}\n',
     "QVServices/Statistics/Service/QVServe.cpp": '#include "platform/QVThing.h"\n\n#include <map>\n',
-    "client/QVClient.cpp": '#include "platform/linux/bus/QVBusThing.h"\n\n#include <poll.h>\n',
+    "platform/linux/files/QVFileThing.h": HEADER,
+    "platform/linux/files/QVFileThing.cpp":
+        '#include "platform/linux/files/QVFileThing.h"\n\n#include <rapidjson/reader.h>\n',
+    "client/QVClient.cpp":
+        '#include "platform/linux/bus/QVBusThing.h"\n#include "platform/linux/files/QVFileThing.h"\n\n'
+        '#include <poll.h>\n',
     "daemon/main.cpp":
         '#include "platform/linux/bus/QVBusThing.h"\n\nint main(int argc, char** argv) {\n'
         '  return argc > 1 && argv[1][0] == \'-\' ? 1 : 0;\n}\n',
@@ -114,6 +119,12 @@ FAULTS = [
     fault("layering", "layering", "platform/linux/QVReal.cpp:1", "platform/linux/QVReal.cpp",
           '#include "QVServices/Statistics/QVCount.h"\n', **{"QVServices/Statistics/QVCount.h": HEADER}),
     fault("layering", "layering", "platform/linux/bus/QVBusThing.cpp:1", "platform/linux/bus/QVBusThing.cpp",
+          '#include "platform/linux/QVReal.h"\n', **{"platform/linux/QVReal.h": HEADER}),
+    fault("layering", "layering", "platform/linux/files/QVFileThing.cpp:1", "platform/linux/files/QVFileThing.cpp",
+          '#include "platform/linux/QVReal.h"\n', **{"platform/linux/QVReal.h": HEADER}),
+    fault("layering", "layering", "platform/linux/files/QVFileThing.cpp:1", "platform/linux/files/QVFileThing.cpp",
+          "#include <sqlite3.h>\n"),
+    fault("layering", "layering", "client/QVClient.cpp:1", "client/QVClient.cpp",
           '#include "platform/linux/QVReal.h"\n', **{"platform/linux/QVReal.h": HEADER}),
     fault("layering", "layering", "client/QVClient.cpp:1", "client/QVClient.cpp",
           '#include "QVServices/Statistics/Service/QVServe.h"\n',

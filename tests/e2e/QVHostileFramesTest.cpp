@@ -2,7 +2,7 @@
 // and one log line says which rule it broke.
 
 #include "tests/support/QVEndToEndTest.h"
-#include "tests/support/QVFrameBuilder.h"
+#include "tests/support/QVTestMessage.h"
 
 #include <ostream>
 
@@ -13,27 +13,44 @@ namespace {
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 
-constexpr const char* kMessageSignature = "a{sv}uqbax";
-
 // The bytes of one dictionary entry: a key and a variant of a value that begins at a multiple of
 // `alignment`.
 std::string entry(const std::string& key, const std::string& type, std::size_t alignment,
                   const std::string& value) {
-  return QVFrameBuilder().string(key).signature(type).align(alignment).raw(value).bytes();
+  return QVTestWire().string(key).signature(type).align(alignment).raw(value).bytes;
 }
 
-// A SendMessage of a dictionary.
-std::string message(const std::string& entries) {
-  return QVFrame{.signature = kMessageSignature, .body = QVMessageBody{.entries = entries}.bytes()}
+// A SendMessage with that body.
+std::string messageOf(const std::string& body, uint32_t serial = 1, char order = 'l') {
+  return QVTestMessage{.order = order,
+                       .serial = serial,
+                       .member = "SendMessage",
+                       .signature = "a{sv}uqbax",
+                       .body = body}
       .bytes();
+}
+
+// The body of a SendMessage to session 7, its dictionary's entries given as bytes.
+std::string bodyOf(const std::string& entries, bool everySession = false, char order = 'l') {
+  return QVTestWire(order)
+      .array(8, [&entries](QVTestWire& wire) { wire.raw(entries); })
+      .u32(0x08000003)
+      .u16(1)
+      .u32(everySession ? 1 : 0)
+      .array(8, [](QVTestWire& wire) { wire.i64(7); })
+      .bytes;
+}
+
+std::string message(const std::string& entries, uint32_t serial = 1) {
+  return messageOf(bodyOf(entries), serial);
 }
 
 // A variant that holds a variant that holds ..., so many of them, and a byte.
 std::string nestedVariants(int depth) {
-  QVFrameBuilder entry;
+  QVTestWire entry;
   entry.string("deep");
   for (int i = 1; i < depth; ++i) entry.signature("v");
-  return entry.signature("y").number(uint8_t{1}).bytes();
+  return entry.signature("y").u8(1).bytes;
 }
 
 struct HostileFrame {
@@ -56,34 +73,31 @@ std::vector<HostileFrame> hostileFrames() {
   oversizedHeader[15] = '\x7f';
   const std::string badText = "bad \xC3(";
   const auto field = [](uint8_t code, const std::string& type, const std::string& text) {
-    return QVFrameBuilder().field(code, type, text).bytes();
+    return QVTestWire().field(code, type, text).bytes;
   };
-  const auto list = [] { return QVFrame{.member = "GetAllReporters"}; };
-  const auto listWith = [&list](const std::string& fields) {
-    QVFrame frame = list();
-    frame.moreFields = fields;
-    return frame.bytes();
+  const auto listWith = [](const std::string& fields) {
+    return QVTestMessage{.member = "GetAllReporters", .moreFields = fields}.bytes();
   };
   const auto create = [](const std::string& body) {
-    return QVFrame{.member = "CreateReportingSession", .signature = "x", .body = body}.bytes();
+    return QVTestMessage{.signature = "x", .body = body}.bytes();
   };
-  const std::string seven = QVFrameBuilder().number(int64_t{7}).bytes();
+  const std::string seven = QVTestWire().i64(7).bytes;
 
   return {
       // The frame
       {"UnknownByteOrder", unknownOrder, "neither byte order is named"},
-      {"OtherVersion", QVFrame{.version = 2}.bytes(), "unknown version of the protocol"},
+      {"OtherVersion", QVTestMessage{.version = 2}.bytes(), "unknown version of the protocol"},
       {"OversizedBodyAnnounced", oversized, "message larger than 8 MiB"},
       {"OversizedHeaderAnnounced", oversizedHeader, "message larger than 8 MiB"},
       // The header
-      {"TypeZero", QVFrame{.type = 0}.bytes(), "message of type 0"},
-      {"SerialZero", QVFrame{.serial = 0}.bytes(), "message without a serial"},
-      {"NoMember", QVFrame{.member = {}}.bytes(), "call without path or member"},
-      {"NoPath", QVFrame{.path = {}}.bytes(), "call without path or member"},
-      {"BadPath", QVFrame{.path = "/net//quillon"}.bytes(), "not an object path"},
-      {"BadInterface", QVFrame{.interface = "nodots"}.bytes(), "not an interface name"},
-      {"BadMember", QVFrame{.member = "7th"}.bytes(), "not a member name"},
-      {"LocalPath", QVFrame{.path = "/org/freedesktop/DBus/Local"}.bytes(),
+      {"TypeZero", QVTestMessage{.type = 0}.bytes(), "message of type 0"},
+      {"SerialZero", QVTestMessage{.serial = 0}.bytes(), "message without a serial"},
+      {"NoMember", QVTestMessage{.member = {}}.bytes(), "call without path or member"},
+      {"NoPath", QVTestMessage{.path = {}}.bytes(), "call without path or member"},
+      {"BadPath", QVTestMessage{.path = "/net//quillon"}.bytes(), "not an object path"},
+      {"BadInterface", QVTestMessage{.interface = "nodots"}.bytes(), "not an interface name"},
+      {"BadMember", QVTestMessage{.member = "7th"}.bytes(), "not a member name"},
+      {"LocalPath", QVTestMessage{.path = "/org/freedesktop/DBus/Local"}.bytes(),
        "message for local use only"},
       {"FieldZero", listWith(field(0, "s", "x")), "header field 0"},
       {"FieldTwice", listWith(field(3, "s", "KillService")), "header field given twice"},
@@ -91,45 +105,28 @@ std::vector<HostileFrame> hostileFrames() {
       {"BadDestination", listWith(field(6, "s", "a..b")), "not a bus name as destination"},
       {"BadTextInUnknownField", listWith(field(200, "s", badText)),
        "a string is not UTF-8 without NUL"},
-      {"Descriptors", listWith(QVFrameBuilder().field(9, 1).bytes()),
-       "message with file descriptors"},
-      {"ReturnWithoutReplySerial", QVFrame{.type = 2}.bytes(), "return without a reply serial"},
+      {"Descriptors", listWith(QVTestWire().field(9, 1).bytes), "message with file descriptors"},
+      {"ReturnWithoutReplySerial", QVTestMessage{.type = 2}.bytes(),
+       "return without a reply serial"},
       // The body
-      {"BodyWithoutSignature", QVFrame{.member = "GetAllReporters", .body = seven}.bytes(),
-       "body without a signature"},
+      {"BodyWithoutSignature", QVTestMessage{.body = seven}.bytes(), "body without a signature"},
       {"BodyTooShort", create(seven.substr(0, 4)), "truncated"},
       {"BodyTooLong", create(seven + seven), "body longer than its signature"},
-      {"BadSignature",
-       QVFrame{.member = "CreateReportingSession", .signature = "a{vs}", .body = seven}.bytes(),
+      {"BadSignature", QVTestMessage{.signature = "a{vs}", .body = seven}.bytes(),
        "not a signature"},
       {"ThirtyThreeArrays",
-       QVFrame{.member = "CreateReportingSession",
-               .signature = std::string(33, 'a') + "y",
-               .body = std::string(4, '\0')}
-           .bytes(),
+       QVTestMessage{.signature = std::string(33, 'a') + "y", .body = std::string(4, '\0')}.bytes(),
        "not a signature"},
-      {"DirtyPadding",
-       QVFrame{.signature = kMessageSignature,
-               .body = QVFrameBuilder().number(uint32_t{8}).number(uint32_t{1}).bytes()}
-           .bytes(),
-       "padding is not zero"},
+      {"DirtyPadding", messageOf(QVTestWire().u32(8).u32(1).bytes), "padding is not zero"},
       {"BadText", message(entry(badText, "y", 1, "x")), "a string is not UTF-8 without NUL"},
       {"TextWithNul", message(entry(std::string("a\0b", 3), "y", 1, "x")),
        "a string is not UTF-8 without NUL"},
-      {"TextWithoutEnd",
-       message(QVFrameBuilder().number(uint32_t{1}).raw("ab").signature("y").raw("\1").bytes()),
+      {"TextWithoutEnd", message(QVTestWire().u32(1).raw("ab").signature("y").raw("\1").bytes),
        "a text is not ended by NUL"},
-      {"TextBeyondTheMessage", message(QVFrameBuilder().number(uint32_t{1'000'000}).bytes()),
-       "truncated"},
-      {"ArrayBeyondTheMessage",
-       QVFrame{.signature = kMessageSignature,
-               .body = QVFrameBuilder().number(uint32_t{1'000'000}).align(8).bytes()}
-           .bytes(),
+      {"TextBeyondTheMessage", message(QVTestWire().u32(1'000'000).bytes), "truncated"},
+      {"ArrayBeyondTheMessage", messageOf(QVTestWire().u32(1'000'000).align(8).bytes),
        "an array reaches beyond its message"},
-      {"HugeArray",
-       QVFrame{.signature = kMessageSignature,
-               .body = QVFrameBuilder().number(uint32_t{0xFFFFFFFF}).align(8).bytes()}
-           .bytes(),
+      {"HugeArray", messageOf(QVTestWire().u32(0xFFFFFFFF).align(8).bytes),
        "an array larger than 64 MiB"},
       {"NeitherTrueNorFalse", message(entry("abc", "b", 4, {"\2\0\0\0", 4})),
        "a boolean is neither 0 nor 1"},
@@ -190,15 +187,9 @@ class QVOddFramesTest : public QVEndToEndTest {
 };
 
 TEST_F(QVOddFramesTest, BigEndianIsTaken) {
-  QVFrameBuilder entries(true);
-  entries.string("frames").signature("t").number(uint64_t{0x0102030405060708});
-  entries.align(8).string("note").signature("s").string("x");
-  ASSERT_TRUE(peer_.send(
-      QVFrame{.bigEndian = true,
-              .serial = 100,
-              .signature = kMessageSignature,
-              .body = QVMessageBody{.entries = entries.bytes(), .bigEndian = true}.bytes()}
-          .bytes()));
+  QVTestWire entries('B');
+  entries.entry("frames", "t").u64(0x0102030405060708).entry("note", "s").string("x");
+  ASSERT_TRUE(peer_.send(messageOf(bodyOf(entries.bytes, false, 'B'), 100, 'B')));
   EXPECT_TRUE(peer_.awaitReply(100).isReturn());
   expectStoredPayloads({R"({"frames":72623859790382856,"note":"x"})"});
 }
@@ -259,19 +250,16 @@ TEST_F(QVOddFramesTest, AMessageOfEightMebibytesIsTaken) {
 }
 
 TEST_F(QVOddFramesTest, SixtyTwoVariantsDeepAreTaken) {
-  ASSERT_TRUE(peer_.send(QVFrame{.serial = 100,
-                                 .signature = kMessageSignature,
-                                 .body = QVMessageBody{.entries = nestedVariants(62)}.bytes()}
-                             .bytes()));
+  ASSERT_TRUE(peer_.send(message(nestedVariants(62), 100)));
   EXPECT_TRUE(peer_.awaitReply(100).isReturn());
   expectStoredPayloads({R"({"deep":1})"});
 }
 
 TEST_F(QVOddFramesTest, UnknownFieldsTypesAndFlagsAreIgnored) {
-  const std::string fields = QVFrameBuilder().field(200, "s", "whatever").bytes();
-  ASSERT_TRUE(peer_.send(QVFrame{.type = 77, .serial = 100}.bytes()));
+  const std::string fields = QVTestWire().field(200, "s", "whatever").bytes;
+  ASSERT_TRUE(peer_.send(QVTestMessage{.type = 77, .serial = 100}.bytes()));
   ASSERT_TRUE(peer_.send(
-      QVFrame{.flags = 0xFE, .serial = 101, .member = "GetAllReporters", .moreFields = fields}
+      QVTestMessage{.flags = 0xFE, .serial = 101, .member = "GetAllReporters", .moreFields = fields}
           .bytes()));
   EXPECT_THAT(peer_.awaitReply(101).integers(), ElementsAre(7));
 }
@@ -281,11 +269,7 @@ TEST_F(QVOddFramesTest, DescriptorsInAMessageAreRefusedAndClosed) {
   expectLogged("List of backends");
   const std::size_t before = service().openDescriptors();
   const std::string entries = entry("abc", "h", 4, std::string(4, '\0'));
-  ASSERT_TRUE(peer_.sendWithDescriptor(QVFrame{.serial = 100,
-                                               .signature = kMessageSignature,
-                                               .body = QVMessageBody{.entries = entries}.bytes()}
-                                           .bytes(),
-                                       STDIN_FILENO));
+  ASSERT_TRUE(peer_.sendWithDescriptor(message(entries, 100), STDIN_FILENO));
   const auto reply = peer_.awaitReply(100);
   EXPECT_EQ(reply.errorName, "org.freedesktop.DBus.Error.InvalidArgs");
   EXPECT_EQ(service().openDescriptors(), before);
@@ -294,10 +278,8 @@ TEST_F(QVOddFramesTest, DescriptorsInAMessageAreRefusedAndClosed) {
 }
 
 TEST_F(QVOddFramesTest, EverySessionWithAListIsRefusedBeforeAnythingElse) {
-  const QVMessageBody body{.entries = entry("abc", "h", 4, std::string(4, '\0')),
-                           .everySession = true};
-  ASSERT_TRUE(peer_.send(
-      QVFrame{.serial = 100, .signature = kMessageSignature, .body = body.bytes()}.bytes()));
+  const std::string entries = entry("abc", "h", 4, std::string(4, '\0'));
+  ASSERT_TRUE(peer_.send(messageOf(bodyOf(entries, true), 100)));
   const auto reply = peer_.awaitReply(100);
   EXPECT_EQ(reply.errorName, "org.freedesktop.DBus.Error.InvalidArgs");
   EXPECT_THAT(reply.string(), HasSubstr("every session"));

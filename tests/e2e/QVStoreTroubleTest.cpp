@@ -28,6 +28,13 @@ class QVStoreTroubleTest : public QVEndToEndTest {
     client.sendMessage({{"session", reporterID}}, {reporterID});
     client.stop(reporterID);
   }
+  // A session that goes on, whose first message, with an "i" of 0, is in the store.
+  void startStoredSession(QVPeerClient& client, int64_t reporterID) {
+    client.create(reporterID, kAPIUsage);
+    client.start(reporterID);
+    client.sendMessage({{"i", 0}}, {reporterID});
+    expectStored("SELECT * FROM beacon_message", 1);
+  }
   // Files beside the store that were set aside.
   std::vector<std::string> setAside() const {
     std::vector<std::string> names;
@@ -115,10 +122,7 @@ TEST_F(QVStoreTroubleTest, ADamagedStoreIsSetAside) {
 
 TEST_F(QVStoreTroubleTest, AStoreThatIsRemovedIsBegunAnew) {
   auto client = connectClient();
-  client.create(6, kAPIUsage);
-  client.start(6);
-  client.sendMessage({{"a", 1}}, {6});
-  expectStored("SELECT * FROM beacon_message", 1);
+  startStoredSession(client, 6);
   std::filesystem::remove(root_.store());
   std::filesystem::remove(root_.store().string() + "-wal");
   std::filesystem::remove(root_.store().string() + "-shm");
@@ -129,10 +133,7 @@ TEST_F(QVStoreTroubleTest, AStoreThatIsRemovedIsBegunAnew) {
 
 TEST_F(QVStoreTroubleTest, AReaderThatStaysHoldsNothingUp) {
   auto client = connectClient();
-  client.create(6, kAPIUsage);
-  client.start(6);
-  client.sendMessage({{"a", 1}}, {6});
-  expectStored("SELECT * FROM beacon_message", 1);
+  startStoredSession(client, 6);
   const auto reader = std::make_unique<QVStoreReader>(root_.store());
   reader->rows("SELECT * FROM beacon_message");
   runSession(client, 7);
@@ -142,10 +143,7 @@ TEST_F(QVStoreTroubleTest, AReaderThatStaysHoldsNothingUp) {
 
 TEST_F(QVStoreTroubleTest, AStoreThatAnotherProgramLocksForAWhileLosesNothing) {
   auto client = connectClient();
-  client.create(7, kAPIUsage);
-  client.start(7);
-  client.sendMessage({{"i", 0}}, {7});
-  expectStored("SELECT * FROM beacon_message", 1);
+  startStoredSession(client, 7);
   sqlite3* other = nullptr;
   ASSERT_EQ(sqlite3_open(root_.store().c_str(), &other), SQLITE_OK);
   sqlite3_busy_timeout(other, 10'000);
@@ -168,10 +166,7 @@ TEST_F(QVStoreTroubleTest, ADiskThatIsFullForAWhileLosesNothing) {
   // The signal that comes with the limit is none that a full disk would send.
   startService({.wrapper = {"/bin/sh", "-c", "trap '' XFSZ; exec \"$0\""}});
   auto client = connectClient();
-  client.create(7, kAPIUsage);
-  client.start(7);
-  client.sendMessage({{"i", 0}}, {7});
-  expectStored("SELECT * FROM beacon_message", 1);
+  startStoredSession(client, 7);
 
   rlimit before{};
   ASSERT_EQ(::prlimit(service().pid(), RLIMIT_FSIZE, nullptr, &before), 0);
@@ -197,10 +192,7 @@ TEST_F(QVStoreTroubleTest, ADiskThatIsFullForAWhileLosesNothing) {
 TEST_F(QVStoreTroubleTest, ADiskThatStaysFullDoesNotKeepTheServiceFromEnding) {
   startService({.wrapper = {"/bin/sh", "-c", "trap '' XFSZ; exec \"$0\""}});
   auto client = connectClient();
-  client.create(7, kAPIUsage);
-  client.start(7);
-  client.sendMessage({{"i", 0}}, {7});
-  expectStored("SELECT * FROM beacon_message", 1);
+  startStoredSession(client, 7);
   const rlimit limit{.rlim_cur = 64 * 1024, .rlim_max = 64 * 1024};
   ASSERT_EQ(::prlimit(service().pid(), RLIMIT_FSIZE, &limit, nullptr), 0);
   const std::string text(10'000, 'x');

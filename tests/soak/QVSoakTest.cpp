@@ -2,8 +2,8 @@
 
 #include "client/quietvox_channels.h"
 #include "tests/support/QVEndToEndTest.h"
-#include "tests/support/QVFrameBuilder.h"
 #include "tests/support/QVSubprocess.h"
+#include "tests/support/QVTestMessage.h"
 
 #include <atomic>
 #include <exception>
@@ -91,7 +91,7 @@ class SoakingClient {
         break;
       case 12:
         if (below(20) == 0) {
-          peer.send(QVFrame{.version = 9}.bytes());
+          peer.send(QVTestMessage{.version = 9}.bytes());
           return false;
         }
         break;

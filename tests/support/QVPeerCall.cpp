@@ -1,5 +1,6 @@
 #include "tests/support/QVPeerCall.h"
 
+#include <string_view>
 #include <utility>
 
 namespace {
@@ -8,6 +9,19 @@ QVPeerCall callWithReporter(std::string member, int64_t reporterID) {
   return {.member = std::move(member), .signature = "x", .body = [reporterID](QVBusWriter& writer) {
             writer.writeNumber(reporterID);
           }};
+}
+
+// The same with an argument before the reporter ID.
+QVPeerCall callWithReporter(std::string member, int64_t reporterID, std::string_view signature,
+                            std::function<void(QVBusWriter&)> writeArgument) {
+  QVPeerCall call = callWithReporter(std::move(member), reporterID);
+  call.signature.insert(0, signature);
+  call.body = [writeArgument = std::move(writeArgument),
+               writeReporter = std::move(call.body)](QVBusWriter& writer) {
+    writeArgument(writer);
+    writeReporter(writer);
+  };
+  return call;
 }
 
 QVPeerCall messageCall(const QVDictionary& message, uint32_t category, uint16_t type,
@@ -52,12 +66,8 @@ QVPeerCall createCall(int64_t reporterID) {
 }
 
 QVPeerCall setServiceTypeCall(uint16_t serviceType, int64_t reporterID) {
-  return {.member = "SetServiceType",
-          .signature = "qx",
-          .body = [serviceType, reporterID](QVBusWriter& writer) {
-            writer.writeNumber(serviceType);
-            writer.writeNumber(reporterID);
-          }};
+  return callWithReporter("SetServiceType", reporterID, "q",
+                          [serviceType](QVBusWriter& writer) { writer.writeNumber(serviceType); });
 }
 
 QVPeerCall getServiceTypeCall(int64_t reporterID) {
@@ -65,12 +75,9 @@ QVPeerCall getServiceTypeCall(int64_t reporterID) {
 }
 
 QVPeerCall configureCall(const QVDictionary& configuration, int64_t reporterID) {
-  return {.member = "SetConfiguration",
-          .signature = "a{sv}x",
-          .body = [configuration, reporterID](QVBusWriter& writer) {
-            writer.writeDictionary(configuration);
-            writer.writeNumber(reporterID);
-          }};
+  return callWithReporter(
+      "SetConfiguration", reporterID, "a{sv}",
+      [configuration](QVBusWriter& writer) { writer.writeDictionary(configuration); });
 }
 
 QVPeerCall startCall(int64_t reporterID) {

@@ -27,9 +27,6 @@ void redirect(const std::string& file, int descriptor) {
 [[noreturn]] void becomeChild(const QVSubprocess::Options& options) {
   redirect(options.standardOutputFile, STDOUT_FILENO);
   redirect(options.standardErrorFile, STDERR_FILENO);
-  for (const auto& [name, value] : options.environment) {
-    ::setenv(name.c_str(), value.c_str(), 1);
-  }
   if (options.inheritedDescriptor >= 0) {
     if (options.inheritedDescriptor == kFirstInheritedDescriptor) {
       ::fcntl(kFirstInheritedDescriptor, F_SETFD, 0);
@@ -39,13 +36,7 @@ void redirect(const std::string& file, int descriptor) {
     ::setenv("LISTEN_FDS", "1", 1);
     ::setenv("LISTEN_PID", std::to_string(::getpid()).c_str(), 1);
   }
-  std::vector<char*> arguments;
-  for (const std::string& argument : options.arguments) {
-    arguments.push_back(const_cast<char*>(argument.c_str()));
-  }
-  arguments.push_back(nullptr);
-  ::execvp(arguments.front(), arguments.data());
-  ::_exit(127);
+  QVSubprocess::execute(options.arguments, options.environment);
 }
 
 }  // namespace
@@ -83,8 +74,24 @@ std::optional<QVSubprocess::Status> QVSubprocess::wait(std::chrono::milliseconds
     collected = ::waitpid(pid_, &raw, 0);
   } while (collected < 0 && errno == EINTR);
   if (collected != pid_) throw std::runtime_error("a child process ended unseen");
-  status_ = WIFEXITED(raw) ? WEXITSTATUS(raw) : -WTERMSIG(raw);
+  status_ = statusOf(raw);
   return status_;
+}
+
+void QVSubprocess::execute(const std::vector<std::string>& arguments,
+                           const std::map<std::string, std::string>& environment) {
+  for (const auto& [name, value] : environment) ::setenv(name.c_str(), value.c_str(), 1);
+  std::vector<char*> pointers;
+  for (const std::string& argument : arguments) {
+    pointers.push_back(const_cast<char*>(argument.c_str()));
+  }
+  pointers.push_back(nullptr);
+  ::execvp(pointers.front(), pointers.data());
+  ::_exit(127);
+}
+
+QVSubprocess::Status QVSubprocess::statusOf(int raw) {
+  return WIFEXITED(raw) ? WEXITSTATUS(raw) : -WTERMSIG(raw);
 }
 
 QVSubprocess::Output QVSubprocess::run(const std::vector<std::string>& arguments,

@@ -45,6 +45,12 @@ class QVSubprocess {
   static Output run(const std::vector<std::string>& arguments,
                     std::chrono::milliseconds limit = std::chrono::seconds(60));
 
+  // For whoever forks in another way: turns the child into the program, with those variables over
+  // the caller's own; and reads what waitpid() says of it.
+  [[noreturn]] static void execute(const std::vector<std::string>& arguments,
+                                   const std::map<std::string, std::string>& environment);
+  static Status statusOf(int raw);
+
  private:
   pid_t pid_ = -1;
   int pidDescriptor_ = -1;

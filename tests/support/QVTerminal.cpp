@@ -3,7 +3,6 @@
 #include <array>
 #include <cerrno>
 #include <csignal>
-#include <cstdlib>
 #include <stdexcept>
 
 #include <poll.h>
@@ -15,19 +14,6 @@ namespace {
 
 constexpr int kLimitMilliseconds = 60'000;
 
-[[noreturn]] void becomeChild(const QVTerminal::Options& options) {
-  for (const auto& [name, value] : options.environment) {
-    ::setenv(name.c_str(), value.c_str(), 1);
-  }
-  std::vector<char*> arguments;
-  for (const std::string& argument : options.arguments) {
-    arguments.push_back(const_cast<char*>(argument.c_str()));
-  }
-  arguments.push_back(nullptr);
-  ::execvp(arguments.front(), arguments.data());
-  ::_exit(127);
-}
-
 }  // namespace
 
 QVTerminal::QVTerminal(const Options& options) {
@@ -35,7 +21,7 @@ QVTerminal::QVTerminal(const Options& options) {
       .ws_row = options.rows, .ws_col = options.columns, .ws_xpixel = 0, .ws_ypixel = 0};
   pid_ = ::forkpty(&terminal_, nullptr, nullptr, &size);
   if (pid_ < 0) throw std::runtime_error("cannot make a terminal");
-  if (pid_ == 0) becomeChild(options);
+  if (pid_ == 0) QVSubprocess::execute(options.arguments, options.environment);
 }
 
 QVTerminal::~QVTerminal() {
@@ -82,6 +68,6 @@ std::optional<QVSubprocess::Status> QVTerminal::wait() {
   int raw = 0;
   const pid_t collected = ::waitpid(pid_, &raw, 0);
   if (collected != pid_) return std::nullopt;
-  status_ = WIFEXITED(raw) ? WEXITSTATUS(raw) : -WTERMSIG(raw);
+  status_ = QVSubprocess::statusOf(raw);
   return status_;
 }

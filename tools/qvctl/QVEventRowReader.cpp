@@ -2,7 +2,7 @@
 
 #include "platform/QVBeacon.h"
 #include "platform/QVText.h"
-#include "platform/linux/QVJSONFile.h"
+#include "platform/linux/files/QVJSONFile.h"
 
 #include <algorithm>
 #include <array>

@@ -1,6 +1,6 @@
 #include "tools/qvctl/QVProcessTable.h"
 
-#include "platform/linux/QVRegularFile.h"
+#include "platform/linux/files/QVRegularFile.h"
 
 #include <algorithm>
 #include <charconv>

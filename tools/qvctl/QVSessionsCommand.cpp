@@ -2,7 +2,7 @@
 
 #include "QVServices/Statistics/QVReportingVocabulary.h"
 #include "platform/QVText.h"
-#include "platform/linux/QVJSONFile.h"
+#include "platform/linux/files/QVJSONFile.h"
 #include "tools/qvctl/QVNames.h"
 #include "tools/qvctl/QVReadOnlyStore.h"
 #include "tools/qvctl/QVServiceConnection.h"

@@ -1,6 +1,6 @@
 #include "tools/qvctl/QVStoredEvent.h"
 
-#include "platform/linux/QVJSONFile.h"
+#include "platform/linux/files/QVJSONFile.h"
 #include "tools/qvctl/QVNames.h"
 #include "tools/qvctl/QVTimeText.h"
 

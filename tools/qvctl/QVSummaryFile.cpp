@@ -1,8 +1,8 @@
 #include "tools/qvctl/QVSummaryFile.h"
 
 #include "platform/QVText.h"
-#include "platform/linux/QVJSONFile.h"
-#include "platform/linux/QVRegularFile.h"
+#include "platform/linux/files/QVJSONFile.h"
+#include "platform/linux/files/QVRegularFile.h"
 #include "tools/qvctl/QVToolFailure.h"
 
 #include <algorithm>

@@ -49,7 +49,7 @@ class QVPlayerReport {
   void playbackStopped(const QVPlayerProgress& progress, bool completely);
   void end();
 
-  // Of this session.
+  // Of the session.
   unsigned messagesAccepted() const { return accepted_; }
   unsigned messagesLost() const { return lost_; }
 

@@ -1,6 +1,6 @@
 #include "platform/linux/tally/QVChannelConfiguration.h"
 
-#include "platform/linux/QVJSONFile.h"
+#include "platform/linux/files/QVJSONFile.h"
 
 #include <string_view>
 

@@ -1,6 +1,6 @@
 #include "platform/linux/tally/QVKernelTextSource.h"
 
-#include "platform/linux/QVRegularFile.h"
+#include "platform/linux/files/QVRegularFile.h"
 #include "platform/linux/tally/QVKernelText.h"
 
 #include <utility>

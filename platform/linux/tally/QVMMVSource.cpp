@@ -1,6 +1,6 @@
 #include "platform/linux/tally/QVMMVSource.h"
 
-#include "platform/linux/QVRegularFile.h"
+#include "platform/linux/files/QVRegularFile.h"
 #include "platform/linux/tally/QVMMVFormat.h"
 
 #include <cerrno>

@@ -1,6 +1,6 @@
 #include "tests/e2e/qvctl/QVToolTest.h"
 
-#include "platform/linux/QVJSONFile.h"
+#include "platform/linux/files/QVJSONFile.h"
 
 #include <fstream>
 #include <iterator>

@@ -4,8 +4,8 @@
 #include "platform/linux/bus/QVBusConnection.h"
 #include "platform/linux/bus/QVBusLoop.h"
 #include "platform/linux/bus/QVBusServer.h"
+#include "tests/support/QVTestMessage.h"
 #include "tests/unit/bus/QVRecordingService.h"
-#include "tests/unit/bus/QVTestMessage.h"
 
 #include <memory>
 #include <string>

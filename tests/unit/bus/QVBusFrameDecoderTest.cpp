@@ -1,6 +1,6 @@
 #include "platform/linux/bus/QVBusFrameDecoder.h"
 #include "platform/linux/bus/QVBusProtocol.h"
-#include "tests/unit/bus/QVTestMessage.h"
+#include "tests/support/QVTestMessage.h"
 
 #include <string>
 #include <string_view>

@@ -2,8 +2,8 @@
 #include "platform/linux/bus/QVBusAuthClient.h"
 #include "platform/linux/bus/QVBusListener.h"
 #include "platform/linux/bus/QVBusListeningSocket.h"
+#include "tests/support/QVTestMessage.h"
 #include "tests/unit/bus/QVRecordingService.h"
-#include "tests/unit/bus/QVTestMessage.h"
 
 #include <array>
 #include <atomic>

@@ -1,5 +1,5 @@
 #include "platform/linux/bus/QVBusMessage.h"
-#include "tests/unit/bus/QVTestMessage.h"
+#include "tests/support/QVTestMessage.h"
 
 #include <string>
 #include <string_view>
@@ -25,11 +25,11 @@ std::string faultOf(const std::string& bytes) {
 }
 
 std::string field(uint8_t code, std::string_view type, std::string_view value, char order = 'l') {
-  return QVTestWire(order).u8(code).signature(type).string(value).bytes;
+  return QVTestWire(order).field(code, type, value).bytes;
 }
 
 std::string numberField(uint8_t code, uint32_t value, char order = 'l') {
-  return QVTestWire(order).u8(code).signature("u").u32(value).bytes;
+  return QVTestWire(order).field(code, value).bytes;
 }
 
 QVTestMessage bare(uint8_t type, std::string moreFields) {

@@ -1,6 +1,6 @@
 #include "platform/linux/bus/QVBusReader.h"
 #include "platform/linux/bus/QVBusValueDecoder.h"
-#include "tests/unit/bus/QVTestWire.h"
+#include "tests/support/QVTestWire.h"
 
 #include <string>
 #include <string_view>

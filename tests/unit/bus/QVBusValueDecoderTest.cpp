@@ -1,7 +1,8 @@
 #include "platform/QVText.h"
+#include "platform/fake/QVFakeMemoryCharge.h"
 #include "platform/linux/bus/QVBusValueDecoder.h"
 #include "platform/linux/bus/QVBusWriter.h"
-#include "tests/unit/bus/QVTestWire.h"
+#include "tests/support/QVTestWire.h"
 
 #include <limits>
 #include <string>
@@ -9,13 +10,6 @@
 #include <gtest/gtest.h>
 
 namespace {
-
-class CountingCharge final : public QVMemoryCharge {
- public:
-  void add(std::size_t bytes) noexcept override { held += bytes; }
-  void remove(std::size_t bytes) noexcept override { held -= bytes; }
-  std::size_t held = 0;
-};
 
 // A dictionary of what `entries` writes, taken in.
 template <class Entries>
@@ -167,7 +161,7 @@ TEST(QVBusValueDecoder, ForgetsARefusalWithTheNextDictionary) {
 }
 
 TEST(QVBusValueDecoder, OwnsWhatItMadeAndChargesIt) {
-  CountingCharge charge;
+  QVFakeMemoryCharge charge;
   QVDictionary dictionary;
   {
     std::string bytes = [] {
@@ -183,14 +177,14 @@ TEST(QVBusValueDecoder, OwnsWhatItMadeAndChargesIt) {
     std::fill(bytes.begin(), bytes.end(), '\xff');
   }
   EXPECT_EQ(QVText(dictionary), R"({"key":"a value of some length","list":["item"]})");
-  EXPECT_EQ(charge.held, dictionary.footprint());
-  EXPECT_GT(charge.held, 0U);
+  EXPECT_EQ(charge.held(), dictionary.footprint());
+  EXPECT_GT(charge.held(), 0U);
   dictionary = {};
-  EXPECT_EQ(charge.held, 0U);
+  EXPECT_EQ(charge.held(), 0U);
 }
 
 TEST(QVBusValueDecoder, ChargesNothingForWhatIsBroken) {
-  CountingCharge charge;
+  QVFakeMemoryCharge charge;
   QVTestWire wire;
   wire.array(8, [](QVTestWire& entries) {
     entries.entry("key", "s").string("value");
@@ -200,7 +194,7 @@ TEST(QVBusValueDecoder, ChargesNothingForWhatIsBroken) {
   QVBusValueDecoder decoder;
   EXPECT_TRUE(decoder.readDictionary(reader, &charge).isAbsent());
   EXPECT_FALSE(reader.ok());
-  EXPECT_EQ(charge.held, 0U);
+  EXPECT_EQ(charge.held(), 0U);
 }
 
 TEST(QVBusValueDecoder, TakesInWhatTheWriterMade) {

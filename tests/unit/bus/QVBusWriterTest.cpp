@@ -1,6 +1,6 @@
 #include "platform/linux/bus/QVBusMessage.h"
 #include "platform/linux/bus/QVBusWriter.h"
-#include "tests/unit/bus/QVTestMessage.h"
+#include "tests/support/QVTestMessage.h"
 
 #include <string>
 

@@ -1,9 +1,6 @@
 // The reporting switch, as a reporter goes by it.
 
-#include "client/QVReportingPreference.h"
 #include "client/QVReportingSwitch.h"
-#include "platform/QVPreferences.h"
-#include "platform/linux/QVJSONFile.h"
 #include "tests/unit/client/QVReporterFixture.h"
 
 #include <array>
@@ -70,60 +67,6 @@ TEST_F(QVReporterSwitchTest, DropsWhatIsQueued) {
   EXPECT_EQ(serve(*service), "stop 7");
 }
 
-TEST_F(QVReporterSwitchTest, ReadsWhatTheServiceReads) {
-  const auto byService = [](const std::string& text) {
-    QVJSONFailure failure;
-    const auto value = QVJSONFile::parse(text, failure);
-    return value && value->kind() == QVValue::Kind::dictionary &&
-           QVPreferences::booleanReading(value->dictionary().find("disable_reporting"));
-  };
-  const std::string key = R"("disable_reporting": )";
-  int off = 0;
-  for (const std::string value :
-       {"true",        "false",       "null",        "1",
-        "0",           "-0.5",        "0.0",         "-0",
-        "1e300",       "1e-300",      "1e-400",      "1e400",
-        "0.0001e-320", "1000e-330",   "9e999999",    "1e-999999",
-        "\"true\"",    "\"TRUE\"",    "\"yes\"",     "\"Yes\"",
-        "\"1\"",       "\"on\"",      "\"2\"",       "\"\"",
-        "[true]",      "{\"a\":1}",   "[]",          "yes",
-        "tru",         "\"\\uDC00\"", "\"\\u0031\"", "18446744073709551616",
-        "0x1",         "+1",          "01"}) {
-    for (const std::string& text :
-         {"{" + key + value + "}", "{" + key + value + ", " + key + "false}",
-          "{" + key + "true, " + key + value + "}", "{\"a\": {" + key + value + "}}",
-          "{\"a\": [1, {" + key + "true}], " + key + value + "}", "[{" + key + value + "}]",
-          "{" + key + value + "} {}", "{" + key + value + "}" + std::string(1, '\0'),
-          "{" + key + value + ", \"b\": \"\xff\"}", value}) {
-      EXPECT_EQ(QVReportingIsSwitchedOff(text), byService(text)) << text;
-      off += byService(text) ? 1 : 0;
-    }
-  }
-  EXPECT_GT(off, 30);
-  for (const int depth : {62, 63, 64, 65}) {
-    std::string text = "{\"a\": ";
-    for (int i = 0; i < depth; ++i) text += '[';
-    for (int i = 0; i < depth; ++i) text += ']';
-    text += ", " + key + "true}";
-    EXPECT_EQ(QVReportingIsSwitchedOff(text), byService(text)) << depth;
-  }
-}
-
-TEST_F(QVReporterSwitchTest, IsOnWhereTheFileIsNone) {
-  const std::string path = root_.configuration() / "file";
-  EXPECT_FALSE(QVReportingIsSwitchedOffByFile(path));
-  std::filesystem::create_directory(path);
-  EXPECT_FALSE(QVReportingIsSwitchedOffByFile(path));
-  std::filesystem::remove(path);
-  ASSERT_EQ(::mkfifo(path.c_str(), 0600), 0);
-  EXPECT_FALSE(QVReportingIsSwitchedOffByFile(path));
-  std::filesystem::remove(path);
-  root_.configure("file", R"({"disable_reporting": true})");
-  EXPECT_TRUE(QVReportingIsSwitchedOffByFile(path));
-  root_.configure("file", R"({"disable_reporting": true})" + std::string(4 << 20, ' '));
-  EXPECT_FALSE(QVReportingIsSwitchedOffByFile(path));
-}
-
 // The switch by itself, whose news the test takes in.
 class QVReportingSwitchTest : public QVReporterFixture {
  protected:
@@ -136,11 +79,64 @@ class QVReportingSwitchTest : public QVReporterFixture {
     ASSERT_GT(::poll(&entry, 1, static_cast<int>(kPatience.count())), 0) << "no news";
     reportingSwitch.readNews();
   }
-  void configureOff(bool off) const {
-    root_.configure("preferences/net.quillon.quietvox.json",
-                    off ? R"({"disable_reporting": true})" : "{}");
+  void configure(const std::string& text) const {
+    root_.configure("preferences/net.quillon.quietvox.json", text);
+  }
+  void configureOff(bool off) const { configure(off ? R"({"disable_reporting": true})" : "{}"); }
+  bool isOffBy(const std::string& text) const {
+    configure(text);
+    return makeSwitch().isOff();
   }
 };
+
+TEST_F(QVReportingSwitchTest, IsReadAsTheServiceReadsIt) {
+  for (const char* text :
+       {R"({"disable_reporting": true})", R"({"disable_reporting": -0.5})",
+        R"({"disable_reporting": "Yes"})", R"({"a": [1], "disable_reporting": "\u0031"})",
+        R"({"disable_reporting": false, "disable_reporting": true})"}) {
+    EXPECT_TRUE(isOffBy(text)) << text;
+  }
+  for (const char* text :
+       {"{}", R"({"disable_reporting": false})", R"({"disable_reporting": 1e-400})",
+        R"({"disable_reporting": "on"})", R"({"disable_reporting": [true]})",
+        R"({"disable_reporting": null})", R"({"a": {"disable_reporting": true}})",
+        R"({"disable_reporting": true, "disable_reporting": false})"}) {
+    EXPECT_FALSE(isOffBy(text)) << text;
+  }
+}
+
+TEST_F(QVReportingSwitchTest, IsOnWhereTheTextIsNoPreferences) {
+  const std::string object = R"({"disable_reporting": true})";
+  ASSERT_TRUE(isOffBy(object));
+  for (const std::string& text : {std::string(), '[' + object + ']', object + " {}", object + '\0',
+                                  std::string(R"({"disable_reporting": true, "a": "\udc00"})"),
+                                  std::string(R"({"disable_reporting": true, "a": 1e400})"),
+                                  std::string("{\"disable_reporting\": true, \"a\": \"\xff\"}")}) {
+    EXPECT_FALSE(isOffBy(text)) << text;
+  }
+  const auto beside = [](std::size_t depth) {
+    return R"({"disable_reporting": true, "a": )" + std::string(depth, '[') +
+           std::string(depth, ']') + '}';
+  };
+  EXPECT_TRUE(isOffBy(beside(63)));
+  EXPECT_FALSE(isOffBy(beside(64)));
+  const std::size_t limit = std::size_t{4} << 20;
+  EXPECT_TRUE(isOffBy(object + std::string(limit - object.size(), ' ')));
+  EXPECT_FALSE(isOffBy(object + std::string(limit + 1 - object.size(), ' ')));
+}
+
+TEST_F(QVReportingSwitchTest, IsOnWhereTheFileIsNone) {
+  configureOff(true);
+  const std::filesystem::path file =
+      root_.configuration() / "preferences" / "net.quillon.quietvox.json";
+  ASSERT_TRUE(std::filesystem::remove(file));
+  EXPECT_FALSE(makeSwitch().isOff());
+  std::filesystem::create_directory(file);
+  EXPECT_FALSE(makeSwitch().isOff());
+  std::filesystem::remove(file);
+  ASSERT_EQ(::mkfifo(file.c_str(), 0600), 0);
+  EXPECT_FALSE(makeSwitch().isOff()) << "and does not wait for a writer";
+}
 
 TEST_F(QVReportingSwitchTest, IsReadWhenItsNotificationIsPosted) {
   QVReportingSwitch reportingSwitch = makeSwitch();

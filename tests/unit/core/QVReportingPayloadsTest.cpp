@@ -1,4 +1,5 @@
 #include "QVServices/Statistics/Service/QVReportingPayloads.h"
+#include "platform/fake/QVFakeMemoryCharge.h"
 
 #include <string>
 #include <vector>
@@ -60,22 +61,15 @@ TEST(QVReportingNormalisedPayload, HandlesManyKeys) {
   }
 }
 
-class Charge final : public QVMemoryCharge {
- public:
-  void add(std::size_t bytes) noexcept override { held += bytes; }
-  void remove(std::size_t bytes) noexcept override { held -= bytes; }
-  std::size_t held = 0;
-};
-
 TEST(QVReportingNormalisedPayload, IsChargedToWhomTheMessageIs) {
-  Charge charge;
+  QVFakeMemoryCharge charge;
   {
     std::vector<QVDictionaryEntry> entries{{"a b", "text"}};
     const QVDictionary message = QVDictionary::assemble(entries, &charge);
     const QVDictionary payload = QVReportingNormalisedPayload(message);
-    EXPECT_EQ(charge.held, message.footprint() + payload.footprint());
+    EXPECT_EQ(charge.held(), message.footprint() + payload.footprint());
   }
-  EXPECT_EQ(charge.held, 0u);
+  EXPECT_EQ(charge.held(), 0u);
 }
 
 }  // namespace

@@ -1,4 +1,5 @@
 #include "platform/fake/QVFakeClock.h"
+#include "platform/fake/QVFakeMemoryCharge.h"
 #include "platform/fake/QVFakeProcess.h"
 #include "platform/fake/QVFakeRandom.h"
 #include "platform/fake/QVFakeTracePoints.h"
@@ -67,6 +68,27 @@ TEST(QVFakeRandomDeathTest, RefusesAScriptBeyondTheBound) {
   QVFakeRandom random;
   random.script({59});
   EXPECT_DEATH(random.uniform(59), "scripted 59 is not below the bound 59");
+}
+
+TEST(QVFakeMemoryChargeTest, AddsUpWhatIsHeld) {
+  QVFakeMemoryCharge charge;
+  charge.add(5);
+  charge.add(2);
+  charge.remove(5);
+  EXPECT_EQ(charge.held(), 2U);
+  charge.remove(2);
+  EXPECT_EQ(charge.held(), 0U);
+}
+
+TEST(QVFakeMemoryChargeDeathTest, RefusesToRemoveMoreOrLessThanWasAdded) {
+  EXPECT_DEATH(
+      {
+        QVFakeMemoryCharge charge;
+        charge.add(5);
+        charge.remove(6);
+      },
+      "6 bytes removed of 5");
+  EXPECT_DEATH(QVFakeMemoryCharge().add(5), "ended with 5 bytes");
 }
 
 }  // namespace

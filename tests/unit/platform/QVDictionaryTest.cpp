@@ -1,4 +1,5 @@
 #include "platform/QVValue.h"
+#include "platform/fake/QVFakeMemoryCharge.h"
 
 #include <algorithm>
 #include <cstdint>
@@ -21,17 +22,6 @@ std::vector<std::string> keysOf(const QVDictionary& dictionary) {
   for (const auto& entry : dictionary) keys.emplace_back(entry.key);
   return keys;
 }
-
-// Adds up what dictionaries charge to it.
-class Charge final : public QVMemoryCharge {
- public:
-  void add(std::size_t bytes) noexcept override { held_ += bytes; }
-  void remove(std::size_t bytes) noexcept override { held_ -= bytes; }
-  std::size_t held() const { return held_; }
-
- private:
-  std::size_t held_ = 0;
-};
 
 TEST(QVDictionary, IteratesInAscendingByteOrderOfTheKey) {
   const QVDictionary dictionary{{"b", 1},   {"B", 2}, {"ä", 3}, {"a b", 4},
@@ -154,7 +144,7 @@ TEST(QVDictionary, MergesIntoSomethingSelfContained) {
 }
 
 TEST(QVDictionary, ChargesItsBytesUntilTheLastHandleGoes) {
-  Charge charge;
+  QVFakeMemoryCharge charge;
   {
     std::vector<QVDictionaryEntry> entries{{"key", "value"}, {"nested", QVArray{"some text"}}};
     QVDictionary dictionary = QVDictionary::assemble(entries, &charge);
@@ -169,7 +159,7 @@ TEST(QVDictionary, ChargesItsBytesUntilTheLastHandleGoes) {
 }
 
 TEST(QVDictionary, ChargesAMergeAsItsBaseElseAsWhatIsAdded) {
-  Charge charge;
+  QVFakeMemoryCharge charge;
   {
     std::vector<QVDictionaryEntry> entries{{"a", "text"}};
     const QVDictionary base = QVDictionary::assemble(entries, &charge);
@@ -192,7 +182,7 @@ TEST(QVDictionary, CountsItsContentsInItsFootprint) {
 }
 
 TEST(QVDictionary, IsSharedByThreadsWithoutLocks) {
-  Charge charge;
+  QVFakeMemoryCharge charge;
   {
     std::vector<QVDictionaryEntry> entries{{"text", "of all threads"}, {"number", 1}};
     QVDictionary shared = QVDictionary::assemble(entries, &charge);

@@ -38,6 +38,19 @@ class QVEventStoreFileTest : public QVStoreFixture {
     }
     return names;
   }
+  // The superuser may write anywhere, so somebody else is who asks.
+  std::optional<QVArray> findBackendsAsNobody() {
+    constexpr uid_t kNobody = 65534;
+    const uid_t before = geteuid();
+    if (before == 0) {
+      EXPECT_EQ(seteuid(kNobody), 0);
+    }
+    auto backends = findBackends();
+    if (before == 0) {
+      EXPECT_EQ(seteuid(before), 0);
+    }
+    return backends;
+  }
 };
 
 TEST_F(QVEventStoreFileTest, HasTheTablesThatOtherProgramsRead) {
@@ -203,18 +216,9 @@ TEST_F(QVEventStoreFileTest, DoesNotCountUnwantedEventsAsLost) {
 }
 
 TEST_F(QVEventStoreFileTest, CannotUseADirectoryThatItMayNotWriteTo) {
-  // The superuser may write anywhere, so somebody else is who asks.
-  constexpr uid_t kNobody = 65534;
-  const uid_t before = geteuid();
   std::filesystem::permissions(root_.path(), std::filesystem::perms(0755));
   std::filesystem::permissions(root_.state(), std::filesystem::perms(0555));
-  if (before == 0) {
-    ASSERT_EQ(seteuid(kNobody), 0);
-  }
-  EXPECT_EQ(findBackends(), std::nullopt);
-  if (before == 0) {
-    ASSERT_EQ(seteuid(before), 0);
-  }
+  EXPECT_EQ(findBackendsAsNobody(), std::nullopt);
   EXPECT_THAT(lines(QVLogLevel::error),
               ElementsAre("the event store " + path() +
                           " cannot be opened: its directory: Permission denied"));
@@ -225,18 +229,10 @@ TEST_F(QVEventStoreFileTest, CannotUseAFileThatItMayNotWriteTo) {
   sendSingle({});
   close();
   restart();
-  constexpr uid_t kNobody = 65534;
-  const uid_t before = geteuid();
   std::filesystem::permissions(root_.path(), std::filesystem::perms(0755));
   std::filesystem::permissions(root_.state(), std::filesystem::perms(0777));
   std::filesystem::permissions(path(), std::filesystem::perms(0444));
-  if (before == 0) {
-    ASSERT_EQ(seteuid(kNobody), 0);
-  }
-  EXPECT_EQ(findBackends(), std::nullopt);
-  if (before == 0) {
-    ASSERT_EQ(seteuid(before), 0);
-  }
+  EXPECT_EQ(findBackendsAsNobody(), std::nullopt);
   EXPECT_THAT(lines(QVLogLevel::error),
               ElementsAre("the event store " + path() + " cannot be opened: it cannot be written"));
 }

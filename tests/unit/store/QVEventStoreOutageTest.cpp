@@ -1,3 +1,4 @@
+#include "platform/fake/QVFakeMemoryCharge.h"
 #include "platform/linux/QVEventStoreError.h"
 #include "platform/linux/QVSQLiteDatabase.h"
 #include "tests/unit/store/QVFaultyFileSystem.h"
@@ -112,15 +113,7 @@ TEST_F(QVEventStoreOutageTest, GivesUpTheOldestAndCountsThem) {
 }
 
 TEST_F(QVEventStoreOutageTest, LetsGoOfWhatItGivesUp) {
-  class Charge : public QVMemoryCharge {
-   public:
-    void add(std::size_t bytes) noexcept override { bytes_ += bytes; }
-    void remove(std::size_t bytes) noexcept override { bytes_ -= bytes; }
-    std::size_t bytes() const { return bytes_; }
-
-   private:
-    std::atomic<std::size_t> bytes_{0};
-  } charge;
+  QVFakeMemoryCharge charge;
   options_.heldBytes = 100'000;
   const auto session = openSession();
   ASSERT_EQ(flush(*session), std::nullopt);
@@ -132,10 +125,10 @@ TEST_F(QVEventStoreOutageTest, LetsGoOfWhatItGivesUp) {
   }
   expectOutage(*session);
   awaitWriter();
-  EXPECT_LE(charge.bytes(), 100'000U);
-  EXPECT_GT(charge.bytes(), 50'000U);
+  EXPECT_LE(charge.held(), 100'000U);
+  EXPECT_GT(charge.held(), 50'000U);
   restart();
-  EXPECT_EQ(charge.bytes(), 0U);
+  EXPECT_EQ(charge.held(), 0U);
 }
 
 TEST_F(QVEventStoreOutageTest, CountsByTheCauseOfTheOutage) {

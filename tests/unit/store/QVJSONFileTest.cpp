@@ -1,4 +1,4 @@
-#include "platform/linux/QVJSONFile.h"
+#include "platform/linux/files/QVJSONFile.h"
 #include "tests/support/QVTemporaryRoot.h"
 
 #include <cmath>

@@ -1,5 +1,5 @@
-#include "platform/linux/QVJSONFile.h"
 #include "platform/linux/QVRapidJSONOutput.h"
+#include "platform/linux/files/QVJSONFile.h"
 
 #include <algorithm>
 #include <string>

@@ -1,3 +1,4 @@
+#include "platform/fake/QVFakeMemoryCharge.h"
 #include "platform/linux/QVEventStoreError.h"
 #include "tests/unit/store/QVStoreFixture.h"
 
@@ -268,15 +269,7 @@ TEST_F(QVSQLiteEventStoreTest, OutlivesAPayloadCallbackThatThrows) {
 }
 
 TEST_F(QVSQLiteEventStoreTest, LetsGoOfPayloadsOnceTheyAreCommitted) {
-  class Charge : public QVMemoryCharge {
-   public:
-    void add(std::size_t bytes) noexcept override { bytes_ += bytes; }
-    void remove(std::size_t bytes) noexcept override { bytes_ -= bytes; }
-    std::size_t bytes() const { return bytes_; }
-
-   private:
-    std::atomic<std::size_t> bytes_{0};
-  } charge;
+  QVFakeMemoryCharge charge;
   const auto session = openSession();
   for (int i = 0; i < 100; ++i) {
     std::vector<QVDictionaryEntry> entries{{"n", i}, {"text", "something"}};
@@ -285,10 +278,10 @@ TEST_F(QVSQLiteEventStoreTest, LetsGoOfPayloadsOnceTheyAreCommitted) {
     sendCountwise("event", payload.merging({{"HostApplicationDisplayID", "Unknown"}}));
     sendSingle(payload);
   }
-  EXPECT_GT(charge.bytes(), 0U);
+  EXPECT_GT(charge.held(), 0U);
   flushAll();
   awaitWriter();
-  EXPECT_EQ(charge.bytes(), 0U);
+  EXPECT_EQ(charge.held(), 0U);
 }
 
 TEST_F(QVSQLiteEventStoreTest, CutsNamesThatEachMessageWouldRepeat) {

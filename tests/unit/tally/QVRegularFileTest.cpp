@@ -1,6 +1,6 @@
 // How files of others are read: what it costs, and that nothing of them is missed.
 
-#include "platform/linux/QVRegularFile.h"
+#include "platform/linux/files/QVRegularFile.h"
 #include "tests/support/QVTemporaryRoot.h"
 
 #include <cstdint>

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "tests/unit/bus/QVTestWire.h"
+#include "tests/support/QVTestWire.h"
 
 #include <cstdint>
 #include <string>
@@ -26,20 +26,14 @@ struct QVTestMessage {
     wire.u8(static_cast<uint8_t>(order)).u8(type).u8(flags).u8(version);
     wire.u32(static_cast<uint32_t>(body.size())).u32(serial);
     wire.array(8, [this](QVTestWire& fields) {
-      text(fields, 1, "o", path);
-      text(fields, 2, "s", interface);
-      text(fields, 3, "s", member);
-      text(fields, 6, "s", destination);
-      if (!signature.empty()) fields.align(8).u8(8).signature("g").signature(signature);
+      if (!path.empty()) fields.field(1, "o", path);
+      if (!interface.empty()) fields.field(2, "s", interface);
+      if (!member.empty()) fields.field(3, "s", member);
+      if (!destination.empty()) fields.field(6, "s", destination);
+      if (!signature.empty()) fields.field(8, "g", signature);
       if (!moreFields.empty()) fields.align(8).raw(moreFields);
     });
     return wire.align(8).bytes + body;
-  }
-
- private:
-  static void text(QVTestWire& fields, uint8_t code, std::string_view type,
-                   const std::string& value) {
-    if (!value.empty()) fields.align(8).u8(code).signature(type).string(value);
   }
 };
 

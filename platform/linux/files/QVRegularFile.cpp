@@ -1,4 +1,4 @@
-#include "platform/linux/QVRegularFile.h"
+#include "platform/linux/files/QVRegularFile.h"
 
 #include "platform/QVText.h"
 

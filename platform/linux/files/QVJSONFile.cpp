@@ -1,21 +1,22 @@
-#include "platform/linux/QVJSONFile.h"
+#include "platform/linux/files/QVJSONFile.h"
 
 #include "platform/QVText.h"
-#include "platform/linux/QVRegularFile.h"
+#include "platform/linux/files/QVRegularFile.h"
 
 #include <algorithm>
 #include <cerrno>
 #include <charconv>
 #include <cmath>
 #include <cstdint>
-#include <cstdlib>
 #include <system_error>
 #include <utility>
 #include <vector>
 
+#include <locale.h>
 #include <rapidjson/error/en.h>
 #include <rapidjson/memorystream.h>
 #include <rapidjson/reader.h>
+#include <stdlib.h>
 
 namespace {
 
@@ -31,8 +32,10 @@ QVValue number(std::string_view text) {
   }
   double real = 0;
   if (std::from_chars(text.data(), end, real).ec == std::errc()) return real;
-  // Too large or too small. The service keeps the locale in which a point is a point.
-  real = std::strtod(std::string(text).c_str(), nullptr);
+  // Too large or too small, wherever the program's locale has its point. This locale needs no
+  // memory.
+  static const locale_t plain = ::newlocale(LC_ALL_MASK, "C", nullptr);
+  real = ::strtod_l(std::string(text).c_str(), nullptr, plain);
   return std::isfinite(real) ? QVValue(real) : QVValue();
 }
 
