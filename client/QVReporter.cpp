@@ -43,7 +43,7 @@ QVClientResult<std::unique_ptr<QVReporter>> QVReporter::open(QVReporterOptions o
   }
   try {
     auto core = std::make_shared<QVReporterCore>(std::move(options));
-    if (!core->bell.isOpen() || core->reportingSwitch.descriptor() < 0) {
+    if (!core->bell.isOpen()) {
       return QVClientError(Code::cannotConnect, "no descriptors left for the reporter");
     }
     std::unique_ptr<QVReporter> reporter(new QVReporter(core));
@@ -116,6 +116,10 @@ QVClientError::Code QVReporter::flush(std::chrono::milliseconds timeLimit) {
 
 bool QVReporter::isReportingEnabled() const noexcept {
   return !core_->isReportingOff();
+}
+
+QVClientError QVReporter::connectionError() const {
+  return core_->connection.error();
 }
 
 QVReporterCounters QVReporter::counters() const {

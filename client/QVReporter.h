@@ -61,6 +61,10 @@ class QV_CLIENT_API QVReporter {
   // What the reporting switch says, as it was last read.
   bool isReportingEnabled() const noexcept;
   QVReporterCounters counters() const;
+  // What keeps it from the service, as a socket that this program may not open: what the last
+  // attempt to connect said, or the loss of the connection. No error while there is a connection,
+  // and before one was needed.
+  QVClientError connectionError() const;
 
  private:
   explicit QVReporter(std::shared_ptr<QVReporterCore> core);

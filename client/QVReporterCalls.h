@@ -82,7 +82,7 @@ class QVReporterCalls {
   bool isAnswered_ = false;
   bool isRestored_ = true;
   bool polls_ = false;
-  std::size_t turn_ = 0;  // 0: the queue's, else a real-time queue's
+  std::size_t turn_ = 0;              // 0: the queue's, else a real-time queue's
   uint64_t markedStep_ = UINT64_MAX;  // the record that rings were last marked for
   uint64_t issued_ = 0;
   uint64_t answered_ = 0;

@@ -4,6 +4,7 @@
 #include "client/QVClientPayload.h"
 #include "client/QVClientThread.h"
 #include "client/QVRealtimeRings.h"
+#include "client/QVReporterConnection.h"
 #include "client/QVReporterFlushes.h"
 #include "client/QVReporterLedger.h"
 #include "client/QVReporterOptions.h"
@@ -41,6 +42,7 @@ struct QVReporterCore {
   QVReporterSessions sessions;
   QVRealtimeRings rings;
   QVReporterFlushes flushes;
+  QVReporterConnection connection;
   // Started, joined or detached by the reporter.
   QVClientThread thread;
   std::atomic<std::thread::id> threadID{};  // while it runs

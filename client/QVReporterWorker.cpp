@@ -83,10 +83,14 @@ void QVReporterWorker::connect(TimePoint now) {
   QVClientOptions options;
   options.socketPath = core_.options.socketPath;
   options.callbacks = QVClientOptions::Callbacks::pollLoop;
-  options.connectionLost = [this](const QVClientError&) { calls_.lose(); };
+  options.connectionLost = [this](const QVClientError& error) {
+    core_.connection.setError(error);
+    calls_.lose();
+  };
   options.connectTimeLimit = kConnectTimeLimit;
   options.maximumQueuedBytes = kConnectionBytes;
   auto connected = QVClient::connect(std::move(options));
+  core_.connection.setError(connected.error());
   if (!connected) {
     delay_.failed(now);
     return;

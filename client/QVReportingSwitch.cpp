@@ -3,12 +3,13 @@
 #include "platform/QVPreferences.h"
 #include "platform/linux/files/QVJSONFile.h"
 
+#include <algorithm>
 #include <array>
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
 #include <string_view>
-#include <utility>
+#include <system_error>
 
 #include <sys/inotify.h>
 #include <unistd.h>
@@ -21,17 +22,27 @@ constexpr std::string_view kNotifications = "notify";
 constexpr std::string_view kNotification = "net.quillon.quietvox.reporting";
 
 constexpr uint32_t kPosts = IN_CREATE | IN_ATTRIB | IN_MODIFY | IN_CLOSE_WRITE | IN_MOVED_TO;
+constexpr uint32_t kAppearances = IN_CREATE | IN_ATTRIB | IN_MOVED_TO;
 constexpr uint32_t kGone = IN_DELETE_SELF | IN_MOVE_SELF | IN_IGNORED | IN_UNMOUNT;
 
 // Bytes; holds some hundred events.
 constexpr std::size_t kBufferBytes = std::size_t{16} << 10;
 
+std::vector<std::filesystem::path> levelsOf(const std::filesystem::path& directory) {
+  std::error_code withoutCurrentDirectory;
+  std::filesystem::path level = std::filesystem::absolute(directory, withoutCurrentDirectory);
+  std::vector<std::filesystem::path> levels{level};
+  for (; level.has_relative_path(); levels.push_back(level)) level = level.parent_path();
+  std::ranges::reverse(levels);
+  return levels;
+}
+
 }  // namespace
 
 QVReportingSwitch::QVReportingSwitch(const std::string& configurationDirectory,
-                                     std::string runtimeDirectory)
+                                     const std::string& runtimeDirectory)
     : preferences_(configurationDirectory + kPreferences),
-      runtimeDirectory_(std::move(runtimeDirectory)),
+      levels_(levelsOf(std::filesystem::path(runtimeDirectory) / kNotifications)),
       inotify_(inotify_init1(IN_CLOEXEC | IN_NONBLOCK)) {
   // In this order: a post in between is a second reading.
   watch();
@@ -46,29 +57,35 @@ void QVReportingSwitch::readPreference() {
                std::memory_order_relaxed);
 }
 
-int QVReportingSwitch::add(const std::string& directory) const {
-  return inotify_add_watch(inotify_.get(), directory.c_str(), kPosts | kGone | IN_ONLYDIR);
+int QVReportingSwitch::add(std::size_t level) const {
+  const bool isLast = level + 1 == levels_.size();
+  return inotify_add_watch(inotify_.get(), levels_[level].c_str(),
+                           (isLast ? kPosts : kAppearances) | kGone | IN_ONLYDIR);
+}
+
+void QVReportingSwitch::remove(int watch) const {
+  static_cast<void>(inotify_rm_watch(inotify_.get(), watch));
 }
 
 void QVReportingSwitch::watch() {
-  const std::string notifications = runtimeDirectory_ + '/' + std::string(kNotifications);
-  watched_ = Watched::notifications;
-  watch_ = add(notifications);
-  if (watch_ >= 0) return;
-  const int above = add(runtimeDirectory_);
-  // It may have been made in between.
-  watch_ = add(notifications);
-  if (watch_ < 0) {
-    watch_ = above;
-    watched_ = above >= 0 ? Watched::runtimeDirectory : Watched::nothing;
-  } else if (above >= 0) {
-    static_cast<void>(inotify_rm_watch(inotify_.get(), above));
+  watch_ = -1;
+  for (level_ = levels_.size(); level_ > 0; --level_) {
+    watch_ = add(level_ - 1);
+    if (watch_ >= 0) break;
+  }
+  // What was missing may have been made in between.
+  while (watch_ >= 0 && !hearsPosts()) {
+    const int below = add(level_);
+    if (below < 0) break;
+    if (below != watch_) remove(watch_);
+    watch_ = below;
+    ++level_;
   }
 }
 
 void QVReportingSwitch::lookAgain() {
-  if (watched_ == Watched::notifications) return;
-  if (watch_ >= 0) static_cast<void>(inotify_rm_watch(inotify_.get(), watch_));
+  if (hearsPosts()) return;
+  if (watch_ >= 0) remove(watch_);
   watch();
   readPreference();
 }
@@ -91,15 +108,15 @@ void QVReportingSwitch::readNews() {
       if (event.wd != watch_) continue;
       if ((event.mask & kGone) != 0) {
         isAnew = true;
-      } else if (watched_ == Watched::notifications) {
+      } else if (hearsPosts()) {
         isNews = isNews || name == kNotification;
       } else {
-        isAnew = isAnew || name == kNotifications;
+        isAnew = isAnew || name == levels_[level_].filename();
       }
     }
   }
   if (isAnew) {
-    watched_ = Watched::nothing;
+    level_ = 0;
     lookAgain();
   } else if (isNews) {
     readPreference();

@@ -165,6 +165,18 @@ int quietvox_reporter_counters(QuietVoxReporter* reporter, QuietVoxCounters* cou
   return QUIETVOX_OK;
 }
 
+int quietvox_reporter_connection_error(const QuietVoxReporter* reporter, char* text, size_t bytes) {
+  if (reporter == nullptr) return QUIETVOX_ERROR_INVALID_ARGUMENT;
+  if (text != nullptr && bytes != 0) *text = '\0';
+  return guarded([reporter, text, bytes] {
+    const QVClientError error = QVFromHandle(reporter)->connectionError();
+    if (text != nullptr && bytes != 0) {
+      text[error.text().copy(text, bytes - 1)] = '\0';
+    }
+    return QVToErrorNumber(error.code());
+  });
+}
+
 int quietvox_reporter_is_reporting_enabled(const QuietVoxReporter* reporter) {
   if (reporter == nullptr) return QUIETVOX_ERROR_INVALID_ARGUMENT;
   return QVFromHandle(reporter)->isReportingEnabled() ? 1 : 0;

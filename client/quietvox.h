@@ -53,6 +53,12 @@ QV_CLIENT_API int quietvox_reporter_flush(QuietVoxReporter* reporter, uint32_t m
 // not set.
 QV_CLIENT_API int quietvox_reporter_counters(QuietVoxReporter* reporter,
                                              QuietVoxCounters* counters);
+// What keeps the reporter from the service, as a socket that this program may not open: what the
+// last attempt to connect said, or the loss of the connection; OK while there is a connection, and
+// before one was needed. Writes what happened, for people, into `text` where it is not null: ended
+// by NUL, cut to `bytes`.
+QV_CLIENT_API int quietvox_reporter_connection_error(const QuietVoxReporter* reporter, char* text,
+                                                     size_t bytes);
 // [rt] 1 or 0: what the reporting switch says, as it was last read; an error for a null handle.
 QV_CLIENT_API int quietvox_reporter_is_reporting_enabled(const QuietVoxReporter* reporter);
 // Sends a message to every started session of every program, as quietvox_session_send().

@@ -3,8 +3,7 @@
 int main(void) {
   QuietVoxReporter* reporter = NULL;
   QuietVoxSession* session = NULL;
-  const int error = quietvox_reporter_open(NULL, &reporter);
-  if (error != QUIETVOX_OK) return 1;  // quietvox_error_text(error) says why
+  if (quietvox_reporter_open(NULL, &reporter) != QUIETVOX_OK) return 1;
   quietvox_session_open(reporter, 0, QUIETVOX_SERVICE_LONGFORMAUDIO, &session);
   quietvox_session_start(session);
   QuietVoxPayload* const message = quietvox_payload_new();
@@ -14,6 +13,8 @@ int main(void) {
                         QUIETVOX_TYPE_START);
   quietvox_payload_free(message);
   quietvox_session_destroy(session);
+  // Where it is not OK, quietvox_reporter_connection_error() says why.
+  const int error = quietvox_reporter_flush(reporter, 5000);
   quietvox_reporter_close(reporter);
-  return 0;
+  return error == QUIETVOX_OK ? 0 : 1;
 }

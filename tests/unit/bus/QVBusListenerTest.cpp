@@ -2,6 +2,7 @@
 #include "platform/linux/bus/QVBusAuthClient.h"
 #include "platform/linux/bus/QVBusListener.h"
 #include "platform/linux/bus/QVBusListeningSocket.h"
+#include "tests/support/QVDescriptorLimit.h"
 #include "tests/support/QVTestMessage.h"
 #include "tests/unit/bus/QVRecordingService.h"
 
@@ -20,7 +21,6 @@
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
-#include <sys/resource.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/un.h>
@@ -263,13 +263,7 @@ TEST_F(QVBusListenerTest, LetsClientsWaitWhileDescriptorsAreUsedUp) {
   Client first, second;
   ASSERT_TRUE(first.connect(path_));
   ASSERT_TRUE(first.isLetIn());
-  // From here on there is no descriptor to be had.
-  rlimit before{};
-  ASSERT_EQ(::getrlimit(RLIMIT_NOFILE, &before), 0);
-  const int next = ::dup(notify_);
-  ::close(next);
-  const rlimit none{static_cast<rlim_t>(next), before.rlim_max};
-  ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &none), 0);
+  const QVDescriptorLimit noMore;
   ASSERT_TRUE(second.connect(path_));
   // The first is served all the while; each call gives the listener a turn.
   for (int64_t call = 0; call < 1000 && platform_.log().lines().empty(); ++call) {
@@ -283,7 +277,6 @@ TEST_F(QVBusListenerTest, LetsClientsWaitWhileDescriptorsAreUsedUp) {
             "cannot accept a connection: Too many open files; clients wait until one closes");
   first.hangUp();
   EXPECT_TRUE(second.isLetIn());
-  EXPECT_EQ(::setrlimit(RLIMIT_NOFILE, &before), 0);
 }
 
 namespace {

@@ -6,11 +6,14 @@
 #include "client/quietvox_handles.h"
 #include "tests/unit/client/QVReporterFixture.h"
 
+#include <array>
+#include <chrono>
 #include <cstddef>
 #include <cstring>
 #include <future>
 #include <set>
 #include <string>
+#include <thread>
 
 #include <gmock/gmock.h>
 
@@ -24,6 +27,7 @@ int quietvox_c99_fill(QuietVoxPayload* payload);
 namespace {
 
 using ::testing::ElementsAre;
+using ::testing::HasSubstr;
 
 constexpr uint32_t kCategory = QUIETVOX_COMPONENT_SESSION + QUIETVOX_KIND_PLAYBACK;
 
@@ -138,6 +142,7 @@ TEST_F(QVClientCInterfaceTest, HandlesThatAreNoneAreAnswered) {
   EXPECT_EQ(quietvox_reporter_open(nullptr, nullptr), kInvalid);
   EXPECT_EQ(quietvox_reporter_flush(nullptr, 0), kInvalid);
   EXPECT_EQ(quietvox_reporter_counters(nullptr, &counters), kInvalid);
+  EXPECT_EQ(quietvox_reporter_connection_error(nullptr, nullptr, 0), kInvalid);
   EXPECT_EQ(quietvox_reporter_is_reporting_enabled(nullptr), kInvalid);
   EXPECT_EQ(quietvox_reporter_send_to_every_session(nullptr, nullptr, 0, 0), kInvalid);
   QuietVoxSession* session = nullptr;
@@ -231,6 +236,30 @@ TEST_F(QVClientCInterfaceTest, RefusesOptionsThatThereAreNot) {
   options.maximumQueuedMessages = (uint64_t{1} << 32) + 1;
   EXPECT_EQ(quietvox_reporter_open(&options, &reporter), QUIETVOX_ERROR_INVALID_ARGUMENT);
   EXPECT_EQ(reporter, nullptr);
+}
+
+TEST_F(QVClientCInterfaceTest, SaysWhatKeepsItFromTheService) {
+  openReporter();
+  std::array<char, 256> text{'x'};
+  const auto error = [this, &text](std::size_t bytes) {
+    return quietvox_reporter_connection_error(handle_, text.data(), bytes);
+  };
+  EXPECT_EQ(error(text.size()), QUIETVOX_OK);
+  EXPECT_STREQ(text.data(), "");
+  stopListening();
+  QuietVoxSession* session = nullptr;
+  ASSERT_EQ(quietvox_session_open(handle_, 7, 0, &session), QUIETVOX_OK);
+  const auto limit = std::chrono::steady_clock::now() + kPatience;
+  while (error(text.size()) == QUIETVOX_OK && std::chrono::steady_clock::now() < limit) {
+    std::this_thread::yield();
+  }
+  EXPECT_EQ(error(text.size()), QUIETVOX_ERROR_CANNOT_CONNECT);
+  EXPECT_THAT(text.data(), HasSubstr(root_.socket().string()));
+  // Cut, and ended all the same.
+  EXPECT_EQ(error(3), QUIETVOX_ERROR_CANNOT_CONNECT);
+  EXPECT_EQ(std::strlen(text.data()), 2U);
+  EXPECT_EQ(quietvox_reporter_connection_error(handle_, nullptr, 0), QUIETVOX_ERROR_CANNOT_CONNECT);
+  quietvox_session_destroy(session);
 }
 
 TEST_F(QVClientCInterfaceTest, AnswersErrorsOfTheLibrary) {

@@ -1,8 +1,10 @@
 #include "tests/unit/client/QVReporterFixture.h"
 
+#include <chrono>
 #include <filesystem>
 #include <fstream>
 #include <stdexcept>
+#include <thread>
 #include <utility>
 
 #include <poll.h>
@@ -110,7 +112,9 @@ QVClientError::Code QVReporterFixture::send(QVReporterSession& session, int64_t 
 
 std::unique_ptr<QVScriptedService> QVReporterFixture::accept() {
   pollfd entry{.fd = listener_, .events = POLLIN, .revents = 0};
-  EXPECT_GT(::poll(&entry, 1, static_cast<int>(kPatience.count())), 0) << "nobody connects";
+  if (::poll(&entry, 1, static_cast<int>(kPatience.count())) <= 0) {
+    throw std::runtime_error("nobody connects");
+  }
   auto service = QVScriptedService::accepted(::accept4(listener_, nullptr, nullptr, SOCK_CLOEXEC));
   service->letIn();
   return service;
@@ -160,6 +164,14 @@ QVReporterFixture::Strings QVReporterFixture::serve(QVScriptedService& service, 
   Strings calls;
   while (calls.size() < count && !HasFailure()) calls.push_back(serve(service));
   return calls;
+}
+
+void QVReporterFixture::awaitConnectionError() const {
+  const auto limit = std::chrono::steady_clock::now() + kPatience;
+  while (!reporter_->connectionError()) {
+    ASSERT_LT(std::chrono::steady_clock::now(), limit);
+    std::this_thread::yield();
+  }
 }
 
 QVDropCounts QVReporterFixture::awaitDrops(uint64_t count) {

@@ -51,6 +51,8 @@ class QVReporterFixture : public testing::Test {
   static std::string describe(const Call& call);
   static void answer(QVScriptedService& service, const Call& call);
 
+  // Waits until the reporter says that it is without its service.
+  void awaitConnectionError() const;
   // The drops that the reporter told of, in all; waits until there are so many.
   QVDropCounts awaitDrops(uint64_t count);
   // The same for one reason; answers how many.

@@ -1,11 +1,13 @@
 // The reporting switch, as a reporter goes by it.
 
 #include "client/QVReportingSwitch.h"
+#include "tests/support/QVDescriptorLimit.h"
 #include "tests/unit/client/QVReporterFixture.h"
 
 #include <array>
 #include <filesystem>
 #include <fstream>
+#include <optional>
 #include <thread>
 
 #include <gmock/gmock.h>
@@ -194,18 +196,47 @@ TEST_F(QVReportingSwitchTest, HearsOfADirectoryThatIsMadeAnewBehindLostEvents) {
   EXPECT_TRUE(reportingSwitch.isOff());
 }
 
-TEST_F(QVReportingSwitchTest, LooksAgainForWhatWasNotThere) {
-  const std::filesystem::path runtime = root_.path() / "later";
+TEST_F(QVReportingSwitchTest, HearsOfDirectoriesThatAreMadeOneByOneLater) {
+  const std::filesystem::path runtime = root_.path() / "much" / "later";
   QVReportingSwitch reportingSwitch(root_.configuration(), runtime);
-  std::filesystem::create_directories(runtime / "notify");
+  std::filesystem::create_directory(root_.path() / "much");
+  awaitNews(reportingSwitch);
+  std::filesystem::create_directory(runtime);
+  awaitNews(reportingSwitch);
   configureOff(true);
-  EXPECT_FALSE(reportingSwitch.isOff());
-  reportingSwitch.lookAgain();
+  std::filesystem::create_directory(runtime / "notify");
+  awaitNews(reportingSwitch);
   EXPECT_TRUE(reportingSwitch.isOff());
   configureOff(false);
   std::ofstream(runtime / "notify" / "net.quillon.quietvox.reporting") << "posted";
   awaitNews(reportingSwitch);
   EXPECT_FALSE(reportingSwitch.isOff());
+}
+
+TEST_F(QVReportingSwitchTest, HearsOfADirectoryAboveThatIsMadeAnew) {
+  const std::filesystem::path runtime = root_.path() / "other";
+  std::filesystem::create_directories(runtime / "notify");
+  QVReportingSwitch reportingSwitch(root_.configuration(), runtime);
+  std::filesystem::remove_all(runtime);
+  awaitNews(reportingSwitch);
+  configureOff(true);
+  std::filesystem::create_directories(runtime / "notify");
+  awaitNews(reportingSwitch);
+  EXPECT_TRUE(reportingSwitch.isOff());
+}
+
+TEST_F(QVReportingSwitchTest, LooksAgainWhenAskedToWhereNothingCanBeWatched) {
+  std::optional<QVReportingSwitch> reportingSwitch;
+  {
+    const QVDescriptorLimit noMore;
+    reportingSwitch.emplace(root_.configuration(), root_.runtime());
+  }
+  EXPECT_LT(reportingSwitch->descriptor(), 0);
+  configureOff(true);
+  reportingSwitch->readNews();
+  EXPECT_FALSE(reportingSwitch->isOff());
+  reportingSwitch->lookAgain();
+  EXPECT_TRUE(reportingSwitch->isOff());
 }
 
 }  // namespace

@@ -1,7 +1,9 @@
 // A reporter with its service: what is sent when, and what is counted.
 
+#include "tests/support/QVDescriptorLimit.h"
 #include "tests/unit/client/QVReporterFixture.h"
 
+#include <chrono>
 #include <future>
 
 #include <gmock/gmock.h>
@@ -9,6 +11,7 @@
 namespace {
 
 using ::testing::ElementsAre;
+using ::testing::HasSubstr;
 
 class QVReporterTest : public QVReporterFixture {};
 
@@ -198,6 +201,7 @@ TEST_F(QVReporterTest, AFlushEndsAtItsLimit) {
   open();
   const auto session = openSession(7);
   EXPECT_EQ(reporter_->flush(std::chrono::milliseconds(0)), Code::timedOut);
+  EXPECT_EQ(reporter_->flush(std::chrono::milliseconds::min()), Code::timedOut);
   const auto service = accept();
   auto flushed = std::async(std::launch::async, [this] { return reporter_->flush(kPatience); });
   EXPECT_THAT(serve(*service, 2), ElementsAre("create 7", "type 7 2"));
@@ -267,6 +271,38 @@ TEST_F(QVReporterTest, ADropCallbackMayEndIt) {
             Code::invalidPayload);
   EXPECT_EQ(flushed.get_future().get(), Code::wouldDeadlock);
   EXPECT_EQ(reporter_, nullptr);
+}
+
+TEST_F(QVReporterTest, SaysWhatKeepsItFromTheService) {
+  open();
+  EXPECT_EQ(reporter_->connectionError().code(), Code::none) << "nothing was to be sent yet";
+  stopListening();
+  const auto session = openSession(7);
+  awaitConnectionError();
+  EXPECT_EQ(reporter_->connectionError().code(), Code::cannotConnect);
+  EXPECT_THAT(reporter_->connectionError().text(), HasSubstr(root_.socket().string()));
+  listen();
+  const auto service = accept();
+  serve(*service, 2);
+  EXPECT_EQ(reporter_->flush(kPatience), Code::none);
+  EXPECT_EQ(reporter_->connectionError().code(), Code::none);
+  service->hangUp();
+  awaitConnectionError();
+}
+
+TEST_F(QVReporterTest, OpensWithoutDescriptorsForTheSwitch) {
+  {
+    const QVDescriptorLimit oneMore(1);
+    open();
+  }
+  ASSERT_NE(reporter_, nullptr);
+  const auto session = openSession(7);
+  const auto service = accept();
+  switchReporting(false);
+  EXPECT_THAT(serve(*service, 2), ElementsAre("create 7", "type 7 2"));
+  // Read again at the connection.
+  EXPECT_EQ(reporter_->flush(kPatience), Code::none);
+  EXPECT_FALSE(reporter_->isReportingEnabled());
 }
 
 TEST_F(QVReporterTest, RefusesOptionsBeyondTheirLimits) {

@@ -1,5 +1,6 @@
 #include "platform/fake/QVFakeLog.h"
 #include "platform/linux/QVDirectoryWatcher.h"
+#include "tests/support/QVDescriptorLimit.h"
 #include "tests/support/QVTemporaryRoot.h"
 #include "tests/unit/watch/QVOccurrences.h"
 
@@ -15,7 +16,6 @@
 
 #include <fcntl.h>
 #include <gmock/gmock.h>
-#include <sys/resource.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -125,15 +125,13 @@ TEST_F(QVDirectoryWatcherTest, SaysWhyADirectoryCannotBeWatched) {
 }
 
 TEST_F(QVDirectoryWatcherTest, SaysThatThereAreNoDescriptorsLeft) {
-  rlimit before{};
-  ASSERT_EQ(::getrlimit(RLIMIT_NOFILE, &before), 0);
-  const rlimit none{.rlim_cur = 0, .rlim_max = before.rlim_max};
-  ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &none), 0);
   std::string reason;
-  const Token token = watcher_.watch(
-      {directory_, "name", Kind::posts}, [] {}, reason);
-  ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &before), 0);
-  EXPECT_EQ(token, QVDirectoryWatcher::kNoToken);
+  {
+    const QVDescriptorLimit noMore;
+    EXPECT_EQ(watcher_.watch(
+                  {directory_, "name", Kind::posts}, [] {}, reason),
+              QVDirectoryWatcher::kNoToken);
+  }
   EXPECT_EQ(reason, "inotify: Too many open files");
 
   // Once there are, it watches.

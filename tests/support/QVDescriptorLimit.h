@@ -1,0 +1,30 @@
+#pragma once
+
+#include <stdexcept>
+
+#include <fcntl.h>
+#include <sys/resource.h>
+#include <unistd.h>
+
+// While it lives this process gets no more descriptors than so many.
+//
+// Threads: one at a time; every thread is held to it.
+class QVDescriptorLimit {
+ public:
+  explicit QVDescriptorLimit(rlim_t more = 0) {
+    const int next = ::open("/dev/null", O_RDONLY | O_CLOEXEC);
+    if (next < 0 || ::close(next) != 0 || ::getrlimit(RLIMIT_NOFILE, &before_) != 0) {
+      throw std::runtime_error("the limit of descriptors is not to be had");
+    }
+    const rlimit limit{.rlim_cur = static_cast<rlim_t>(next) + more, .rlim_max = before_.rlim_max};
+    if (::setrlimit(RLIMIT_NOFILE, &limit) != 0) {
+      throw std::runtime_error("descriptors cannot be limited");
+    }
+  }
+  ~QVDescriptorLimit() { ::setrlimit(RLIMIT_NOFILE, &before_); }
+  QVDescriptorLimit(const QVDescriptorLimit&) = delete;
+  QVDescriptorLimit& operator=(const QVDescriptorLimit&) = delete;
+
+ private:
+  rlimit before_{};
+};
