@@ -91,4 +91,8 @@ class QVRealtimeRing {
 
   alignas(kCacheLine) std::atomic<uint64_t> taken_{0};
   uint64_t writtenSeen_ = 0;  // by the consumer
+
+  static_assert(
+      decltype(written_)::is_always_lock_free && decltype(abandoned_)::is_always_lock_free,
+      "on this target an atomic of 64 bits takes a lock, on which a real-time thread could wait");
 };

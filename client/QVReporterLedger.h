@@ -53,6 +53,9 @@ class QVReporterLedger {
   std::atomic<uint64_t> connections_{0};
   std::array<std::atomic<uint64_t>, kQVDropReasonCount> drops_{};
   std::atomic<bool> isDue_{false};
+  static_assert(
+      decltype(drops_)::value_type::is_always_lock_free,
+      "on this target a count of 64 bits takes a lock, on which a real-time thread could wait");
 
   QVDropCounts reported_;  // the reporter's thread's, as are the next two
   TimePoint notBefore_ = TimePoint::min();

@@ -1,8 +1,8 @@
 #pragma once
 
 // Publishes a driver's counters to the service, which reads them when a session starts and when it
-// stops. C99 and C++, gcc or clang; nothing to link. A program built with -std=c99 includes it
-// first: it asks for POSIX.
+// stops. C99 and C++, gcc or clang; nothing to link, so that it takes a processor that counts in 64
+// bits without a lock. A program built with -std=c99 includes it first: it asks for POSIX.
 //
 //   static const char* const kSubgroups[] = {"pcm0p", "pcm1p"};
 //   static const char* const kNames[] = {"frames", "underruns"};
@@ -25,6 +25,17 @@
 
 #ifndef _DEFAULT_SOURCE
 #define _DEFAULT_SOURCE 1
+#endif
+
+#include <fcntl.h>
+
+// The first header of a program settles what all others offer. A constant of POSIX tells.
+#ifndef O_CLOEXEC
+#error "include quietvox_channels.h before any other header, or build with -D_DEFAULT_SOURCE"
+#endif
+// Elsewhere the compiler would call for another library's lock, which no reader of the file takes.
+#if !defined __GCC_ATOMIC_LLONG_LOCK_FREE || __GCC_ATOMIC_LLONG_LOCK_FREE != 2
+#error "quietvox_channels.h needs 64-bit atomics without a lock, which this target does not have"
 #endif
 
 #include "quietvox_channels_mapping.h"

@@ -51,8 +51,9 @@ install(EXPORT QuietVoxClient NAMESPACE QuietVox:: FILE QuietVoxClientTargets.cm
 configure_package_config_file(${packaging}/client/QuietVoxClientConfig.cmake.in
   ${made}/QuietVoxClientConfig.cmake INSTALL_DESTINATION ${package_dir}
   NO_SET_AND_CHECK_MACRO NO_CHECK_REQUIRED_COMPONENTS_MACRO)
+# The C++ interface may change with the next minor release.
 write_basic_package_version_file(${made}/QuietVoxClientConfigVersion.cmake
-  COMPATIBILITY SameMajorVersion)
+  COMPATIBILITY SameMinorVersion)
 install(FILES ${made}/QuietVoxClientConfig.cmake ${made}/QuietVoxClientConfigVersion.cmake
         COMPONENT client-dev DESTINATION ${package_dir})
 configure_file(${packaging}/client/quietvox-client.pc.in ${made}/quietvox-client.pc @ONLY)

@@ -24,3 +24,14 @@ std::vector<std::string> QVInstallation::pkgConfig(const std::vector<std::string
   std::istringstream words(answer.text);
   return {std::istream_iterator<std::string>(words), {}};
 }
+
+std::vector<std::string> QVInstallation::compiler(Language language) {
+  std::vector<std::string> command{language == Language::c ? QV_C_COMPILER : QV_CXX_COMPILER,
+                                   language == Language::c ? "-std=c99" : "-std=c++20",
+                                   "-Wall",
+                                   "-Wextra",
+                                   "-Wpedantic",
+                                   "-Werror"};
+  if (*QV_SANITIZE != '\0') command.emplace_back("-fsanitize=" QV_SANITIZE);
+  return command;
+}

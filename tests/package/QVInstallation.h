@@ -12,6 +12,8 @@
 // Threads: the test's.
 class QVInstallation {
  public:
+  enum class Language { c, cxx };
+
   // Installs these components. Throws where that fails.
   explicit QVInstallation(const std::vector<std::string>& components);
 
@@ -23,6 +25,9 @@ class QVInstallation {
 
   // What pkg-config answers about the library, as arguments of a compiler.
   std::vector<std::string> pkgConfig(const std::vector<std::string>& options) const;
+
+  // A compiler's command line, strict about warnings, up to what it is to compile.
+  static std::vector<std::string> compiler(Language language);
 
  private:
   QVTemporaryRoot root_;

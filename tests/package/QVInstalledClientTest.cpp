@@ -3,8 +3,6 @@
 #include "tests/package/QVInstallation.h"
 #include "tests/support/QVEndToEndTest.h"
 
-#include <fstream>
-
 #include <gmock/gmock.h>
 
 namespace {
@@ -17,19 +15,7 @@ constexpr const char* kPrograms = QV_SOURCE_DIRECTORY "/packaging/smoke";
 // A compiler on a busy machine.
 constexpr std::chrono::minutes kBuildLimit{5};
 
-enum class Language { c, cxx };
-
-// A compiler's command line up to what it is to compile.
-std::vector<std::string> compiler(Language language) {
-  std::vector<std::string> command{language == Language::c ? QV_C_COMPILER : QV_CXX_COMPILER,
-                                   language == Language::c ? "-std=c99" : "-std=c++20",
-                                   "-Wall",
-                                   "-Wextra",
-                                   "-Wpedantic",
-                                   "-Werror"};
-  if (*QV_SANITIZE != '\0') command.emplace_back("-fsanitize=" QV_SANITIZE);
-  return command;
-}
+using Language = QVInstallation::Language;
 
 void add(std::vector<std::string>& command, const std::vector<std::string>& arguments) {
   command.insert(command.end(), arguments.begin(), arguments.end());
@@ -56,7 +42,7 @@ class QVInstalledClientTest : public QVEndToEndTest {
 
   void buildWithPkgConfig(Language language, const std::string& source,
                           const std::filesystem::path& program) {
-    auto command = compiler(language);
+    auto command = QVInstallation::compiler(language);
     add(command, {std::string(kPrograms).append("/").append(source), "-o", program.string()});
     add(command, installation_.pkgConfig({"--cflags", "--libs"}));
     run(command);
@@ -87,27 +73,6 @@ class QVInstalledClientTest : public QVEndToEndTest {
 
   const QVInstallation installation_{{"client", "client-dev"}};
 };
-
-TEST_F(QVInstalledClientTest, HeadersCompileByThemselves) {
-  int count = 0;
-  for (const auto& entry : std::filesystem::directory_iterator(installation_.headers())) {
-    const std::string name = entry.path().filename().string();
-    // Those that are named in small letters are for C, too.
-    for (const Language language : {Language::cxx, Language::c}) {
-      if (language == Language::c && name.starts_with("QV") && name != "QVClientExport.h") continue;
-      const std::string source =
-          (installation_.work() / (language == Language::c ? "header.c" : "header.cpp")).string();
-      std::ofstream(source) << "#include <quietvox/" << name << ">\nint main(void) { return 0; }\n";
-      auto command = compiler(language);
-      // Parts of quietvox_channels.h lie in headers of their own, which rely on what it asks for.
-      add(command, {"-D_DEFAULT_SOURCE", "-fsyntax-only",
-                    "-I" + (installation_.prefix() / "include").string(), source});
-      run(command);
-      ++count;
-    }
-  }
-  EXPECT_GT(count, 10);
-}
 
 TEST_F(QVInstalledClientTest, BuildsCxxProgramsWithPkgConfig) {
   const auto program = installation_.work() / "reporter";

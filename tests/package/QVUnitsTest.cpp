@@ -3,14 +3,20 @@
 #include "tests/package/QVInstallation.h"
 
 #include <fstream>
+#include <map>
 #include <sstream>
 
 #include <gmock/gmock.h>
 
 namespace {
 
+using ::testing::_;
+using ::testing::Contains;
+using ::testing::Each;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
+using ::testing::Key;
+using ::testing::Pair;
 
 // What systemd-analyze may find of the service's exposure, in tenths; packaging/README.md has what
 // it does find.
@@ -81,6 +87,22 @@ TEST_F(QVUnitsTest, HaveAnAccountAndGroupsOfTheirOwn) {
   for (const char* group : {"quietvox:", "quietvox-client:", "quietvox-publish:"}) {
     EXPECT_THAT(textOf(root / "etc" / "group"), HasSubstr(group));
   }
+}
+
+// The manager takes one line for a place, and says nothing of others that are equal to it.
+TEST_F(QVUnitsTest, MakeEachPlaceOnce) {
+  std::ifstream lines(installation_.prefix() / "lib" / "tmpfiles.d" / "quietvox.conf");
+  std::map<std::string, int> places;
+  for (std::string line; std::getline(lines, line);) {
+    if (line.empty() || line[0] == '#') continue;
+    std::istringstream words(line);
+    std::string type;
+    std::string place;
+    words >> type >> place;
+    ++places[place];
+  }
+  EXPECT_THAT(places, Contains(Key("/var/lib/quietvox")));
+  EXPECT_THAT(places, Each(Pair(_, 1)));
 }
 
 }  // namespace
