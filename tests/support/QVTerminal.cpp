@@ -7,6 +7,7 @@
 
 #include <poll.h>
 #include <pty.h>
+#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -65,6 +66,11 @@ std::optional<QVSubprocess::Status> QVTerminal::wait() {
   while (read()) {
   }
   // It has closed its terminal, which it does last of all; else it has had its minute.
+  const int process = static_cast<int>(::syscall(SYS_pidfd_open, pid_, 0));
+  pollfd entry{process, POLLIN, 0};
+  const int ended = ::poll(&entry, 1, kLimitMilliseconds);
+  ::close(process);
+  if (ended != 1) return std::nullopt;
   int raw = 0;
   const pid_t collected = ::waitpid(pid_, &raw, 0);
   if (collected != pid_) return std::nullopt;
