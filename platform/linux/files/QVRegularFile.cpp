@@ -63,6 +63,16 @@ int QVRegularFile::readBeginning(std::size_t bytes, std::string& contents) const
   return 0;
 }
 
+int QVRegularFile::readPart(std::uint64_t offset, std::size_t bytes, std::string& part) const {
+  part.resize(bytes);
+  ssize_t count = 0;
+  do {
+    count = ::pread(descriptor_.get(), part.data(), bytes, static_cast<off_t>(offset));
+  } while (count < 0 && errno == EINTR);
+  part.resize(count > 0 ? static_cast<std::size_t>(count) : 0);
+  return count < 0 ? errno : 0;
+}
+
 std::string QVRegularFile::reason(int error, std::size_t maximumBytes) {
   if (error == kIrregular) return "not a regular file";
   if (error == kTooLarge) return QVText("larger than ", maximumBytes, " bytes");

@@ -3,6 +3,7 @@
 #include "platform/linux/QVDescriptor.h"
 
 #include <cstddef>
+#include <cstdint>
 #include <string>
 #include <string_view>
 
@@ -30,6 +31,8 @@ class QVRegularFile {
   [[nodiscard]] int read(std::size_t maximumBytes, std::string& contents) const;
   // The first bytes alone, fewer where the file is shorter.
   [[nodiscard]] int readBeginning(std::size_t bytes, std::string& contents) const;
+  // Up to so many bytes from `offset` on, for files that are read part by part; none at the end.
+  [[nodiscard]] int readPart(std::uint64_t offset, std::size_t bytes, std::string& part) const;
 
   // An error number of these in words.
   static std::string reason(int error, std::size_t maximumBytes);

@@ -53,6 +53,17 @@ TEST_F(QVRegularFileTest, TakesOneCallForAFileThatSaysItsSize) {
   }
 }
 
+TEST_F(QVRegularFileTest, ReadsAFilePartByPart) {
+  write("abcdefgh");
+  const QVRegularFile file(path(), QVRegularFile::Links::refuse);
+  EXPECT_EQ(file.readPart(0, 3, contents_), 0);
+  EXPECT_EQ(contents_, "abc");
+  EXPECT_EQ(file.readPart(6, 3, contents_), 0);
+  EXPECT_EQ(contents_, "gh");
+  EXPECT_EQ(file.readPart(8, 3, contents_), 0);
+  EXPECT_EQ(contents_, "");
+}
+
 TEST_F(QVRegularFileTest, ReadsAFileThatSaysNoSizeToItsEnd) {
   ASSERT_EQ(std::filesystem::file_size("/proc/self/status"), 0U);
   EXPECT_EQ(callsToRead("/proc/self/status", 1U << 20U), 2U);
