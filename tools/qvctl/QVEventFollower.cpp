@@ -36,6 +36,12 @@ void QVEventFollower::noticeOtherStore() {
   inode_ = file.st_ino;
 }
 
+void QVEventFollower::noticeEmptiedSessions() {
+  if (reader_.range(Kind::start).last >= openAfter_) return;
+  open_.clear();
+  openAfter_ = 0;
+}
+
 void QVEventFollower::addSessionRows(QVEventRowReader::Sessions which) {
   for (const int64_t row : reader_.sessionRows(which, openAfter_, kMaximumOpen)) {
     open_.insert(row);
@@ -62,7 +68,6 @@ void QVEventFollower::readNew(const Receiver& receiver) {
     if (!reader_.filter().wants(kind)) continue;
     int64_t& after = after_[static_cast<std::size_t>(kind)];
     const int64_t last = reader_.range(kind).last;
-    // A table that was emptied, to keep the store within its limit, numbers its rows anew.
     if (last < after) after = 0;
     while (after < last) {
       reader_.read(kind, after, last, events);
@@ -70,6 +75,7 @@ void QVEventFollower::readNew(const Receiver& receiver) {
     }
   }
   if (reader_.filter().wants(Kind::stop)) {
+    noticeEmptiedSessions();
     // Those that were started and stopped meanwhile, too.
     addSessionRows(QVEventRowReader::Sessions::all);
     addStops(events);

@@ -13,7 +13,8 @@
 //
 // Rows are known by their numbers, which grow; a session's stop is written into the row of its
 // start, so the latest sessions that run are remembered. Another store in the place of the first
-// one, after damage, is read from its beginning.
+// one, after damage, is read from its beginning, and so is a table that was emptied, to keep the
+// store within its limit: its rows are numbered anew.
 //
 // Threads: one at a time. The reader outlives it. Failures: as QVReadOnlyStore.
 class QVEventFollower {
@@ -32,6 +33,7 @@ class QVEventFollower {
 
  private:
   void noticeOtherStore();
+  void noticeEmptiedSessions();
   void addSessionRows(QVEventRowReader::Sessions which);
   void addStops(QVEventRowReader::Events& events);
 

@@ -359,6 +359,21 @@ TEST_F(QVToolWatchTest, GoesOnWithAnotherStore) {
   EXPECT_THAT(watch->shown(), HasSubstr("4711"));
 }
 
+TEST_F(QVToolWatchTest, ShowsStopsInAStoreThatWasEmptied) {
+  fillStore();
+  client_.reset();
+  endService();
+  const auto watch = terminal({"watch", "--kind", "stop", "--count", "1"});
+  ASSERT_TRUE(watch->await("CONTENTS"));
+  // As the service does it to keep the store within its limit: the numbers of the rows begin anew.
+  execute(
+      "BEGIN; DELETE FROM beacon_session; "
+      "INSERT INTO beacon_session(opened_at, flushed_at, session_id, user_info) "
+      "VALUES(1, 2, 4711, '{}'); COMMIT");
+  EXPECT_EQ(watch->wait(), 0);
+  EXPECT_THAT(watch->shown(), HasSubstr("4711"));
+}
+
 TEST_F(QVToolWatchTest, EndsAfterItsTime) {
   EXPECT_EQ(run({"watch", "--for", "20ms", "--json"}), "");
 }
