@@ -9,6 +9,7 @@
 #include <array>
 #include <chrono>
 #include <cstdio>
+#include <utility>
 #include <vector>
 
 #include <poll.h>
@@ -55,12 +56,15 @@ QVToolStatus QVChannelsCommand::run(const QVToolContext& context, const Options&
     if (options.count) {
       throw QVToolFailure(QVToolStatus::wrongUsage, "--count goes with --interval");
     }
-    show(context.output, table.read(), std::nullopt);
+    const QVChannelTable::Reading reading = table.read();
+    complain(reading, {});
+    show(context.output, reading, std::nullopt);
     return QVToolStatus::done;
   }
   const auto interval = intervalOf(options.interval);
   const QVSignals signals{SIGINT, SIGTERM, SIGHUP};
   std::optional<Clock::time_point> last;
+  QVChannelTable::Reading before;
   for (std::size_t round = 0; !options.count || round < *options.count; ++round) {
     if (last && !wait(context.output, signals, *last + interval)) break;
     const auto now = Clock::now();
@@ -68,7 +72,10 @@ QVToolStatus QVChannelsCommand::run(const QVToolContext& context, const Options&
     if (last) seconds = std::chrono::duration<double>(now - *last).count();
     last = now;
     if (round > 0 && !context.output.isJSON()) context.output.line("");
-    show(context.output, table.read(), seconds);
+    QVChannelTable::Reading reading = table.read();
+    complain(reading, before);
+    show(context.output, reading, seconds);
+    before = std::move(reading);
     context.output.flush();
   }
   return QVToolStatus::done;
@@ -86,12 +93,31 @@ QVValue QVChannelsCommand::json(const QVChannelTable::Channel& channel,
       {{"delta", *channel.growth}, {"perSecond", static_cast<double>(*channel.growth) / *seconds}});
 }
 
-void QVChannelsCommand::show(QVToolOutput& output, const QVChannelTable::Channels& channels,
+QVValue QVChannelsCommand::json(const QVChannelTable::Reading& reading,
+                                std::optional<double> seconds) {
+  std::vector<QVValue> channels;
+  for (const auto& channel : reading.channels) channels.push_back(json(channel, seconds));
+  std::vector<QVValue> unreadable;
+  for (const auto& [path, error] : reading.unreadable) {
+    unreadable.emplace_back(QVDictionary{{"path", path}, {"error", error}});
+  }
+  return QVDictionary{{"channels", QVArray::assemble(channels)},
+                      {"unreadable", QVArray::assemble(unreadable)}};
+}
+
+void QVChannelsCommand::complain(const QVChannelTable::Reading& reading,
+                                 const QVChannelTable::Reading& before) {
+  for (const auto& file : reading.unreadable) {
+    if (std::ranges::find(before.unreadable, file) != before.unreadable.end()) continue;
+    const bool isNamed = file.error.find(file.path) != std::string::npos;
+    QVToolOutput::note(isNamed ? file.error : QVText(file.path, ": ", file.error));
+  }
+}
+
+void QVChannelsCommand::show(QVToolOutput& output, const QVChannelTable::Reading& reading,
                              std::optional<double> seconds) {
   if (output.isJSON()) {
-    std::vector<QVValue> all;
-    for (const auto& channel : channels) all.push_back(json(channel, seconds));
-    output.json(QVArray::assemble(all));
+    output.json(json(reading, seconds));
     return;
   }
   std::vector<QVTable::Column> columns{
@@ -101,7 +127,7 @@ void QVChannelsCommand::show(QVToolOutput& output, const QVChannelTable::Channel
     columns.push_back({"PER SECOND", QVTable::Align::right});
   }
   QVTable table(output, columns);
-  for (const auto& channel : channels) {
+  for (const auto& channel : reading.channels) {
     QVTable::Row row{channel.group, channel.subgroup.empty() ? "-" : channel.subgroup, channel.name,
                      channel.value ? std::to_string(*channel.value) : "-"};
     if (seconds) {

@@ -17,13 +17,17 @@ class QVChannelsCommand {
   struct Options {
     std::string interval;  // empty: once
     std::optional<std::size_t> count;
-    std::string group;
+    std::string group;  // empty: all
   };
 
   static QVToolStatus run(const QVToolContext& context, const Options& options);
 
  private:
-  static void show(QVToolOutput& output, const QVChannelTable::Channels& channels,
+  // What was said of the last reading is not said again.
+  static void complain(const QVChannelTable::Reading& reading,
+                       const QVChannelTable::Reading& before);
+  static void show(QVToolOutput& output, const QVChannelTable::Reading& reading,
                    std::optional<double> seconds);
+  static QVValue json(const QVChannelTable::Reading& reading, std::optional<double> seconds);
   static QVValue json(const QVChannelTable::Channel& channel, std::optional<double> seconds);
 };

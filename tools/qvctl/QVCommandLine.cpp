@@ -3,6 +3,7 @@
 #include "tools/qvctl/QVCommandLineState.h"
 #include "tools/qvctl/QVToolOutput.h"
 
+#include <algorithm>
 #include <sstream>
 
 QVCommandLine::QVCommandLine() : state_(std::make_unique<State>()) {
@@ -24,6 +25,7 @@ QVCommandLine::~QVCommandLine() = default;
 bool QVCommandLine::parse(int argc, const char* const* argv, QVToolStatus& status) {
   try {
     state_->app.parse(argc, argv);
+    State::refuseEmptyWords(state_->app);
     return true;
   } catch (const CLI::ParseError& error) {
     const bool isAnswer = error.get_exit_code() == 0;
@@ -52,4 +54,39 @@ QVToolPlaces QVCommandLine::places() const {
 
 QVToolStatus QVCommandLine::run(const QVToolContext& context) const {
   return state_->action(context);
+}
+
+std::string QVCommandLine::State::complaint(const CLI::App& app, const CLI::ParseError& error) {
+  const std::vector<std::string> left = app.remaining(true);
+  const bool isMissing = error.get_exit_code() == static_cast<int>(CLI::ExitCodes::RequiredError);
+  if (!isMissing || left.empty()) return error.what();
+  const char* const what = left.front().starts_with('-') ? "option" : "command";
+  return std::string("no ").append(what).append(" is called \"").append(left.front()).append("\"");
+}
+
+void QVCommandLine::State::addPlaces(CLI::App& command) {
+  command.add_option("--socket", socket, "The service's socket")->option_text("PATH");
+  command.add_option("--root", root, "Root directory of the system that is looked at")
+      ->option_text("DIR");
+}
+
+void QVCommandLine::State::addJSON(CLI::App& command) {
+  command.add_flag("--json", json, "Print JSON, one value a line");
+}
+
+void QVCommandLine::State::refuseEmptyWords(const CLI::App& command) {
+  for (const CLI::Option* const option : command.get_options()) {
+    // A command's arguments and entries are judged where they are taken.
+    const bool isRest = option->get_positional() && option->get_items_expected_max() > 1;
+    const auto& words = option->results();
+    if (isRest || std::ranges::find(words, "") == words.end()) continue;
+    throw CLI::ValidationError(option->get_name(), "\"\" is no value");
+  }
+  for (const CLI::App* const below : command.get_subcommands()) refuseEmptyWords(*below);
+}
+
+CLI::App& QVCommandLine::State::addFamily(const char* name, const char* description) {
+  CLI::App& family = *app.add_subcommand(name, description);
+  family.require_subcommand(1);
+  return family;
 }

@@ -13,6 +13,8 @@
 // Threads: one.
 class QVCommandLine {
  public:
+  // For the sources of this class.
+  struct State;
   using Action = std::function<QVToolStatus(const QVToolContext& context)>;
 
   QVCommandLine();
@@ -30,7 +32,6 @@ class QVCommandLine {
   QVToolStatus run(const QVToolContext& context) const;
 
  private:
-  struct State;
   void addInspection();
   void addSummary();
   void addSessions();

@@ -15,26 +15,14 @@ constexpr const char* kFull = "Do not cut lines at the terminal's width";
 constexpr const char* kFile = "Its number in the list (1, the latest), its name, or its path";
 
 void addFilter(CLI::App& command, QVEventFilter::Words& words) {
-  command.add_option("--kind", words.kinds, "start, message, analytics, energy, stop, loss")
-      ->option_text("KIND,...")
-      ->delimiter(',')
-      ->allow_extra_args(false);
-  command.add_option("--session", words.sessions, "Of these sessions")
-      ->option_text("ID,...")
-      ->delimiter(',')
-      ->allow_extra_args(false);
-  command.add_option("--service", words.services, "Of sessions of these service types")
-      ->option_text("NAME,...")
-      ->delimiter(',')
-      ->allow_extra_args(false);
-  command.add_option("--category", words.categories, "Playback, Session or Session.Playback")
-      ->option_text("NAME,...")
-      ->delimiter(',')
-      ->allow_extra_args(false);
-  command.add_option("--type", words.types, "Of these message types")
-      ->option_text("NAME,...")
-      ->delimiter(',')
-      ->allow_extra_args(false);
+  const auto addList = QVCommandLine::State::addList<std::vector<std::string>>;
+  addList(command, "--kind", words.kinds, "start, message, analytics, energy, stop, loss",
+          "KIND,...");
+  addList(command, "--session", words.sessions, "Of these sessions", "ID,...");
+  addList(command, "--service", words.services, "Of sessions of these service types", "NAME,...");
+  addList(command, "--category", words.categories, "Playback, Session or Session.Playback",
+          "NAME,...");
+  addList(command, "--type", words.types, "Of these message types", "NAME,...");
   command.add_option("--name", words.names, "Of these names, * and ? match anything")
       ->option_text("PATTERN")
       ->allow_extra_args(false);
@@ -97,12 +85,10 @@ void QVCommandLine::addInspection() {
 
 void QVCommandLine::addSummary() {
   State& state = *state_;
-  CLI::App& summary = *state.app.add_subcommand("summary", "The files that sessions leave");
-  summary.require_subcommand(1);
+  CLI::App& summary = state.addFamily("summary", "The files that sessions leave");
   using Operation = QVSummaryCommand::Operation;
   const auto add = [&](Operation operation, const char* name, const char* description) {
-    const auto added = state.add<QVSummaryCommand>(summary, name, description);
-    added.second->operation = operation;
+    const auto added = state.addMember<QVSummaryCommand>(summary, operation, name, description);
     if (operation != Operation::list) {
       added.first->add_option("file", added.second->file, kFile)->option_text("FILE");
     }
@@ -113,15 +99,13 @@ void QVCommandLine::addSummary() {
   add(Operation::show, "show", "Print one");
   add(Operation::open, "open", "Open one in another program");
   const auto [plot, options] = add(Operation::plot, "plot", "Draw its numbers over its messages");
-  plot->add_option("--key", options->keys, "These keys alone, * and ? match anything")
-      ->option_text("PATTERN,...")
-      ->delimiter(',')
-      ->allow_extra_args(false);
-  State::addNumber<std::size_t>(*plot, "--width", options->width, "Columns of the whole", 1,
-                                QVSummaryCommand::kLargestColumns)
+  State::addList(*plot, "--key", options->plot.keys, "These keys alone, * and ? match anything",
+                 "PATTERN,...");
+  State::addNumber<std::size_t>(*plot, "--width", options->plot.width, "Columns of the whole",
+                                QVSummaryPlot::kSmallestColumns, QVSummaryPlot::kLargestColumns)
       ->option_text("N");
-  State::addNumber<std::size_t>(*plot, "--height", options->height, "Rows of each picture", 1,
-                                QVSummaryCommand::kLargestRows)
+  State::addNumber<std::size_t>(*plot, "--height", options->plot.height, "Rows of each picture", 1,
+                                QVSummaryPlot::kLargestRows)
       ->option_text("N");
-  plot->add_flag("--ascii", options->ascii, "Draw with ASCII alone");
+  plot->add_flag("--ascii", options->plot.ascii, "Draw with ASCII alone");
 }

@@ -33,26 +33,24 @@ void QVCommandLine::addSessions() {
   const std::string footer = std::string(State::kEntries).append("\n\n").append(State::kFooter);
   const auto [send, sendOptions] =
       state.add<QVSendCommand>(state.app, "send", "Send one message to sessions");
-  const auto takeSessions = [to = sendOptions](const std::vector<std::string>& words) {
+  const auto takeSessions = [to = sendOptions](const CLI::results_t& words) {
     for (const std::string& word : words) {
       to->sessions.push_back(State::number<int64_t>("--session", word));
     }
+    return true;
   };
-  send->add_option_function<std::vector<std::string>>("--session", takeSessions,
-                                                      "To these sessions")
+  send->add_option("--session", CLI::callback_t(takeSessions), "To these sessions")
       ->option_text("ID,...")
       ->delimiter(',')
-      ->allow_extra_args(false);
+      ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);
   send->add_flag("--all", sendOptions->toAll, "To every session that is started");
   addMessage(*send, *sendOptions);
   send->footer(footer);
 
-  CLI::App& session = *state.app.add_subcommand("session", "A session of one's own, for scripts");
-  session.require_subcommand(1);
+  CLI::App& session = state.addFamily("session", "A session of one's own, for scripts");
   using Operation = QVSessionCommand::Operation;
   const auto add = [&](Operation operation, const char* name, const char* description) {
-    const auto added = state.add<QVSessionCommand>(session, name, description);
-    added.second->operation = operation;
+    const auto added = state.addMember<QVSessionCommand>(session, operation, name, description);
     if (operation != Operation::create) {
       State::addNumber<int64_t>(*added.first, "id", added.second->reporterID, "The session")
           ->option_text("ID")
@@ -72,12 +70,11 @@ void QVCommandLine::addSessions() {
   {
     const auto [command, options] =
         state.add<QVSendCommand>(session, "send", "Send it one message");
-    const auto take = [to = options](const std::string& id) {
-      to->sessions = {State::number<int64_t>("id", id)};
+    const auto take = [to = options](const CLI::results_t& words) {
+      to->sessions = {State::number<int64_t>("id", words.front())};
+      return true;
     };
-    command->add_option_function<std::string>("id", take, "The session")
-        ->option_text("ID")
-        ->required();
+    command->add_option("id", CLI::callback_t(take), "The session")->option_text("ID")->required();
     addMessage(*command, *options);
     command->footer(footer);
   }

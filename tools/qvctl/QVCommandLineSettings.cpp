@@ -6,13 +6,11 @@
 
 void QVCommandLine::addSettings() {
   State& state = *state_;
-  CLI::App& reporting = *state.app.add_subcommand("reporting", "The reporting switch");
-  reporting.require_subcommand(1);
+  CLI::App& reporting = state.addFamily("reporting", "The reporting switch");
   using Operation = QVReportingCommand::Operation;
   const auto add = [&](Operation operation, const char* name, const char* description) {
-    const auto [command, options] = state.add<QVReportingCommand>(reporting, name, description);
-    options->operation = operation;
-    state.addJSON(*command);
+    state.addJSON(
+        *state.addMember<QVReportingCommand>(reporting, operation, name, description).first);
   };
   add(Operation::on, "on", "Switch reporting on");
   add(Operation::off, "off", "Switch reporting off: messages are refused, nothing is stored");

@@ -25,8 +25,8 @@ struct QVCommandLine::State {
 
   // Behind the options of every command.
   static constexpr const char* kFooter =
-      "Exit status: 0 done, 1 failed, 2 wrong usage, 3 the service is not running or cannot be\n"
-      "reached, 4 not permitted; session run: that of its command.\n"
+      "Exit status: 0 done, 1 failed, 2 wrong usage, 3 the service is not running, cannot be\n"
+      "reached or does not answer, 4 not permitted; session run: that of its command.\n"
       "Names of service types, categories and message types, in any case, and their numbers are\n"
       "taken alike: telephony or 2, Session.Playback or 0x08000003, Start or 1. See qvctl(1).";
   // And of those that take entries of messages or configurations.
@@ -36,27 +36,11 @@ struct QVCommandLine::State {
       "gain:double=1 name:string=5 device:json={\"a\":[1,2]}";
 
   // What is wrong. Where a command is missing, the parser does not say what stands in its place.
-  static std::string complaint(const CLI::App& app, const CLI::ParseError& error) {
-    const std::vector<std::string> left = app.remaining(true);
-    const bool isMissing = error.get_exit_code() == static_cast<int>(CLI::ExitCodes::RequiredError);
-    if (!isMissing || left.empty()) return error.what();
-    const char* const what = left.front().starts_with('-') ? "option" : "command";
-    return std::string("no ")
-        .append(what)
-        .append(" is called \"")
-        .append(left.front())
-        .append("\"");
-  }
+  static std::string complaint(const CLI::App& app, const CLI::ParseError& error);
 
   // Options of every command.
-  void addPlaces(CLI::App& command) {
-    command.add_option("--socket", socket, "The service's socket")->option_text("PATH");
-    command.add_option("--root", root, "Root directory of the system that is looked at")
-        ->option_text("DIR");
-  }
-  void addJSON(CLI::App& command) {
-    command.add_flag("--json", json, "Print JSON, one value a line");
-  }
+  void addPlaces(CLI::App& command);
+  void addJSON(CLI::App& command);
   // The whole of a word as a number within limits; the parser itself takes "-1" for a very large
   // number of no sign, and cuts what is too large.
   template <class Number>
@@ -82,10 +66,32 @@ struct QVCommandLine::State {
                                 const char* description,
                                 Number least = std::numeric_limits<Number>::min(),
                                 Number most = std::numeric_limits<Number>::max()) {
-    const auto take = [name, &target, least, most](const std::string& word) {
-      target = number<Number>(name, word, least, most);
+    const auto take = [name, &target, least, most](const CLI::results_t& words) {
+      target = number<Number>(name, words.front(), least, most);
+      return true;
     };
-    return command.add_option_function<std::string>(name, take, description);
+    return command.add_option(name, CLI::callback_t(take), description);
+  }
+  // Several words behind one option, with commas between.
+  template <class Target>
+  static CLI::Option* addList(CLI::App& command, const char* name, Target& target,
+                              const char* description, const char* words) {
+    return command.add_option(name, target, description)
+        ->option_text(words)
+        ->delimiter(',')
+        ->allow_extra_args(false);
+  }
+  // An option that takes an empty word for a value would take it for none.
+  static void refuseEmptyWords(const CLI::App& command);
+  // Commands with a word before them: "summary list", "summary show".
+  CLI::App& addFamily(const char* name, const char* description);
+  // One of them, of those that Command::run() carries out.
+  template <class Command>
+  auto addMember(CLI::App& family, typename Command::Operation operation, const char* name,
+                 const char* description) {
+    auto added = add<Command>(family, name, description);
+    added.second->operation = operation;
+    return added;
   }
   // A command that is carried out by Command::run(context, options).
   template <class Command>

@@ -8,6 +8,9 @@
 
 namespace {
 
+// Bytes of a character in UTF-8, at the most.
+constexpr std::size_t kLongestCharacter = 4;
+
 struct Character {
   char32_t code = 0;
   std::size_t bytes = 1;
@@ -18,11 +21,16 @@ bool isContinuation(char byte) {
   return (static_cast<unsigned char>(byte) & 0xC0U) == 0x80U;
 }
 
+// Of a character that begins so, if it is one.
+std::size_t bytesOf(unsigned char lead) {
+  return lead >= 0xF0 ? 4 : lead >= 0xE0 ? 3 : lead >= 0xC0 ? 2 : 1;
+}
+
 // The first character of a text that is not empty; a single byte where that is no UTF-8.
 Character firstCharacter(std::string_view text) {
   const auto lead = static_cast<unsigned char>(text[0]);
   if (lead < 0x80) return {lead, 1, true};
-  const std::size_t bytes = lead >= 0xF0 ? 4 : lead >= 0xE0 ? 3 : 2;
+  const std::size_t bytes = bytesOf(lead);
   if (lead < 0xC2 || lead > 0xF4 || text.size() < bytes) return {lead, 1, false};
   char32_t code = lead & (0x7FU >> bytes);
   for (std::size_t i = 1; i < bytes; ++i) {
@@ -107,6 +115,16 @@ std::string QVDisplayJSON(std::string_view text) {
     text.remove_prefix(character.bytes);
   }
   return out;
+}
+
+std::size_t QVWholeCharacters(std::string_view text) {
+  std::size_t at = text.size();
+  for (std::size_t missing = 1; missing < kLongestCharacter && at > 0; ++missing) {
+    --at;
+    if (isContinuation(text[at])) continue;
+    return bytesOf(static_cast<unsigned char>(text[at])) > missing ? at : text.size();
+  }
+  return text.size();
 }
 
 std::size_t QVDisplayWidth(std::string_view text) {

@@ -17,6 +17,10 @@ std::string QVDisplayText(std::string_view text);
 // characters in its strings alone, and those below 0x20 not at all.)
 std::string QVDisplayJSON(std::string_view text);
 
+// Bytes of the text but for a last character of which the end is missing: where text that comes in
+// parts can be cut.
+std::size_t QVWholeCharacters(std::string_view text);
+
 // Columns that a text takes on a terminal: wide characters two, combining ones none.
 std::size_t QVDisplayWidth(std::string_view text);
 

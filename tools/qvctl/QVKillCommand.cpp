@@ -6,10 +6,8 @@
 QVToolStatus QVKillCommand::run(const QVToolContext& context, const Options& /*options*/) {
   const QVServiceState state = QVServiceState::find(context.places);
   if (!state.isRunning() && state.kind != QVServiceState::Kind::unknown) {
-    throw QVToolFailure(QVToolStatus::notRunning,
-                        "the service is not running (" + context.places.socket.string() + ")");
+    throw QVToolFailure(QVToolStatus::notRunning, state.complaint(context.places));
   }
-  QVServiceConnection service(context.places);
-  QVServiceConnection::answer(service.client().killServiceAndWait(QVServiceConnection::kTimeLimit));
+  QVServiceConnection(context.places).ask(&QVClient::killServiceAndWait);
   return QVToolStatus::done;
 }

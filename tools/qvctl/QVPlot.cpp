@@ -20,33 +20,32 @@ std::string brailleOf(unsigned bits) {
 
 }  // namespace
 
-QVPlot::QVPlot(Size size, Dots dots)
+QVPlot::QVPlot(Size size, Dots dots, const Frame& frame)
     : size_(size),
       dots_(dots),
+      frame_(frame),
       width_(size.columns * (dots == Dots::braille ? kBrailleColumns : 1)),
-      height_(size.rows * (dots == Dots::braille ? kBrailleRows : 1)) {}
+      height_(size.rows * (dots == Dots::braille ? kBrailleRows : 1)),
+      isSet_(width_ * height_) {}
 
-std::vector<std::string> QVPlot::draw(const Points& points, int64_t first, int64_t last) {
-  isSet_.assign(width_ * height_, false);
-  double lowest = HUGE_VAL;
-  double highest = -HUGE_VAL;
-  for (const auto& [place, number] : points) {
-    lowest = std::min(lowest, number);
-    highest = std::max(highest, number);
-  }
+QVPlot::Place QVPlot::placeOf(int64_t place, double number) const {
+  const auto first = static_cast<double>(frame_.first);
+  const double length = static_cast<double>(frame_.last) - first;
+  const double along = length > 0 ? (static_cast<double>(place) - first) / length : 0;
   // Halved, so that the largest numbers have a difference.
-  const double span = highest / 2 - lowest / 2;
-  const double length = static_cast<double>(last) - static_cast<double>(first);
-  const auto placeOf = [&](const std::pair<int64_t, double>& point) {
-    const double along = static_cast<double>(point.first) - static_cast<double>(first);
-    const double above = span > 0 ? (point.second / 2 - lowest / 2) / span : 0.5;
-    return Place{length > 0 ? along / length * static_cast<double>(width_ - 1) : 0,
-                 (1 - above) * static_cast<double>(height_ - 1)};
-  };
-  for (std::size_t i = 0; i < points.size(); ++i) {
-    const Place place = placeOf(points[i]);
-    join(i == 0 ? place : placeOf(points[i - 1]), place);
-  }
+  const double span = frame_.highest / 2 - frame_.lowest / 2;
+  const double above = span > 0 ? (number / 2 - frame_.lowest / 2) / span : 0.5;
+  return {std::clamp(along, 0.0, 1.0) * static_cast<double>(width_ - 1),
+          (1 - std::clamp(above, 0.0, 1.0)) * static_cast<double>(height_ - 1)};
+}
+
+void QVPlot::add(int64_t place, double number) {
+  const Place next = placeOf(place, number);
+  join(last_.value_or(next), next);
+  last_ = next;
+}
+
+std::vector<std::string> QVPlot::rows() const {
   std::vector<std::string> rows;
   for (std::size_t i = 0; i < size_.rows; ++i) rows.push_back(row(i));
   return rows;

@@ -69,7 +69,7 @@ std::unique_ptr<QVReadOnlyStore> QVReadOnlyStore::open(const std::filesystem::pa
   for (int attempt = 0; attempt < kAttempts; ++attempt) {
     if (::access(path.c_str(), R_OK) != 0) {
       if (errno == ENOENT) return nullptr;
-      throw QVToolFailure::ofSystem(path.string(), errno);
+      throw QVToolFailure::ofFile(path, R_OK, errno);
     }
     store.reset(new QVReadOnlyStore(path));
     switch (store->tryToOpen(::access(log.c_str(), F_OK) == 0)) {

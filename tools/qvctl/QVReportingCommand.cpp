@@ -1,5 +1,6 @@
 #include "tools/qvctl/QVReportingCommand.h"
 
+#include "tools/qvctl/QVDisplayText.h"
 #include "tools/qvctl/QVServiceConnection.h"
 #include "tools/qvctl/QVServiceState.h"
 #include "tools/qvctl/QVSwitchControl.h"
@@ -9,7 +10,7 @@
 
 namespace {
 
-std::string textOf(const std::optional<bool>& isOn, const char* otherwise) {
+std::string textOf(const std::optional<bool>& isOn, const std::string& otherwise) {
   if (!isOn) return otherwise;
   return *isOn ? "on" : "off";
 }
@@ -17,10 +18,7 @@ std::string textOf(const std::optional<bool>& isOn, const char* otherwise) {
 }  // namespace
 
 QVToolStatus QVReportingCommand::run(const QVToolContext& context, const Options& options) {
-  if (options.operation == Operation::show) {
-    show(context);
-    return QVToolStatus::done;
-  }
+  if (options.operation == Operation::show) return show(context);
   const bool isOn = options.operation == Operation::on;
   const bool isPosted = QVSwitchControl(context.places).set(isOn);
   if (context.output.isJSON()) {
@@ -32,20 +30,34 @@ QVToolStatus QVReportingCommand::run(const QVToolContext& context, const Options
   return QVToolStatus::done;
 }
 
-void QVReportingCommand::show(const QVToolContext& context) {
+QVToolStatus QVReportingCommand::show(const QVToolContext& context) {
   const auto isWanted = QVSwitchControl(context.places).isOn();
   std::optional<bool> isReporting;
-  if (QVServiceState::find(context.places).isRunning()) {
-    isReporting = QVServiceConnection(context.places).isReporting();
+  std::string problem;
+  auto status = QVToolStatus::done;
+  try {
+    using Kind = QVServiceState::Kind;
+    const QVServiceState state = QVServiceState::find(context.places);
+    if (state.isRunning()) isReporting = QVServiceConnection(context.places).isReporting();
+    if (state.kind == Kind::unknown || state.kind == Kind::unreachable) {
+      throw QVToolFailure(QVToolStatus::notRunning, state.complaint(context.places));
+    }
+  } catch (const QVToolFailure& failure) {
+    problem = failure.what();
+    status = failure.status();
   }
   if (context.output.isJSON()) {
     const auto value = [](const std::optional<bool>& isOn) {
       return isOn ? QVValue(*isOn) : QVValue();
     };
-    context.output.json(
-        QVDictionary{{"reporting", value(isReporting)}, {"reportingPreference", value(isWanted)}});
-    return;
+    const QVDictionary shown{{"reporting", value(isReporting)},
+                             {"reportingPreference", value(isWanted)}};
+    context.output.json(problem.empty() ? shown : shown.merging({{"problem", problem}}));
+    return status;
   }
-  context.output.line("service     " + textOf(isReporting, "not running"));
+  const std::string otherwise =
+      problem.empty() ? "not running" : "cannot be asked: " + QVDisplayText(problem);
+  context.output.line("service     " + textOf(isReporting, otherwise));
   context.output.line("preference  " + textOf(isWanted, "cannot be read"));
+  return status;
 }

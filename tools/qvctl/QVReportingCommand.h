@@ -3,7 +3,8 @@
 #include "tools/qvctl/QVToolContext.h"
 #include "tools/qvctl/QVToolFailure.h"
 
-// qvctl reporting on, off, show: the reporting switch.
+// qvctl reporting on, off, show: the reporting switch. What the preference says is shown to those,
+// too, who cannot ask the service; the status says why they could not.
 //
 // Threads: one.
 class QVReportingCommand {
@@ -16,5 +17,5 @@ class QVReportingCommand {
   static QVToolStatus run(const QVToolContext& context, const Options& options);
 
  private:
-  static void show(const QVToolContext& context);
+  static QVToolStatus show(const QVToolContext& context);
 };

@@ -1,21 +1,17 @@
 #include "tools/qvctl/QVSendCommand.h"
 
 #include "platform/QVText.h"
+#include "tools/qvctl/QVEnvironment.h"
 #include "tools/qvctl/QVNames.h"
 #include "tools/qvctl/QVServiceConnection.h"
 #include "tools/qvctl/QVTypedValue.h"
 
 #include <charconv>
-#include <cstdlib>
-#include <string_view>
 
 namespace {
 
 void addSessionOfEnvironment(std::vector<int64_t>& sessions) {
-  // There is one thread so far.
-  const char* const value =
-      std::getenv(QVSendCommand::kSessionVariable);  // NOLINT(concurrency-mt-unsafe)
-  const std::string_view text = value == nullptr ? "" : value;
+  const std::string text = QVEnvironment(QVSendCommand::kSessionVariable);
   int64_t session = 0;
   const auto [end, problem] = std::from_chars(text.data(), text.data() + text.size(), session);
   if (text.empty()) return;
@@ -41,7 +37,8 @@ QVToolStatus QVSendCommand::run(const QVToolContext& context, Options options) {
   if (!category) throw wrong(QVText("no category is called \"", options.category, "\""));
   const auto type = QVParseMessageType(options.type);
   if (!type) throw wrong(QVText("no message type is called \"", options.type, "\""));
-  const QVClientPayload payload = QVMakePayload(options.json, options.entries);
+  const QVClientPayload payload =
+      QVMakePayload(QVPayloadOf::message, options.json, options.entries);
 
   QVServiceConnection service(context.places);
   // The service itself says nothing of a message to a session that there is not.
@@ -53,8 +50,7 @@ QVToolStatus QVSendCommand::run(const QVToolContext& context, Options options) {
   const QVClientTargets targets = options.toAll
                                       ? QVClientTargets::everySession()
                                       : QVClientTargets(std::span<const int64_t>(options.sessions));
-  QVServiceConnection::expectTaken(service.client().sendMessageAndWait(
-      payload, QVClientCategory(*category), static_cast<QVClientMessageType>(*type), targets,
-      QVServiceConnection::kTimeLimit));
+  service.ask(&QVClient::sendMessageAndWait, payload, QVClientCategory(*category),
+              static_cast<QVClientMessageType>(*type), targets);
   return QVToolStatus::done;
 }

@@ -10,6 +10,7 @@
 #include <set>
 
 #include <sys/stat.h>
+#include <unistd.h>
 
 namespace {
 
@@ -48,23 +49,31 @@ const char* QVServiceState::word() const {
       return "not running, starts on demand";
     case Kind::running:
       return "running";
+    case Kind::unreachable:
+      return "cannot be reached";
     default:
       return "unknown";
   }
 }
 
 std::string QVServiceState::complaint(const QVToolPlaces& places) const {
+  if (kind == Kind::unreachable) {
+    return "the service cannot be reached: " + places.socketProblem();
+  }
   std::string text = "the service is not running";
   if (kind == Kind::unknown) text = "whether the service runs is not to be seen";
-  text.append(" (").append(places.socket.string()).append(")");
-  return kind == Kind::onDemand ? text.append("; it starts on demand: --start") : text;
+  return text.append(" (").append(places.socket.string()).append(")");
 }
 
 QVServiceState QVServiceState::find(const QVToolPlaces& places) {
   QVServiceState state;
+  if (!places.socketProblem().empty()) {
+    state.kind = Kind::unreachable;
+    return state;
+  }
   struct stat file {};
   if (::stat(places.socket.c_str(), &file) != 0) {
-    if (errno == EACCES) throw QVToolFailure::ofSystem(places.socket.string(), errno);
+    if (errno == EACCES) throw QVToolFailure::ofFile(places.socket, W_OK, errno);
     state.kind = Kind::stopped;
     return state;
   }

@@ -12,15 +12,16 @@
 // Whether the service runs, found out without connecting to it: that would start one that runs on
 // demand.
 //
-//   stopped   nobody listens at the socket
-//   onDemand  somebody does, who starts the service at the first call, and it does not run
-//   running   the service listens, or has connections
-//   unknown   somebody listens, and this user may not see who
+//   stopped      nobody listens at the socket
+//   onDemand     somebody does, who starts the service at the first call, and it does not run
+//   running      the service listens, or has connections
+//   unknown      somebody listens, and this user may not see who
+//   unreachable  there can be no socket, see QVToolPlaces::socketProblem()
 //
 // The kernel says who listens at the socket's file and who is connected there, /proc says which
 // process is the service.
 struct QVServiceState {
-  enum class Kind { stopped, onDemand, running, unknown };
+  enum class Kind { stopped, onDemand, running, unknown, unreachable };
   struct Client {
     pid_t pid = 0;  // 0 where this user may not see it
     std::string name;

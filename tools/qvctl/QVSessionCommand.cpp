@@ -54,6 +54,5 @@ void QVSessionCommand::start(const QVToolContext& context, int64_t reporterID) {
   if (!service.serviceType(reporterID)) {
     throw QVToolFailure(QVToolStatus::failed, QVText("there is no session ", reporterID));
   }
-  QVServiceConnection::answer(service.client().startReportingSessionForIDAndWait(
-      reporterID, nullptr, QVServiceConnection::kTimeLimit));
+  service.ask(&QVClient::startReportingSessionForIDAndWait, reporterID, nullptr);
 }

@@ -22,14 +22,14 @@
 
 namespace {
 
-constexpr auto kTimeLimit = QVServiceConnection::kTimeLimit;
-
 // Requests that may wait for the keeper.
 constexpr int kBacklog = 16;
 // Bytes of an answer: a status and a text for people.
 constexpr std::size_t kAnswerBytes = 4096;
 // How long either side waits for the other: the service's answer, and a little.
-constexpr timeval kPatience{.tv_sec = 40, .tv_usec = 0};
+constexpr timeval kPatience{
+    .tv_sec = std::chrono::ceil<std::chrono::seconds>(QVServiceConnection::kTimeLimit).count() + 5,
+    .tv_usec = 0};
 
 struct Answer {
   QVToolStatus status = QVToolStatus::done;
@@ -59,11 +59,18 @@ void send(int descriptor, const Answer& answer) {
   static_cast<void>(::write(descriptor, bytes.data(), bytes.size()));
 }
 
-bool isTrusted(int connection) {
+// Whose process is at the other end, as the kernel has it.
+uid_t userOf(int connection) {
   ucred peer{};
   socklen_t length = sizeof peer;
-  return ::getsockopt(connection, SOL_SOCKET, SO_PEERCRED, &peer, &length) == 0 &&
-         (peer.uid == ::geteuid() || peer.uid == 0);
+  const bool isKnown = ::getsockopt(connection, SOL_SOCKET, SO_PEERCRED, &peer, &length) == 0;
+  return isKnown ? peer.uid : static_cast<uid_t>(-1);
+}
+
+// Whether a keeper listens to it.
+bool isTrusted(int connection) {
+  const uid_t user = userOf(connection);
+  return user == ::geteuid() || user == 0;
 }
 
 QVDescriptor makeSocket() {
@@ -99,11 +106,10 @@ void detach() {
 Answer carryOut(QVServiceConnection& service, int64_t reporterID,
                 QVSessionKeeper::Request request) {
   try {
-    QVClient& client = service.client();
-    QVServiceConnection::answer(
-        request == QVSessionKeeper::Request::stop
-            ? client.stopReportingSessionForIDAndWait(reporterID, kTimeLimit)
-            : client.destroyReportingSessionAndWait(reporterID, kTimeLimit));
+    service.ask(request == QVSessionKeeper::Request::stop
+                    ? &QVClient::stopReportingSessionForIDAndWait
+                    : &QVClient::destroyReportingSessionAndWait,
+                reporterID);
     return {};
   } catch (const QVToolFailure& failure) {
     return {failure.status(), failure.what()};
@@ -113,6 +119,10 @@ Answer carryOut(QVServiceConnection& service, int64_t reporterID,
 }  // namespace
 
 sockaddr_un QVSessionKeeper::address(int64_t reporterID) const {
+  const std::string problem = places_.socketProblem();
+  if (!problem.empty()) {
+    throw QVToolFailure(QVToolStatus::notRunning, "the service cannot be reached: " + problem);
+  }
   struct stat file {};
   if (::stat(places_.socket.c_str(), &file) != 0) {
     throw QVToolFailure::ofSystem(places_.socket.string(), errno, QVToolStatus::notRunning);
@@ -156,8 +166,7 @@ void QVSessionKeeper::keep(const QVSessionSetup& setup, bool startSession, int r
       throw QVToolFailure::ofSystem("the keeper's socket", errno);
     }
     if (startSession) {
-      QVServiceConnection::answer(
-          service.client().startReportingSessionForIDAndWait(session, nullptr, kTimeLimit));
+      service.ask(&QVClient::startReportingSessionForIDAndWait, session, nullptr);
     }
     send(report, {QVToolStatus::done, std::to_string(session)});
     ::close(report);
@@ -186,15 +195,11 @@ void QVSessionKeeper::serve(QVServiceConnection& service, int64_t reporterID, in
       return;
     }
     const QVDescriptor connection(::accept4(listener, nullptr, nullptr, SOCK_CLOEXEC));
-    if (!connection.isOpen()) continue;
+    // Others are not even waited for.
+    if (!connection.isOpen() || !isTrusted(connection.get())) continue;
     char request = 0;
     ::setsockopt(connection.get(), SOL_SOCKET, SO_RCVTIMEO, &kPatience, sizeof kPatience);
     if (::read(connection.get(), &request, 1) != 1) continue;
-    if (!isTrusted(connection.get())) {
-      send(connection.get(),
-           {QVToolStatus::notPermitted, QVText("session ", reporterID, " is another user's")});
-      continue;
-    }
     const bool isEnd = request == static_cast<char>(Request::destroy);
     if (!isEnd && request != static_cast<char>(Request::stop)) continue;
     const Answer answer = carryOut(service, reporterID, static_cast<Request>(request));
@@ -206,12 +211,16 @@ void QVSessionKeeper::serve(QVServiceConnection& service, int64_t reporterID, in
 void QVSessionKeeper::ask(int64_t reporterID, Request request) const {
   const QVDescriptor connection = makeSocket();
   const sockaddr_un place = address(reporterID);
-  if (::connect(connection.get(), generic(place), sizeof place) != 0 ||
-      !isTrusted(connection.get())) {
+  if (::connect(connection.get(), generic(place), sizeof place) != 0) {
     throw QVToolFailure(QVToolStatus::failed,
                         QVText("session ", reporterID,
                                " was not created with qvctl session create; "
                                "its own program alone can stop and destroy it"));
+  }
+  // That keeper would not listen; or it is none, and would say anything.
+  if (::geteuid() != 0 && userOf(connection.get()) != ::geteuid()) {
+    throw QVToolFailure(QVToolStatus::notPermitted,
+                        QVText("session ", reporterID, " is another user's"));
   }
   const char byte = static_cast<char>(request);
   if (::send(connection.get(), &byte, 1, MSG_NOSIGNAL) != 1) {

@@ -15,7 +15,8 @@
 //
 // The process ends with the session, with the service, and when it is asked to end (SIGTERM). It is
 // reached at an abstract unix socket, named after the service's socket and the session; only the
-// user who made it, and root, are listened to. No file is left behind.
+// user who made it, and root, are listened to, others' connections are closed at once. No file is
+// left behind.
 //
 // Threads: one at a time; start() has to come before there are others.
 class QVSessionKeeper {
@@ -30,7 +31,8 @@ class QVSessionKeeper {
   Kept start(const QVSessionSetup& setup, bool startSession) const;
 
   enum class Request : char { stop = 's', destroy = 'd' };
-  // Has a session's keeper do it. Failures: QVToolFailure, failed where the session has none.
+  // Has a session's keeper do it. Failures: QVToolFailure, failed where the session has none,
+  // notPermitted where it is another user's.
   void ask(int64_t reporterID, Request request) const;
 
  private:

@@ -52,8 +52,7 @@ class Session {
         category_(QVParseCategory(options.category).value_or(0)),
         program_(std::filesystem::path(options.command[0]).filename().string()),
         reporterID_(options.setup.create(service_)) {
-    QVServiceConnection::answer(service_.client().startReportingSessionForIDAndWait(
-        reporterID_, nullptr, QVServiceConnection::kTimeLimit));
+    service_.ask(&QVClient::startReportingSessionForIDAndWait, reporterID_, nullptr);
     QVClientPayload message;
     message.set("command", program_);
     send(message, QVClientMessageType::start);
@@ -86,14 +85,13 @@ class Session {
 
   void finish(const QVClientPayload& message) {
     send(message, QVClientMessageType::stop);
-    QVServiceConnection::answer(service_.client().stopReportingSessionForIDAndWait(
-        reporterID_, QVServiceConnection::kTimeLimit));
+    service_.ask(&QVClient::stopReportingSessionForIDAndWait, reporterID_);
   }
 
   // Reporting that is switched off is no reason not to run the command.
   void send(const QVClientPayload& message, QVClientMessageType type) {
-    const QVClientError error = service_.client().sendMessageAndWait(
-        message, QVClientCategory(category_), type, reporterID_, QVServiceConnection::kTimeLimit);
+    const QVClientError error = service_.wait(&QVClient::sendMessageAndWait, message,
+                                              QVClientCategory(category_), type, reporterID_);
     if (error) QVToolOutput::note("not reported: " + error.text());
   }
 

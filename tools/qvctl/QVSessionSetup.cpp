@@ -8,8 +8,6 @@
 
 namespace {
 
-constexpr auto kTimeLimit = QVServiceConnection::kTimeLimit;
-
 QVClientServiceType typeOf(const std::string& name) {
   const auto type = QVParseServiceType(name);
   if (!type) {
@@ -21,25 +19,28 @@ QVClientServiceType typeOf(const std::string& name) {
 
 }  // namespace
 
+QVClientPayload QVSessionSetup::values() const {
+  return QVMakePayload(QVPayloadOf::configuration, configuration, entries);
+}
+
 void QVSessionSetup::check() const {
   typeOf(service);
   // Standard input can be read once only.
-  if (configuration != "-") QVMakePayload(configuration, entries);
+  if (configuration != "-") values();
   if (reporterID == 0) throw QVToolFailure(QVToolStatus::wrongUsage, "0 is no session's ID");
 }
 
 int64_t QVSessionSetup::create(QVServiceConnection& connection) const {
   const int64_t session = reporterID.value_or(::getpid());
   const QVClientServiceType type = typeOf(service);
-  const QVClientPayload values = QVMakePayload(configuration, entries);
+  const QVClientPayload configured = values();
   if (connection.serviceType(session)) {
     throw QVToolFailure(QVToolStatus::failed, QVText("there is a session ", session, " already"));
   }
-  QVClient& client = connection.client();
-  QVServiceConnection::answer(client.createReportingSessionAndWait(session, kTimeLimit));
-  QVServiceConnection::answer(client.setServiceTypeAndWait(type, session, kTimeLimit));
-  if (!values.entries().empty()) {
-    QVServiceConnection::answer(client.setConfigurationAndWait(values, session, kTimeLimit));
+  connection.ask(&QVClient::createReportingSessionAndWait, session);
+  connection.ask(&QVClient::setServiceTypeAndWait, type, session);
+  if (!configured.entries().empty()) {
+    connection.ask(&QVClient::setConfigurationAndWait, configured, session);
   }
   return session;
 }

@@ -23,4 +23,7 @@ struct QVSessionSetup {
   void check() const;
   // Creates the session over this connection, to which it belongs; answers its ID.
   int64_t create(QVServiceConnection& connection) const;
+
+ private:
+  QVClientPayload values() const;
 };

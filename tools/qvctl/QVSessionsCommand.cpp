@@ -65,7 +65,10 @@ std::vector<QVSessionsCommand::Session> QVSessionsCommand::find(const QVToolCont
   const QVServiceState state = QVServiceState::find(context.places);
   const bool mayAsk = state.isRunning() || state.kind == QVServiceState::Kind::unknown;
   if (!mayAsk && !options.start) {
-    throw QVToolFailure(QVToolStatus::notRunning, state.complaint(context.places));
+    const bool startsOnDemand = state.kind == QVServiceState::Kind::onDemand;
+    throw QVToolFailure(
+        QVToolStatus::notRunning,
+        state.complaint(context.places) + (startsOnDemand ? "; it starts on demand: --start" : ""));
   }
   QVServiceConnection service(context.places);
   std::vector<Session> sessions;

@@ -118,7 +118,7 @@ QVValue QVStatusCommand::json(const Findings& findings) const {
                              {"losses", QVDictionary::assemble(losses)}});
   }
   if (!store.problem.empty()) stored = stored.merging({{"problem", store.problem}});
-  return QVDictionary{
+  const QVDictionary status{
       {"running",
        state.kind == QVServiceState::Kind::unknown ? QVValue() : QVValue(state.isRunning())},
       {"state", state.word()},
@@ -130,6 +130,8 @@ QVValue QVStatusCommand::json(const Findings& findings) const {
       {"reporting", optionalOf(findings.isReporting)},
       {"reportingPreference", optionalOf(findings.isWanted)},
       {"store", stored}};
+  const std::string problem = context_.places.socketProblem();
+  return problem.empty() ? status : status.merging({{"problem", problem}});
 }
 
 void QVStatusCommand::showLine(const char* title, const std::string& text, Style style) const {
@@ -144,7 +146,8 @@ void QVStatusCommand::show(const Findings& findings) const {
   std::string service = state.word();
   if (state.pid != 0) service.append(QVText(", process ", state.pid));
   showLine("service", service, state.isRunning() ? Style::good : Style::bad);
-  showLine("socket", QVDisplayText(context_.places.socket.string()));
+  const std::string problem = context_.places.socketProblem();
+  showLine("socket", QVDisplayText(problem.empty() ? context_.places.socket.string() : problem));
   if (state.since) {
     const std::chrono::microseconds elapsed(QVTimeNow() - *state.since);
     showLine("since",

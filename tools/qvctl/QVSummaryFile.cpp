@@ -1,16 +1,21 @@
 #include "tools/qvctl/QVSummaryFile.h"
 
 #include "platform/QVText.h"
-#include "platform/linux/files/QVJSONFile.h"
+#include "platform/linux/files/QVJSONScan.h"
 #include "platform/linux/files/QVRegularFile.h"
+#include "tools/qvctl/QVDisplayText.h"
+#include "tools/qvctl/QVTimeText.h"
 #include "tools/qvctl/QVToolFailure.h"
 
 #include <algorithm>
 #include <cerrno>
 #include <charconv>
-#include <cmath>
-#include <string_view>
+#include <chrono>
+#include <optional>
 #include <system_error>
+#include <utility>
+
+#include <unistd.h>
 
 namespace {
 
@@ -18,11 +23,40 @@ constexpr std::string_view kMiddle = "-quietvox-";
 constexpr std::string_view kEnd = ".json";
 constexpr std::size_t kDateBytes = std::string_view("20261116-061300+0000").size();
 
-// The key that the summary event, and no other message, begins with.
-constexpr std::string_view kSummaryKey = "QV_Session_Summary_Event";
+// Bytes of a part of the text.
+constexpr std::size_t kPartBytes = std::size_t{64} << 10;
 
 bool isSummaryName(std::string_view name) {
   return name.ends_with(kEnd) && name.find(kMiddle) == kDateBytes;
+}
+
+// When the file was written; 0 where it has gone.
+int64_t writtenAt(const std::filesystem::path& path) {
+  std::error_code gone;
+  const auto time = std::filesystem::last_write_time(path, gone);
+  if (gone) return 0;
+  const auto since = std::chrono::file_clock::to_sys(time).time_since_epoch();
+  return std::chrono::floor<std::chrono::microseconds>(since).count();
+}
+
+QVRegularFile opened(const std::filesystem::path& path) {
+  QVRegularFile file(path.string(), QVRegularFile::Links::follow);
+  const int error = file.error();
+  if (error == 0) return file;
+  if (error != QVRegularFile::kIrregular) throw QVToolFailure::ofFile(path, R_OK, error);
+  throw QVToolFailure(QVToolStatus::failed,
+                      QVText(path.string(), ": ", QVRegularFile::reason(error, 0)));
+}
+
+// Why there is no such summary among `count` of them.
+QVToolFailure missing(const std::filesystem::path& directory, const std::string& word,
+                      std::size_t count) {
+  if (count == 0) {
+    return {QVToolStatus::failed, QVText("there are no summaries in ", directory.string(),
+                                         "; sessions leave them on an internal build alone")};
+  }
+  return {QVToolStatus::failed, QVText(directory.string(), ": no summary ", word, ": there ",
+                                       count == 1 ? "is " : "are ", count)};
 }
 
 }  // namespace
@@ -32,9 +66,12 @@ QVSummaryFile::QVSummaryFile(std::filesystem::path path) : path_(std::move(path)
   const auto size = std::filesystem::file_size(path_, gone);
   bytes_ = gone ? 0 : size;
   const std::string file = path_.filename().string();
-  if (!isSummaryName(file)) return;
-  date_ = file.substr(0, kDateBytes);
-  const std::string_view rest = std::string_view(file).substr(kDateBytes + kMiddle.size());
+  const std::string_view name = file;
+  const bool isNamed = isSummaryName(name);
+  const auto date = isNamed ? QVParseStamp(name.substr(0, kDateBytes)) : std::nullopt;
+  stopped_ = date ? *date : writtenAt(path_);
+  if (!isNamed) return;
+  const std::string_view rest = name.substr(kDateBytes + kMiddle.size());
   const std::string_view names = rest.substr(0, rest.size() - kEnd.size());
   // Service types' names have no "-".
   const std::size_t dash = names.rfind('-');
@@ -43,31 +80,20 @@ QVSummaryFile::QVSummaryFile(std::filesystem::path path) : path_(std::move(path)
   service_ = names.substr(dash + 1);
 }
 
-std::string QVSummaryFile::dateText() const {
-  if (date_.empty()) return {};
-  const auto part = [this](std::size_t from, std::size_t count) {
-    return date_.substr(from, count);
-  };
-  return QVText(part(0, 4), "-", part(4, 2), "-", part(6, 2), " ", part(9, 2), ":", part(11, 2),
-                ":", part(13, 2), " ", part(15, 5));
-}
-
 std::vector<QVSummaryFile> QVSummaryFile::list(const std::filesystem::path& directory) {
-  std::vector<std::pair<std::filesystem::file_time_type, std::filesystem::path>> found;
+  std::vector<QVSummaryFile> files;
   std::error_code error;
   std::filesystem::directory_iterator entries(directory, error);
   for (; !error && entries != std::filesystem::directory_iterator(); entries.increment(error)) {
     if (!isSummaryName(entries->path().filename().string())) continue;
-    std::error_code gone;
-    const auto time = std::filesystem::last_write_time(entries->path(), gone);
-    if (!gone) found.emplace_back(time, entries->path());
+    files.push_back(QVSummaryFile(entries->path()));
   }
   if (error && error != std::errc::no_such_file_or_directory) {
-    throw QVToolFailure::ofSystem(directory.string(), error.value());
+    throw QVToolFailure::ofFile(directory, R_OK | X_OK, error.value());
   }
-  std::ranges::sort(found, std::ranges::greater());
-  std::vector<QVSummaryFile> files;
-  for (const auto& [time, path] : found) files.push_back(QVSummaryFile(path));
+  std::ranges::sort(files, std::ranges::greater(), [](const QVSummaryFile& file) {
+    return std::pair(file.stopped_, file.path_.native());
+  });
   return files;
 }
 
@@ -75,60 +101,41 @@ QVSummaryFile QVSummaryFile::choose(const std::filesystem::path& directory,
                                     const std::string& word) {
   if (word.find('/') != std::string::npos) return QVSummaryFile(word);
   const std::vector<QVSummaryFile> files = list(directory);
-  std::size_t place = 0;
+  std::size_t place = word.empty() ? 1 : 0;
   const char* const end = word.data() + word.size();
   const auto [stop, problem] = std::from_chars(word.data(), end, place);
-  const bool isPlace = problem == std::errc() && stop == end;
-  if (word.empty() || isPlace) {
-    if (word.empty()) place = 1;
-    if (place >= 1 && place <= files.size()) return files[place - 1];
-    throw QVToolFailure(QVToolStatus::failed,
-                        QVText(directory.string(), ": there are ", files.size(), " summaries"));
-  }
-  const auto named = std::ranges::find_if(
-      files, [&word](const QVSummaryFile& file) { return file.path_.filename() == word; });
-  if (named != files.end()) return *named;
-  throw QVToolFailure(QVToolStatus::failed,
-                      QVText(directory.string(), ": there is no summary ", word));
+  const bool isPlace = word.empty() || (problem == std::errc() && stop == end);
+  const auto chosen =
+      isPlace ? files.begin() + static_cast<std::ptrdiff_t>(std::min(place - 1, files.size()))
+              : std::ranges::find_if(files, [&word](const QVSummaryFile& file) {
+                  return file.path_.filename() == word;
+                });
+  if (chosen != files.end()) return *chosen;
+  throw missing(directory, word, files.size());
 }
 
-std::string QVSummaryFile::text() const {
-  const QVRegularFile file(path_.string(), QVRegularFile::Links::follow);
-  std::string text;
-  const int error = file.error() != 0 ? file.error() : file.read(kMaximumBytes, text);
-  if (error == EACCES) throw QVToolFailure::ofSystem(path_.string(), error);
-  if (error != 0) {
-    throw QVToolFailure(QVToolStatus::failed,
-                        QVText(path_.string(), ": ", QVRegularFile::reason(error, kMaximumBytes)));
-  }
-  return text;
-}
-
-QVArray QVSummaryFile::contents() const {
+void QVSummaryFile::scan(QVJSONReceiver& receiver) const {
   QVJSONFailure failure;
-  const auto value = QVJSONFile::parse(text(), failure);
-  if (!value || value->kind() != QVValue::Kind::array) {
-    const std::string reason = value ? "no JSON array" : failure.description();
-    throw QVToolFailure(QVToolStatus::failed, QVText(path_.string(), ": ", reason));
-  }
-  return value->array();
+  if (QVScanJSONArray(opened(path_), receiver, failure)) return;
+  throw QVToolFailure(QVToolStatus::failed, QVText(path_.string(), ": ", failure.description()));
 }
 
-QVSummaryFile::Columns QVSummaryFile::columns(const QVArray& contents) {
-  Columns columns;
-  // The first entry is the session's configuration.
-  for (std::size_t i = 1; i < contents.size(); ++i) {
-    if (contents[i].kind() != QVValue::Kind::dictionary) continue;
-    for (const auto& [identifier, message] : contents[i].dictionary()) {
-      if (message.kind() != QVValue::Kind::dictionary) continue;
-      const QVDictionary entries = message.dictionary();
-      if (entries.contains(kSummaryKey)) continue;
-      ++columns.messages;
-      for (const auto& [key, value] : entries) {
-        if (!value.isNumber() || !std::isfinite(value.doubleValue())) continue;
-        columns.byKey[std::string(key)].emplace_back(columns.messages, value.doubleValue());
-      }
-    }
+void QVSummaryFile::check() const {
+  QVJSONReceiver nobody;
+  scan(nobody);
+}
+
+void QVSummaryFile::read(const std::function<void(std::string_view part)>& receiver) const {
+  const QVRegularFile file = opened(path_);
+  std::string part;
+  uint64_t offset = 0;
+  while (true) {
+    const int error = file.readPart(offset, kPartBytes, part);
+    if (error != 0) throw QVToolFailure::ofSystem(path_.string(), error);
+    if (part.empty()) return;
+    // What is cut off is read again; at the file's end there is nothing that it could go on with.
+    const std::size_t whole = part.size() < kPartBytes ? part.size() : QVWholeCharacters(part);
+    receiver(std::string_view(part).substr(0, whole));
+    offset += whole;
   }
-  return columns;
 }

@@ -20,6 +20,9 @@ namespace {
 
 constexpr const char* kDisableKey = "disable_reporting";
 
+// Symbolic links that lead from one to the next, as many as the kernel follows.
+constexpr int kMaximumLinks = 40;
+
 // What the file is where there was none: the service has to read it whatever this user's umask.
 constexpr mode_t kPreferencesMode = 0644;
 // Of the notification's file, which whoever may post may touch.
@@ -27,7 +30,7 @@ constexpr mode_t kNotificationMode = 0660;
 
 void expectWritable(const std::filesystem::path& directory) {
   if (::access(directory.c_str(), W_OK | X_OK) != 0 && errno != ENOENT) {
-    throw QVToolFailure::ofSystem("cannot change anything in " + directory.string(), errno);
+    throw QVToolFailure::ofFile(directory, W_OK | X_OK, errno);
   }
 }
 
@@ -50,7 +53,7 @@ QVDictionary QVSwitchControl::read() const {
   auto values = QVJSONFile::readDictionary(path, failure);
   if (values) return *std::move(values);
   if (failure.missing) return {};
-  if (::access(path.c_str(), R_OK) != 0) throw QVToolFailure::ofSystem(path, errno);
+  if (::access(path.c_str(), R_OK) != 0) throw QVToolFailure::ofFile(path, R_OK, errno);
   throw QVToolFailure(QVToolStatus::failed, QVText(path, ": ", failure.description()));
 }
 
@@ -64,22 +67,43 @@ std::optional<bool> QVSwitchControl::isOn() const {
 
 bool QVSwitchControl::set(bool on) const {
   const QVDictionary values = read();
-  checkPermission();
-  write(values.merging({{kDisableKey, !on}}));
+  const std::filesystem::path file = target();
+  checkPermission(file);
+  write(file, values.merging({{kDisableKey, !on}}));
   return post();
 }
 
+std::filesystem::path QVSwitchControl::target() const {
+  std::filesystem::path path = places_.servicePreferences();
+  std::error_code error;
+  for (int i = 0; std::filesystem::is_symlink(path, error); ++i) {
+    if (places_.isOtherRoot) {
+      throw QVToolFailure(QVToolStatus::failed,
+                          path.string() + ": a symbolic link, which is not followed with --root");
+    }
+    if (i == kMaximumLinks) {
+      throw QVToolFailure::ofSystem(places_.servicePreferences().string(), ELOOP);
+    }
+    const auto next = std::filesystem::read_symlink(path, error);
+    if (error) throw QVToolFailure::ofFile(path, R_OK, error.value());
+    // One that is absolute takes the place of all of it.
+    path = path.parent_path() / next;
+  }
+  return path;
+}
+
 // Before anything is changed: a preference without its notification would take effect some day.
-void QVSwitchControl::checkPermission() const {
-  expectWritable(places_.directories.preferences());
+void QVSwitchControl::checkPermission(const std::filesystem::path& file) const {
+  expectWritable(file.parent_path());
   expectWritable(places_.directories.notifications());
 }
 
-void QVSwitchControl::write(const QVDictionary& values) const {
-  const std::filesystem::path path = places_.servicePreferences();
+void QVSwitchControl::write(const std::filesystem::path& path, const QVDictionary& values) const {
+  // Not that of a link's file: where that is missing, the link is wrong.
+  const std::filesystem::path directory = places_.directories.preferences();
   std::error_code error;
-  std::filesystem::create_directories(path.parent_path(), error);
-  if (error) throw QVToolFailure::ofSystem(path.parent_path().string(), error.value());
+  std::filesystem::create_directories(directory, error);
+  if (error) throw QVToolFailure::ofSystem(directory.string(), error.value());
   struct stat before {};
   const bool isNew = ::stat(path.c_str(), &before) != 0;
   QVPosixAtomicFile file(path.string(), QVDescriptor(::open(path.parent_path().c_str(),

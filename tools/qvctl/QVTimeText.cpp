@@ -49,10 +49,14 @@ bool takeNumber(std::string_view& text, std::size_t digits, int& number) {
   return true;
 }
 
-bool take(std::string_view& text, char character) {
-  if (!text.starts_with(character)) return false;
-  text.remove_prefix(1);
+bool take(std::string_view& text, std::string_view beginning) {
+  if (!text.starts_with(beginning)) return false;
+  text.remove_prefix(beginning.size());
   return true;
+}
+
+bool take(std::string_view& text, char character) {
+  return take(text, std::string_view(&character, 1));
 }
 
 // ".5" as microseconds; nothing is none.
@@ -70,6 +74,10 @@ bool takeFraction(std::string_view& text, int64_t& fraction) {
   return digits > 0;
 }
 
+bool isClock(const tm& parts) {
+  return parts.tm_hour < 24 && parts.tm_min < 60 && parts.tm_sec <= 60;
+}
+
 bool takeClock(std::string_view& text, tm& parts, int64_t& fraction) {
   if (!takeNumber(text, 2, parts.tm_hour) || !take(text, ':') ||
       !takeNumber(text, 2, parts.tm_min)) {
@@ -78,12 +86,13 @@ bool takeClock(std::string_view& text, tm& parts, int64_t& fraction) {
   if (take(text, ':') && !(takeNumber(text, 2, parts.tm_sec) && takeFraction(text, fraction))) {
     return false;
   }
-  return parts.tm_hour < 24 && parts.tm_min < 60 && parts.tm_sec <= 60;
+  return isClock(parts);
 }
 
-bool takeDate(std::string_view& text, tm& parts) {
-  if (!takeNumber(text, 4, parts.tm_year) || !take(text, '-') ||
-      !takeNumber(text, 2, parts.tm_mon) || !take(text, '-') ||
+// `between`: what parts its numbers.
+bool takeDate(std::string_view& text, tm& parts, std::string_view between) {
+  if (!takeNumber(text, 4, parts.tm_year) || !take(text, between) ||
+      !takeNumber(text, 2, parts.tm_mon) || !take(text, between) ||
       !takeNumber(text, 2, parts.tm_mday)) {
     return false;
   }
@@ -114,7 +123,7 @@ int64_t local(tm parts, int64_t fraction = 0) {
 std::optional<int64_t> parseDate(std::string_view text) {
   tm parts{};
   int64_t fraction = 0;
-  if (!takeDate(text, parts)) return std::nullopt;
+  if (!takeDate(text, parts, "-")) return std::nullopt;
   if ((take(text, 'T') || take(text, ' ')) && !takeClock(text, parts, fraction)) {
     return std::nullopt;
   }
@@ -174,6 +183,22 @@ std::optional<int64_t> QVParseTime(std::string_view text, int64_t now) {
   if (takeClock(rest, parts, fraction) && rest.empty()) return local(parts, fraction);
   if (const auto before = QVParseDuration(text)) return now - before->count();
   return std::nullopt;
+}
+
+std::optional<int64_t> QVParseStamp(std::string_view text) {
+  tm parts{};
+  int hours = 0;
+  int minutes = 0;
+  const bool hasTime = takeDate(text, parts, "") && take(text, '-') &&
+                       takeNumber(text, 2, parts.tm_hour) && takeNumber(text, 2, parts.tm_min) &&
+                       takeNumber(text, 2, parts.tm_sec) && isClock(parts);
+  const bool isWest = text.starts_with('-');
+  if (!hasTime || !(take(text, '+') || take(text, '-'))) return std::nullopt;
+  if (!takeNumber(text, 2, hours) || !takeNumber(text, 2, minutes) || !text.empty()) {
+    return std::nullopt;
+  }
+  const int64_t east = hours * kHour + minutes * kMinute;
+  return int64_t{::timegm(&parts)} * kSecond + (isWest ? east : -east);
 }
 
 int64_t QVTimeNow() {

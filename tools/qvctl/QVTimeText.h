@@ -18,6 +18,9 @@ std::optional<std::chrono::microseconds> QVParseDuration(std::string_view text);
 // and a duration, "10m", for that long before `now`. Nothing for anything else.
 std::optional<int64_t> QVParseTime(std::string_view text, int64_t now);
 
+// "20261121-062001+0100", as the names of summaries begin. Nothing for anything else.
+std::optional<int64_t> QVParseStamp(std::string_view text);
+
 // The time of the system's clock.
 int64_t QVTimeNow();
 

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <filesystem>
 #include <stdexcept>
 #include <string>
 
@@ -25,6 +26,11 @@ class QVToolFailure : public std::runtime_error {
   // what the system says, else `status`.
   static QVToolFailure ofSystem(const std::string& path, int number,
                                 QVToolStatus status = QVToolStatus::failed);
+
+  // The same on a file, which this user wanted to `access()` with that mode (R_OK | W_OK | X_OK):
+  // where it is the file's permissions that refuse, the text says who may.
+  static QVToolFailure ofFile(const std::filesystem::path& path, int mode, int number,
+                              QVToolStatus status = QVToolStatus::failed);
 
   QVToolStatus status() const noexcept { return status_; }
 

@@ -1,6 +1,6 @@
 #include "tools/qvctl/QVToolLog.h"
 
-#include "tools/qvctl/QVToolOutput.h"
+#include <utility>
 
 QVLogScope* QVToolLog::registerScope(bool /*enabled*/, uint32_t /*code*/, std::string_view /*name*/,
                                      std::string_view /*domain*/, std::string_view /*verboseKey*/,
@@ -10,5 +10,5 @@ QVLogScope* QVToolLog::registerScope(bool /*enabled*/, uint32_t /*code*/, std::s
 
 void QVToolLog::write(const QVLogScope* /*scope*/, QVLogLevel level, const QVLogSite& /*site*/,
                       std::string text) {
-  if (level == QVLogLevel::error) QVToolOutput::note(text);
+  if (level == QVLogLevel::error) errors_.push_back(std::move(text));
 }

@@ -1,11 +1,11 @@
 #include "tools/qvctl/QVToolOutput.h"
 
 #include "tools/qvctl/QVDisplayText.h"
+#include "tools/qvctl/QVEnvironment.h"
 #include "tools/qvctl/QVToolFailure.h"
 
 #include <cerrno>
 #include <cstdio>
-#include <cstdlib>
 
 #include <sys/ioctl.h>
 #include <unistd.h>
@@ -16,13 +16,7 @@ namespace {
 constexpr std::size_t kBufferBytes = std::size_t{64} * 1024;
 
 bool wantsColours() {
-  // There is one thread so far.
-  // NOLINTBEGIN(concurrency-mt-unsafe)
-  const char* const refusal = std::getenv("NO_COLOR");
-  const char* const terminal = std::getenv("TERM");
-  // NOLINTEND(concurrency-mt-unsafe)
-  if (refusal != nullptr && *refusal != '\0') return false;
-  return terminal == nullptr || std::string_view(terminal) != "dumb";
+  return QVEnvironment("NO_COLOR").empty() && QVEnvironment("TERM") != "dumb";
 }
 
 const char* codeOf(QVToolOutput::Style style) {

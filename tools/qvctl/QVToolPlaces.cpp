@@ -1,8 +1,19 @@
 #include "tools/qvctl/QVToolPlaces.h"
 
 #include "client/QVClientOptions.h"
+#include "platform/QVText.h"
 
 #include <cstdlib>
+
+#include <sys/stat.h>
+#include <sys/un.h>
+
+namespace {
+
+// Bytes of a socket's path; its address has a NUL besides.
+constexpr std::size_t kLongestSocketPath = sizeof(sockaddr_un::sun_path) - 1;
+
+}  // namespace
 
 QVToolPlaces QVToolPlaces::find(const std::string& socket, const std::string& root) {
   QVToolPlaces places;
@@ -10,6 +21,7 @@ QVToolPlaces QVToolPlaces::find(const std::string& socket, const std::string& ro
     places.directories = QVServiceDirectories::fromEnvironment();
   } else {
     const std::filesystem::path top(root);
+    places.isOtherRoot = true;
     places.directories = {.runtime = top / "run/quietvox",
                           .state = top / "var/lib/quietvox",
                           .configuration = top / "etc/quietvox",
@@ -26,4 +38,15 @@ QVToolPlaces QVToolPlaces::find(const std::string& socket, const std::string& ro
     places.socket = places.directories.socket();
   }
   return places;
+}
+
+std::string QVToolPlaces::socketProblem() const {
+  if (socket.native().size() > kLongestSocketPath) {
+    return QVText(socket.string(), ": a socket's path has ", kLongestSocketPath,
+                  " bytes at the most");
+  }
+  struct stat file {};
+  if (::stat(socket.c_str(), &file) != 0 || S_ISSOCK(file.st_mode)) return {};
+  return QVText(socket.string(),
+                S_ISDIR(file.st_mode) ? ": a directory, not a socket" : ": not a socket");
 }

@@ -17,8 +17,15 @@ struct QVToolPlaces {
   std::filesystem::path socket;
   QVServiceDirectories directories;
 
+  // Whether this is another system's root directory, whose links lead into that one.
+  bool isOtherRoot = false;
+
   // `socket` and `root` as the command line has them; empty where it has none.
   static QVToolPlaces find(const std::string& socket, const std::string& root);
+
+  // Why no service can be reached at the socket, whether it runs or not: what is there is no
+  // socket, or its path is longer than an address. Names the path; empty where that is not so.
+  std::string socketProblem() const;
 
   // Where sessions leave their summaries on an internal build.
   std::filesystem::path summaries() const {

@@ -73,48 +73,70 @@ QVValue valueThatLooksSo(std::string_view text) {
   return isNumber && real ? QVValue(*real) : QVValue(text);
 }
 
-void put(QVClientPayload& payload, const std::string_view* key, const QVValue& value);
+// Puts values into a payload, and knows where it is: "device.list[2]".
+class Writer {
+ public:
+  Writer(QVPayloadOf use, QVClientPayload& payload) : use_(use), payload_(payload) {}
 
-void putContents(QVClientPayload& payload, const QVDictionary& contents) {
-  for (const auto& [key, value] : contents) put(payload, &key, value);
-}
-
-template <class Scalar>
-void putScalar(QVClientPayload& payload, const std::string_view* key, Scalar value) {
-  if (key != nullptr) {
-    payload.set(*key, value);
-  } else {
-    payload.add(value);
+  void put(std::string_view key, const QVValue& value) {
+    const std::size_t before = place_.size();
+    place_.append(before == 0 ? "" : ".").append(key);
+    put(&key, value);
+    place_.resize(before);
   }
-}
 
-// As deep as the JSON text was read, which is bounded.
-void put(QVClientPayload& payload, const std::string_view* key, const QVValue& value) {
-  switch (value.kind()) {
-    case QVValue::Kind::boolean:
-      return putScalar(payload, key, value.boolean());
-    case QVValue::Kind::integer:
-      return putScalar(payload, key, value.integer());
-    case QVValue::Kind::unsignedInteger:
-      return putScalar(payload, key, value.unsignedInteger());
-    case QVValue::Kind::real:
-      return putScalar(payload, key, value.real());
-    case QVValue::Kind::string:
-      return putScalar(payload, key, value.string());
-    case QVValue::Kind::array:
-      key != nullptr ? payload.beginArray(*key) : payload.beginArray();
-      for (const QVValue& item : value.array()) put(payload, nullptr, item);
-      payload.endArray();
-      return;
-    case QVValue::Kind::dictionary:
-      key != nullptr ? payload.beginDictionary(*key) : payload.beginDictionary();
-      putContents(payload, value.dictionary());
-      payload.endDictionary();
-      return;
-    case QVValue::Kind::absent:
-      throw wrong(key != nullptr ? *key : "an item", "there is no null in messages");
+ private:
+  void putItems(const QVArray& items) {
+    const std::size_t before = place_.size();
+    for (std::size_t i = 0; i < items.size(); ++i) {
+      place_.append(QVText("[", i, "]"));
+      put(nullptr, items[i]);
+      place_.resize(before);
+    }
   }
-}
+
+  template <class Scalar>
+  void putScalar(const std::string_view* key, Scalar value) {
+    if (key != nullptr) {
+      payload_.set(*key, value);
+    } else {
+      payload_.add(value);
+    }
+  }
+
+  // As deep as the JSON text was read, which is bounded.
+  void put(const std::string_view* key, const QVValue& value) {
+    switch (value.kind()) {
+      case QVValue::Kind::boolean:
+        return putScalar(key, value.boolean());
+      case QVValue::Kind::integer:
+        return putScalar(key, value.integer());
+      case QVValue::Kind::unsignedInteger:
+        return putScalar(key, value.unsignedInteger());
+      case QVValue::Kind::real:
+        return putScalar(key, value.real());
+      case QVValue::Kind::string:
+        return putScalar(key, value.string());
+      case QVValue::Kind::array:
+        key != nullptr ? payload_.beginArray(*key) : payload_.beginArray();
+        putItems(value.array());
+        payload_.endArray();
+        return;
+      case QVValue::Kind::dictionary:
+        key != nullptr ? payload_.beginDictionary(*key) : payload_.beginDictionary();
+        for (const auto& [name, item] : value.dictionary()) put(name, item);
+        payload_.endDictionary();
+        return;
+      case QVValue::Kind::absent:
+        throw wrong(place_, use_ == QVPayloadOf::message ? "there is no null in messages"
+                                                         : "there is no null in configurations");
+    }
+  }
+
+  const QVPayloadOf use_;
+  QVClientPayload& payload_;
+  std::string place_;
+};
 
 std::string readStandardInput() {
   std::string text;
@@ -142,6 +164,14 @@ std::string textOf(const std::string& json) {
   return text;
 }
 
+// What the library says, which calls everything a payload.
+std::string reasonOf(const QVClientError& error, const std::string& name) {
+  constexpr std::string_view kPayload = "the payload";
+  std::string text = error.text();
+  const std::size_t at = text.find(kPayload);
+  return at == std::string::npos ? text : text.replace(at, kPayload.size(), name);
+}
+
 }  // namespace
 
 QVTypedValue QVTypedValue::parse(std::string_view entry) {
@@ -155,18 +185,21 @@ QVTypedValue QVTypedValue::parse(std::string_view entry) {
   return {std::string(key.substr(0, colon)), valueOfKind(entry, key.substr(colon + 1), text)};
 }
 
-QVClientPayload QVMakePayload(const std::string& json, const std::vector<std::string>& entries) {
+QVClientPayload QVMakePayload(QVPayloadOf use, const std::string& json,
+                              const std::vector<std::string>& entries) {
+  const std::string name = use == QVPayloadOf::message ? "the payload" : "the configuration";
   QVClientPayload payload;
+  Writer writer(use, payload);
   if (!json.empty()) {
-    const QVValue value = jsonOf("the payload", textOf(json));
-    if (value.kind() != QVValue::Kind::dictionary) throw wrong("the payload", "no JSON object");
-    putContents(payload, value.dictionary());
+    const QVValue value = jsonOf(name, textOf(json));
+    if (value.kind() != QVValue::Kind::dictionary) throw wrong(name, "no JSON object");
+    for (const auto& [key, item] : value.dictionary()) writer.put(key, item);
   }
   for (const std::string& entry : entries) {
     const QVTypedValue typed = QVTypedValue::parse(entry);
-    const std::string_view key = typed.key;
-    put(payload, &key, typed.value);
+    writer.put(typed.key, typed.value);
+    if (!payload.ok()) throw wrong(entry, reasonOf(payload.error(), name));
   }
-  if (!payload.ok()) throw QVToolFailure(QVToolStatus::wrongUsage, payload.error().text());
+  if (!payload.ok()) throw QVToolFailure(QVToolStatus::wrongUsage, reasonOf(payload.error(), name));
   return payload;
 }

@@ -24,7 +24,11 @@ struct QVTypedValue {
   static QVTypedValue parse(std::string_view entry);
 };
 
+// What a payload is for, in the texts of failures.
+enum class QVPayloadOf { message, configuration };
+
 // The entries in the form in which they are sent, with those of `json` before them: a JSON object's
 // text, or "-" for what standard input holds, or "@FILE"; empty for none. Of equal keys the last
 // one counts.
-QVClientPayload QVMakePayload(const std::string& json, const std::vector<std::string>& entries);
+QVClientPayload QVMakePayload(QVPayloadOf use, const std::string& json,
+                              const std::vector<std::string>& entries);

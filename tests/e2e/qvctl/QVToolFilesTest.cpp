@@ -4,19 +4,28 @@
 #include "tests/support/QVDriverProcess.h"
 
 #include <algorithm>
+#include <chrono>
 #include <filesystem>
 #include <fstream>
+#include <set>
+#include <sstream>
 
 #include <gmock/gmock.h>
 
 namespace {
 
 using ::testing::AllOf;
+using ::testing::ElementsAre;
 using ::testing::HasSubstr;
+using ::testing::MatchesRegex;
 using ::testing::Not;
 using ::testing::SizeIs;
+using ::testing::StartsWith;
 
 constexpr uint16_t kTelephony = 2;
+
+// A summary that does not fit into the memory that reading it may take.
+constexpr std::size_t kLargeFileBytes = std::size_t{32} << 20;
 
 class QVToolFilesTest : public QVToolTest {
  protected:
@@ -47,6 +56,38 @@ TEST_F(QVToolFilesTest, ListsSummaries) {
               AllOf(HasSubstr("STOPPED"), HasSubstr("net.example.player")));
 }
 
+TEST_F(QVToolFilesTest, ListsTheLatestSummaryFirst) {
+  std::filesystem::create_directories(directory());
+  const auto now = std::filesystem::file_time_type::clock::now();
+  // Written in another order than the sessions stopped, as copied files are.
+  const auto leave = [&](const std::string& date, const std::string& application, int age) {
+    const auto file = directory() / (date + "-quietvox-" + application + "-telephony.json");
+    std::ofstream(file) << "[{}]";
+    std::filesystem::last_write_time(file, now - std::chrono::hours(age));
+  };
+  leave("20261116-061300+0000", "second", 1);
+  leave("20261116-070000+0100", "third", 2);
+  leave("20261116-031300-0800", "first", 3);
+  leave("20261340-061300+0000", "undated", 0);
+  const QVArray files = json({"summary", "list"}).array();
+  ASSERT_EQ(files.size(), 4U);
+  // What says no date is as old as the file.
+  std::vector<std::string> found;
+  for (const QVValue& file : files) {
+    found.emplace_back(at(file, {"application"}).string());
+  }
+  std::erase(found, "undated");
+  EXPECT_THAT(found, ElementsAre("first", "second", "third"));
+  for (const QVValue& file : files) {
+    EXPECT_THAT(std::string(at(file, {"date"}).string()),
+                MatchesRegex("20[0-9-]+T[0-9:]+\\.[0-9]{6}Z"));
+    if (at(file, {"application"}) == QVValue("third")) {
+      EXPECT_EQ(at(file, {"date"}), QVValue("2026-11-16T06:00:00.000000Z"));
+    }
+  }
+  EXPECT_THAT(run({"summary", "list"}), HasSubstr("2026-11-16 11:13:00  telephony  first"));
+}
+
 TEST_F(QVToolFilesTest, PrintsASummary) {
   leaveSummary();
   const QVValue contents = json({"summary", "show"});
@@ -69,6 +110,49 @@ TEST_F(QVToolFilesTest, SaysThatThereIsNoSuchSummary) {
                                      {"summary", "open", "/nowhere/file"}}) {
     EXPECT_EQ(qvctl(arguments).status, 1) << testing::PrintToString(arguments);
   }
+}
+
+TEST_F(QVToolFilesTest, SaysWhoLeavesSummaries) {
+  for (const Arguments& arguments : {Arguments{"summary", "show"},
+                                     {"summary", "show", "--json"},
+                                     {"summary", "show", "2"},
+                                     {"summary", "plot"},
+                                     {"summary", "plot", "name"},
+                                     {"summary", "open"}}) {
+    const Output output = qvctl(arguments);
+    EXPECT_EQ(output.status, 1) << testing::PrintToString(arguments);
+    EXPECT_THAT(output.error, AllOf(HasSubstr("no summaries in " + directory().string()),
+                                    HasSubstr("internal build")));
+  }
+  leaveSummary();
+  EXPECT_THAT(qvctl({"summary", "show", "2"}).error, HasSubstr("no summary 2: there is 1"));
+}
+
+TEST_F(QVToolFilesTest, TakesLittleMemoryForALargeSummary) {
+  const auto file = root_.path() / "large.json";
+  {
+    std::ofstream stream(file);
+    stream << "[\n  {\n    \"rate\": 48000\n  }";
+    for (int i = 1; i <= 400'000; ++i) {
+      stream << ",\n  {\n    \"Session_Playback_Start_" << i << "\": {\n      \"frames\": " << i
+             << ",\n      \"load\": 0.25\n    }\n  }";
+    }
+    stream << "\n]\n";
+  }
+  ASSERT_GT(std::filesystem::file_size(file), kLargeFileBytes);
+  // Less than the file has, with everything that a program maps.
+  const Arguments limited =
+      kMemoryTells ? Arguments{"prlimit", "--as=" + std::to_string(kLargeFileBytes)} : Arguments{};
+  const Output shown = qvctl({"summary", "show", file}, limited);
+  EXPECT_EQ(shown.status, 0) << shown.error;
+  EXPECT_EQ(shown.out.size(), std::filesystem::file_size(file));
+  const Output compact = qvctl({"summary", "show", file, "--json"}, limited);
+  EXPECT_EQ(compact.status, 0) << compact.error;
+  EXPECT_THAT(compact.out,
+              StartsWith(R"([{"rate":48000},{"Session_Playback_Start_1":{"frames":1,)"));
+  const Output drawn = qvctl({"summary", "plot", file}, limited);
+  EXPECT_EQ(drawn.status, 0) << drawn.error;
+  EXPECT_THAT(drawn.out, HasSubstr("frames  400000 of 400000 messages, last 400000"));
 }
 
 TEST_F(QVToolFilesTest, SaysThatASummaryIsBroken) {
@@ -108,7 +192,34 @@ TEST_F(QVToolFilesTest, DrawsNumbersOverMessages) {
                                "              |   ***\r\n"
                                "          480 |***\r\n"));
   EXPECT_THAT(show({"summary", "plot"}, {{"LC_ALL", "C"}}), Not(HasSubstr("\xE2\xA0")));
-  EXPECT_EQ(qvctl({"summary", "plot", "--key", "route"}).status, 1);
+  for (const Arguments& arguments : {Arguments{"summary", "plot", "--key", "route"},
+                                     {"summary", "plot", "--key", "route", "--json"}}) {
+    const Output output = qvctl(arguments);
+    EXPECT_EQ(output.status, 1);
+    EXPECT_EQ(output.out, "");
+    EXPECT_THAT(output.error, AllOf(HasSubstr("\"route\""), HasSubstr("frames, load, on")));
+  }
+}
+
+TEST_F(QVToolFilesTest, KeepsRowsOfLongNumbersInLine) {
+  const auto file = root_.path() / "file.json";
+  std::ofstream(file) << R"([{}, {"a": {"gain": 89.99999751842225}},
+      {"b": {"gain": -1.7976931348623157e+308}}, {"c": {"gain": 0.1234567890123456}},
+      {"d": {"level": 89.99999751842225}}])";
+  constexpr std::size_t kWidth = 40;
+  std::istringstream lines(run(
+      {"summary", "plot", file, "--width", std::to_string(kWidth), "--ascii", "--height", "5"}));
+  std::size_t rows = 0;
+  std::set<std::size_t> bars;
+  for (std::string line; std::getline(lines, line);) {
+    const std::size_t bar = line.find(" |");
+    if (bar == std::string::npos) continue;
+    ++rows;
+    bars.insert(bar);
+    EXPECT_LE(line.size(), kWidth) << line;
+  }
+  EXPECT_EQ(rows, 10U);
+  EXPECT_THAT(bars, SizeIs(1));
 }
 
 TEST_F(QVToolFilesTest, ShowsWhatDriversPublish) {
@@ -117,7 +228,8 @@ TEST_F(QVToolFilesTest, ShowsWhatDriversPublish) {
   std::ofstream(root_.path() / "status") << "state: RUNNING\nhw_ptr : 4096\n";
   root_.configure("channels.json", R"([{"group": "Kernel", "file": ")" +
                                        (root_.path() / "status").string() + R"("}])");
-  const QVValue channels = json({"channels"});
+  EXPECT_EQ(at(json({"channels"}), {"unreadable"}), QVValue(QVArray{}));
+  const QVValue channels = at(json({"channels"}), {"channels"});
   ASSERT_EQ(channels.array().size(), 2U);
   EXPECT_EQ(channels.array()[0],
             QVValue(QVDictionary{
@@ -126,7 +238,7 @@ TEST_F(QVToolFilesTest, ShowsWhatDriversPublish) {
       channels.array()[1],
       QVValue(QVDictionary{
           {"group", "Kernel"}, {"subgroup", QVValue()}, {"channel", "hw_ptr"}, {"value", 4096}}));
-  EXPECT_EQ(json({"channels", "--group", "Kernel"}).array().size(), 1U);
+  EXPECT_EQ(at(json({"channels", "--group", "Kernel"}), {"channels"}).array().size(), 1U);
   EXPECT_THAT(show({"channels"}), AllOf(HasSubstr("SUBGROUP"), HasSubstr("Speaker")));
 }
 
@@ -142,22 +254,68 @@ TEST_F(QVToolFilesTest, ShowsWhatHasGrown) {
 
   const auto readings = jsonLines({"channels", "--interval", "10ms", "--count", "3"});
   ASSERT_THAT(readings, SizeIs(3));
-  EXPECT_TRUE(at(readings[0].array()[0], {"delta"}).isAbsent());
-  EXPECT_EQ(at(readings[2].array()[0], {"delta"}), QVValue(0));
+  EXPECT_TRUE(at(at(readings[0], {"channels"}).array()[0], {"delta"}).isAbsent());
+  EXPECT_EQ(at(at(readings[2], {"channels"}).array()[0], {"delta"}), QVValue(0));
 }
 
 TEST_F(QVToolFilesTest, GoesOnWithTheOtherDrivers) {
   std::ofstream(root_.runtime() / "channels/Broken") << "no channels";
   QVDriverProcess driver(root_.runtime() / "channels/Speaker", {"--channel", "frames"});
+  const std::string missing = (root_.path() / "status").string();
+  root_.configure("channels.json", R"([{"group": "Kernel", "file": ")" + missing + R"("}])");
   const Output output = qvctl({"channels", "--json"});
   EXPECT_EQ(output.status, 0);
-  EXPECT_THAT(output.error, HasSubstr("Broken"));
-  EXPECT_EQ(parseLines(output.out)[0].array().size(), 1U);
+  const std::string broken = (root_.runtime() / "channels/Broken").string();
+  EXPECT_THAT(output.error, AllOf(HasSubstr("qvctl: " + broken + ": not a file of channels\n"),
+                                  HasSubstr("qvctl: " + missing + ": No such file")));
+  const QVValue reading = parseLines(output.out)[0];
+  EXPECT_EQ(at(reading, {"channels"}).array().size(), 1U);
+  const QVArray unreadable = at(reading, {"unreadable"}).array();
+  ASSERT_EQ(unreadable.size(), 2U);
+  EXPECT_EQ(unreadable[0],
+            QVValue(QVDictionary{{"path", broken}, {"error", "not a file of channels"}}));
+  EXPECT_EQ(at(unreadable[1], {"path"}), QVValue(missing));
+}
+
+TEST_F(QVToolFilesTest, SaysOfEachUnreadableFileOnce) {
+  std::ofstream(root_.runtime() / "channels/Broken") << "no channels";
+  const Output output = qvctl({"channels", "--interval", "10ms", "--count", "3"});
+  EXPECT_EQ(output.status, 0);
+  EXPECT_EQ(std::count(output.error.begin(), output.error.end(), '\n'), 1) << output.error;
+}
+
+TEST_F(QVToolFilesTest, SaysThatTheListOfTheKernelsFilesIsBroken) {
+  root_.configure("channels.json", "{\n");
+  const Output output = qvctl({"channels", "--json"});
+  EXPECT_EQ(output.status, 0);
+  const std::string path = (root_.configuration() / "channels.json").string();
+  EXPECT_THAT(output.error, AllOf(HasSubstr(path), HasSubstr("line 2")));
+  const QVArray unreadable = at(parseLines(output.out)[0], {"unreadable"}).array();
+  ASSERT_EQ(unreadable.size(), 1U);
+  EXPECT_EQ(at(unreadable[0], {"path"}), QVValue(path));
+}
+
+TEST_F(QVToolFilesTest, SaysWhichGroupsThereAre) {
+  QVDriverProcess driver(root_.runtime() / "channels/Speaker", {"--channel", "frames"});
+  root_.configure("channels.json", R"([{"group": "Kernel", "file": "/proc/version"}])");
+  for (const Arguments& arguments :
+       {Arguments{"channels", "--group", "nope"},
+        {"channels", "--group", "nope", "--json"},
+        {"channels", "--group", "nope", "--interval", "10ms", "--count", "1"}}) {
+    const Output output = qvctl(arguments);
+    EXPECT_EQ(output.status, 1) << testing::PrintToString(arguments);
+    EXPECT_THAT(output.error, AllOf(HasSubstr("\"nope\""), HasSubstr("Kernel, Speaker")));
+    EXPECT_EQ(output.out, "");
+  }
 }
 
 TEST_F(QVToolFilesTest, HasNoChannelsWhereNobodyPublishes) {
   std::filesystem::remove(root_.runtime() / "channels");
-  EXPECT_EQ(json({"channels"}), QVValue(QVArray{}));
+  EXPECT_EQ(json({"channels"}),
+            QVValue(QVDictionary{{"channels", QVArray{}}, {"unreadable", QVArray{}}}));
+  const Output output = qvctl({"channels", "--group", "nope"});
+  EXPECT_EQ(output.status, 1);
+  EXPECT_THAT(output.error, HasSubstr("nobody publishes"));
 }
 
 }  // namespace

@@ -1,5 +1,6 @@
 // qvctl send and session.
 
+#include "platform/QVText.h"
 #include "tests/e2e/qvctl/QVToolTest.h"
 
 #include <array>
@@ -21,10 +22,14 @@ namespace {
 using ::testing::AllOf;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
+using ::testing::Not;
 using ::testing::SizeIs;
 using ::testing::StartsWith;
 
 constexpr uint16_t kTelephony = 2;
+
+// A user without rights.
+constexpr uid_t kNobody = 65534;
 
 class QVToolSessionTest : public QVToolTest {
  protected:
@@ -113,6 +118,31 @@ TEST_F(QVToolSessionTest, IsNotForOtherUsers) {
   EXPECT_EQ(run({"session", "destroy", "7"}), "");
 }
 
+TEST_F(QVToolSessionTest, IsNotHeldUpByOtherUsers) {
+  if (::getuid() != 0) GTEST_SKIP() << "only root can turn into another user";
+  service();
+  EXPECT_EQ(run({"session", "create", "7"}), "7\n");
+  struct stat file {};
+  ASSERT_EQ(::stat(root_.socket().c_str(), &file), 0);
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  QVText("quietvox-session/", uint64_t{file.st_dev}, "/", uint64_t{file.st_ino}, "/7")
+      .copy(address.sun_path + 1, sizeof address.sun_path - 1);
+  const int other = ::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0);
+  // The kernel tells the keeper who it was that connected.
+  ASSERT_EQ(::seteuid(kNobody), 0);
+  const int connected =
+      ::connect(other, reinterpret_cast<const sockaddr*>(&address), sizeof address);
+  ASSERT_EQ(::seteuid(0), 0);
+  ASSERT_EQ(connected, 0);
+  // It says nothing, and is not waited for.
+  pollfd entry{other, POLLIN, 0};
+  EXPECT_EQ(::poll(&entry, 1, 10'000), 1);
+  EXPECT_NE(entry.revents & POLLHUP, 0);
+  EXPECT_EQ(run({"session", "destroy", "7"}), "");
+  ::close(other);
+}
+
 TEST_F(QVToolSessionTest, IsEndedWithItsKeeper) {
   service();
   const QVValue created = json({"session", "create", "7", "--start"});
@@ -158,6 +188,29 @@ TEST_F(QVToolSessionTest, RefusesWhatTheServiceWouldTakeWithoutAWord) {
   EXPECT_EQ(qvctl({"session", "start", "8"}).status, 1);
   EXPECT_EQ(qvctl({"session", "create", "0"}).status, 2);
   EXPECT_EQ(qvctl({"session", "create", "9", "--service", "nothing"}).status, 2);
+}
+
+TEST_F(QVToolSessionTest, NamesWhatCannotBeSent) {
+  service();
+  const std::vector<std::pair<Arguments, std::string>> wrong{
+      {{"session", "create", "7", "--configuration", "{"}, "the configuration: line 1"},
+      {{"session", "create", "7", "--configuration", "[1]"}, "the configuration: no JSON object"},
+      {{"session", "create", "7", "--configuration", R"({"a":null})"},
+       "a: there is no null in configurations"},
+      {{"session", "run", "--configuration", "[1]", "--", "true"},
+       "the configuration: no JSON object"},
+      {{"session", "create", "7", "--set", "a=\xFF"}, "configuration"},
+      {{"send", "--all", "--payload", "[1]"}, "the payload: no JSON object"},
+      {{"send", "--all", "a:json=null"}, "a: there is no null in messages"},
+      {{"send", "--all", R"(a:json=[1,{"b":[null]}])"}, "a[1].b[0]: there is no null in messages"}};
+  for (const auto& [arguments, words] : wrong) {
+    const Output output = qvctl(arguments);
+    EXPECT_EQ(output.status, 2) << testing::PrintToString(arguments) << output.error;
+    EXPECT_THAT(output.error, HasSubstr(words));
+    if (arguments[0] == "session") {
+      EXPECT_THAT(output.error, Not(HasSubstr("payload")));
+    }
+  }
 }
 
 TEST_F(QVToolSessionTest, SaysThatTheServiceDoesNotRun) {
@@ -212,13 +265,7 @@ TEST_F(QVToolSessionTest, ReportsMemoryThatIsTheCommandsOwn) {
 }
 
 TEST_F(QVToolSessionTest, CanBeEndedWhileTheServiceIsSilent) {
-  // Something that is connected to, and never answers.
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  root_.socket().string().copy(address.sun_path, sizeof address.sun_path - 1);
-  const int silent = ::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
-  ASSERT_EQ(::bind(silent, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
-  ASSERT_EQ(::listen(silent, 1), 0);
+  const int silent = listenInstead();
   const auto ran = terminal({"session", "run", "--", "true"});
   pollfd entry{silent, POLLIN, 0};
   ASSERT_EQ(::poll(&entry, 1, 60'000), 1);

@@ -9,7 +9,6 @@
 #include <gmock/gmock.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
-#include <sys/un.h>
 
 namespace {
 
@@ -83,11 +82,7 @@ TEST_F(QVToolStatusTest, ShowsTheStatusOnATerminal) {
 }
 
 TEST_F(QVToolStatusTest, DoesNotStartTheServiceByAsking) {
-  sockaddr_un address{.sun_family = AF_UNIX, .sun_path = {}};
-  root_.socket().string().copy(address.sun_path, sizeof address.sun_path - 1);
-  const int listener = ::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
-  ASSERT_EQ(::bind(listener, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
-  ASSERT_EQ(::listen(listener, 16), 0);
+  const int listener = listenInstead();
   for (const Arguments& arguments :
        {Arguments{"status"}, {"sessions"}, {"kill"}, {"reporting", "show"}}) {
     const Output output = qvctl(arguments);
@@ -209,6 +204,58 @@ TEST_F(QVToolStatusTest, WritesTheSwitchWhileTheServiceDoesNotRun) {
   EXPECT_EQ(status.st_mode & 07777U, 0644U);
 }
 
+TEST_F(QVToolStatusTest, WritesTheSwitchThroughALink) {
+  root_.configure("shared/switch.json", R"({"device_name": "kitchen"})");
+  const auto target = root_.configuration() / "shared/switch.json";
+  ASSERT_EQ(::chmod(target.c_str(), 0640), 0);
+  std::filesystem::create_directories(preferences().parent_path());
+  std::filesystem::create_symlink("../shared/link.json", preferences());
+  std::filesystem::create_symlink("switch.json", root_.configuration() / "shared/link.json");
+  EXPECT_EQ(qvctl({"reporting", "off"}).status, 0);
+  EXPECT_TRUE(std::filesystem::is_symlink(preferences()));
+  EXPECT_TRUE(std::filesystem::is_symlink(root_.configuration() / "shared/link.json"));
+  std::ifstream stream(target);
+  const std::string text{std::istreambuf_iterator<char>(stream), {}};
+  EXPECT_EQ(text, "{\"device_name\":\"kitchen\",\"disable_reporting\":true}\n");
+  struct stat status {};
+  ASSERT_EQ(::stat(target.c_str(), &status), 0);
+  EXPECT_EQ(status.st_mode & 07777U, 0640U);
+}
+
+TEST_F(QVToolStatusTest, MakesTheFileThatALinkNames) {
+  std::filesystem::create_directories(preferences().parent_path());
+  std::filesystem::create_symlink(root_.path() / "switch.json", preferences());
+  EXPECT_EQ(qvctl({"reporting", "off"}).status, 0);
+  EXPECT_TRUE(std::filesystem::is_symlink(preferences()));
+  EXPECT_TRUE(std::filesystem::is_regular_file(root_.path() / "switch.json"));
+  EXPECT_EQ(at(json({"reporting", "show"}), {"reportingPreference"}), QVValue(false));
+}
+
+TEST_F(QVToolStatusTest, SaysThatALinkLeadsNowhere) {
+  std::filesystem::create_directories(preferences().parent_path());
+  std::filesystem::create_symlink("/nowhere/switch.json", preferences());
+  const Output nowhere = qvctl({"reporting", "off"});
+  EXPECT_EQ(nowhere.status, 1);
+  EXPECT_THAT(nowhere.error, HasSubstr("/nowhere/switch.json"));
+  std::filesystem::remove(preferences());
+  std::filesystem::create_symlink(preferences(), preferences());
+  const Output circle = qvctl({"reporting", "off"});
+  EXPECT_EQ(circle.status, 1);
+  EXPECT_THAT(circle.error, HasSubstr(preferences().string()));
+  EXPECT_TRUE(std::filesystem::is_symlink(preferences()));
+}
+
+TEST_F(QVToolStatusTest, FollowsNoLinkOutOfAnotherRootDirectory) {
+  const auto root = root_.path() / "image";
+  const auto link = root / "etc/quietvox/preferences/net.quillon.quietvox.json";
+  std::filesystem::create_directories(link.parent_path());
+  std::filesystem::create_symlink(root_.path() / "outside.json", link);
+  const Output output = qvctl({"reporting", "off", "--root", root});
+  EXPECT_EQ(output.status, 1);
+  EXPECT_THAT(output.error, AllOf(HasSubstr(link.string()), HasSubstr("link")));
+  EXPECT_FALSE(std::filesystem::exists(root_.path() / "outside.json"));
+}
+
 TEST_F(QVToolStatusTest, LeavesABrokenPreferencesFileAlone) {
   root_.configure("preferences/net.quillon.quietvox.json", "{\"device_name\": ");
   const Output output = qvctl({"reporting", "off"});
@@ -271,7 +318,6 @@ TEST_F(QVToolStatusTest, NamesTheWordThatIsWrong) {
       {{"nonsense"}, "\"nonsense\""},
       {{"reporting", "maybe"}, "\"maybe\""},
       {{"events", "--last", "-5"}, "\"-5\""},
-      {{"events", "--since", ""}, "\"\" is no time"},
       {{"events", "--since", "2026-02-30"}, "\"2026-02-30\""},
       {{"watch", "--count", "-1"}, "\"-1\""},
       {{"channels", "--interval", "1s", "--count", "-1"}, "\"-1\""},
@@ -279,7 +325,7 @@ TEST_F(QVToolStatusTest, NamesTheWordThatIsWrong) {
       {{"summary", "plot", "--height", "0"}, "\"0\""},
       {{"session", "create", "99999999999999999999"}, "\"99999999999999999999\""},
       {{"session", "destroy", "7x"}, "\"7x\""},
-      {{"send", "--session", "", "a=1"}, "\"\""}};
+      {{"session", "create", "--configuration", "{}", "--set", "a"}, "KEY=VALUE"}};
   for (const auto& [arguments, word] : wrong) {
     const Output output = qvctl(arguments);
     EXPECT_EQ(output.status, 2) << testing::PrintToString(arguments) << output.error;
@@ -288,6 +334,34 @@ TEST_F(QVToolStatusTest, NamesTheWordThatIsWrong) {
   const Output output = qvctl({"send", "a=1"}, {"env", "QUIETVOX_SESSION=abc"});
   EXPECT_EQ(output.status, 2);
   EXPECT_THAT(output.error, HasSubstr("\"abc\""));
+}
+
+TEST_F(QVToolStatusTest, TakesNoEmptyValueForNone) {
+  for (const Arguments& arguments : {Arguments{"status", "--socket", ""},
+                                     {"status", "--root", ""},
+                                     {"events", "--since", ""},
+                                     {"events", "--until", ""},
+                                     {"events", "--last", ""},
+                                     {"events", "--kind", ""},
+                                     {"events", "--name", ""},
+                                     {"watch", "--for", ""},
+                                     {"watch", "--for", "", "--count", "1"},
+                                     {"channels", "--interval", ""},
+                                     {"channels", "--group", ""},
+                                     {"summary", "show", ""},
+                                     {"summary", "plot", "--key", ""},
+                                     {"send", "--session", "", "a=1"},
+                                     {"send", "--all", "--payload", ""},
+                                     {"send", "--all", "--category", "", "a=1"},
+                                     {"session", "create", "--service", ""},
+                                     {"session", "create", "--configuration", ""},
+                                     {"session", "run", "--configuration", "", "--", "true"}}) {
+    const Output output = qvctl(arguments);
+    EXPECT_EQ(output.status, 2) << testing::PrintToString(arguments) << output.error;
+    EXPECT_THAT(output.error, AllOf(StartsWith("qvctl: "), HasSubstr("\"\"")));
+  }
+  // A command's own arguments are its own.
+  EXPECT_EQ(qvctl({"session", "run", "--anyway", "--", "test", "-z", ""}).status, 0);
 }
 
 TEST_F(QVToolStatusTest, SaysThatItsHelpCouldNotBeWritten) {

@@ -6,6 +6,7 @@
 #include <iterator>
 #include <sstream>
 
+#include <sys/socket.h>
 #include <unistd.h>
 
 namespace {
@@ -109,6 +110,31 @@ QVValue QVToolTest::at(const QVValue& value, const std::vector<std::string>& key
 QVToolTest::Arguments QVToolTest::withoutPrivilege() {
   if (::getuid() != 0) return {};
   return {"setpriv", "--bounding-set=-dac_override,-dac_read_search", "--inh-caps=-all"};
+}
+
+sockaddr_un QVToolTest::socketAddress() const {
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  root_.socket().string().copy(address.sun_path, sizeof address.sun_path - 1);
+  return address;
+}
+
+int QVToolTest::listenInstead() const {
+  const sockaddr_un address = socketAddress();
+  const int listener = ::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
+  EXPECT_EQ(::bind(listener, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+  EXPECT_EQ(::listen(listener, 16), 0);
+  return listener;
+}
+
+QVToolTest::Connection QVToolTest::connectTo(int listener) const {
+  const sockaddr_un address = socketAddress();
+  Connection connection{.client = ::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)};
+  EXPECT_EQ(
+      ::connect(connection.client, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+  connection.accepted = ::accept4(listener, nullptr, nullptr, SOCK_CLOEXEC);
+  EXPECT_GE(connection.accepted, 0);
+  return connection;
 }
 
 QVPeerClient& QVToolTest::client() {

@@ -10,6 +10,8 @@
 #include <string>
 #include <vector>
 
+#include <sys/un.h>
+
 // qvctl in a temporary root of its own, with the real service there when a test asks for it.
 //
 // Threads: the test's.
@@ -46,6 +48,17 @@ class QVToolTest : public QVEndToEndTest {
   static QVValue at(const QVValue& value, const std::vector<std::string>& keys);
   // A program that turns itself into another one without root's right to pass over file modes.
   static Arguments withoutPrivilege();
+
+  // A socket in the place of the service's, with nobody behind it who would answer: what connects
+  // waits. The caller closes it.
+  int listenInstead() const;
+  // A connection to it that has been accepted, as if somebody served there.
+  struct Connection {
+    int client = -1;
+    int accepted = -1;
+  };
+  Connection connectTo(int listener) const;
+  sockaddr_un socketAddress() const;
 
   // This program's own connection to the service.
   QVPeerClient& client();

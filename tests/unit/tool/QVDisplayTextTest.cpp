@@ -40,6 +40,18 @@ TEST(QVDisplayTextTest, KeepsJSONWhatItIs) {
   EXPECT_EQ(QVDisplayJSON("{\"a\":\"\xC2\x9B\xE2\x80\xAE\"}"), R"({"a":"\u009b\u202e"})");
 }
 
+TEST(QVDisplayTextTest, KnowsWhereTextThatComesInPartsCanBeCut) {
+  const std::string text = "aß日𝄞";
+  const std::vector<std::size_t> whole{0, 1, 1, 3, 3, 3, 6, 6, 6, 6, 10};
+  ASSERT_EQ(text.size() + 1, whole.size());
+  for (std::size_t i = 0; i < whole.size(); ++i) {
+    EXPECT_EQ(QVWholeCharacters(text.substr(0, i)), whole[i]) << i;
+  }
+  // What is no UTF-8 at all is not waited for.
+  EXPECT_EQ(QVWholeCharacters("\x80\x80\x80\x80"), 4U);
+  EXPECT_EQ(QVWholeCharacters("a\x80"), 2U);
+}
+
 TEST(QVDisplayTextTest, KnowsHowWideTextIs) {
   EXPECT_EQ(QVDisplayWidth("plain"), 5U);
   EXPECT_EQ(QVDisplayWidth("grüß"), 4U);

@@ -65,6 +65,18 @@ TEST_F(QVTimeTextTest, RefusesWhatIsNoTime) {
   }
 }
 
+TEST_F(QVTimeTextTest, ReadsWhatNamesOfSummariesBeginWith) {
+  EXPECT_EQ(QVParseStamp("20261121-062001+0000"), kNow - 250'000);
+  EXPECT_EQ(QVParseStamp("20261121-082001+0200"), kNow - 250'000);
+  EXPECT_EQ(QVParseStamp("20261120-225001-0730"), kNow - 250'000);
+  for (const char* text : {"", "20261121-062001", "20261121-062001+00", "20261121-062001+00000",
+                           "20261321-062001+0000", "20261121-252001+0000", "20261121 062001+0000",
+                           "2026-1121-062001+000", "20261121-062001*0000", "20261121-0620-1+0000",
+                           "20261121-062001+-100"}) {
+    EXPECT_FALSE(QVParseStamp(text)) << text;
+  }
+}
+
 TEST_F(QVTimeTextTest, WritesTimes) {
   EXPECT_EQ(QVLocalTimeText(kNow), "2026-11-21 08:20:01.250000");
   EXPECT_EQ(QVLocalTimeText(kNow, false), "2026-11-21 08:20:01");

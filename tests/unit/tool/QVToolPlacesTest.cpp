@@ -44,8 +44,20 @@ TEST_F(QVToolPlacesTest, LieBelowAnotherRootWhateverTheEnvironmentSays) {
   const auto places = QVToolPlaces::find("", "/image");
   EXPECT_EQ(places.socket, "/image/run/quietvox/reporting.socket");
   EXPECT_EQ(places.directories.store(), "/image/var/lib/quietvox/reporting.db");
+  EXPECT_TRUE(places.isOtherRoot);
+  EXPECT_FALSE(QVToolPlaces::find("", "").isOtherRoot);
   EXPECT_EQ(QVToolPlaces::find("/own", "/image").socket, "/own");
   EXPECT_EQ(QVToolPlaces::find("/own", "").socket, "/own");
+}
+
+TEST_F(QVToolPlacesTest, SayWhatCanBeNoSocket) {
+  const std::string name(99, 'x');
+  EXPECT_EQ(QVToolPlaces::find("/nowhere/socket", "").socketProblem(), "");
+  EXPECT_EQ(QVToolPlaces::find("/nowhere" + name, "").socketProblem(), "");
+  EXPECT_EQ(QVToolPlaces::find("/nowhere/" + name, "").socketProblem(),
+            "/nowhere/" + name + ": a socket's path has 107 bytes at the most");
+  EXPECT_EQ(QVToolPlaces::find("/", "").socketProblem(), "/: a directory, not a socket");
+  EXPECT_EQ(QVToolPlaces::find("/dev/null", "").socketProblem(), "/dev/null: not a socket");
 }
 
 }  // namespace

@@ -66,15 +66,17 @@ TEST(QVTypedValueTest, MakesThePayloadThatTheLibraryWouldMake) {
   expected.set("frames", 480).set("gain", 1.5).set("on", true).set("route", "speaker");
   expected.beginDictionary("device").beginArray("list").add(1).add("x").beginArray().endArray();
   expected.endArray().endDictionary();
-  EXPECT_EQ(bytesOf(QVMakePayload("", {"frames=480", "gain=1.5", "on=true", "route=speaker",
-                                       R"(device:json={"list":[1,"x",[]]})"})),
+  EXPECT_EQ(bytesOf(QVMakePayload(QVPayloadOf::message, "",
+                                  {"frames=480", "gain=1.5", "on=true", "route=speaker",
+                                   R"(device:json={"list":[1,"x",[]]})"})),
             bytesOf(expected));
 }
 
 TEST(QVTypedValueTest, PutsEntriesBehindTheObject) {
   QVClientPayload expected;
   expected.set("a", 1).set("b", 2).set("a", 3);
-  EXPECT_EQ(bytesOf(QVMakePayload(R"({"b":2,"a":1})", {"a=3"})), bytesOf(expected));
+  EXPECT_EQ(bytesOf(QVMakePayload(QVPayloadOf::message, R"({"b":2,"a":1})", {"a=3"})),
+            bytesOf(expected));
 }
 
 TEST(QVTypedValueTest, ReadsTheObjectFromAFile) {
@@ -82,17 +84,43 @@ TEST(QVTypedValueTest, ReadsTheObjectFromAFile) {
   std::ofstream(path) << R"({"b":2})";
   QVClientPayload expected;
   expected.set("b", 2);
-  EXPECT_EQ(bytesOf(QVMakePayload("@" + path, {})), bytesOf(expected));
-  EXPECT_THROW(QVMakePayload("@" + path + ".missing", {}), QVToolFailure);
+  EXPECT_EQ(bytesOf(QVMakePayload(QVPayloadOf::message, "@" + path, {})), bytesOf(expected));
+  EXPECT_THROW(QVMakePayload(QVPayloadOf::message, "@" + path + ".missing", {}), QVToolFailure);
 }
 
 TEST(QVTypedValueTest, RefusesWhatCannotBeSent) {
-  EXPECT_THROW(QVMakePayload("[1]", {}), QVToolFailure);
-  EXPECT_THROW(QVMakePayload(R"({"a":null})", {}), QVToolFailure);
-  EXPECT_THROW(QVMakePayload("{", {}), QVToolFailure);
+  EXPECT_THROW(QVMakePayload(QVPayloadOf::message, "[1]", {}), QVToolFailure);
+  EXPECT_THROW(QVMakePayload(QVPayloadOf::message, R"({"a":null})", {}), QVToolFailure);
+  EXPECT_THROW(QVMakePayload(QVPayloadOf::message, "{", {}), QVToolFailure);
   const std::string deep = std::string(40, '[') + std::string(40, ']');
-  EXPECT_THROW(QVMakePayload("", {"a:json=" + deep}), QVToolFailure);
-  EXPECT_THROW(QVMakePayload("", {"a=\xFF"}), QVToolFailure);
+  EXPECT_THROW(QVMakePayload(QVPayloadOf::message, "", {"a:json=" + deep}), QVToolFailure);
+  EXPECT_THROW(QVMakePayload(QVPayloadOf::message, "", {"a=\xFF"}), QVToolFailure);
+}
+
+TEST(QVTypedValueTest, SaysWhatCannotBeSent) {
+  const auto complaint = [](QVPayloadOf use, const char* json, const char* entry) {
+    try {
+      QVMakePayload(
+          use, json,
+          entry == nullptr ? std::vector<std::string>() : std::vector{std::string(entry)});
+    } catch (const QVToolFailure& failure) {
+      return std::string(failure.what());
+    }
+    return std::string();
+  };
+  EXPECT_EQ(complaint(QVPayloadOf::message, "", "a:json=null"), "a: there is no null in messages");
+  EXPECT_EQ(complaint(QVPayloadOf::message, "", R"(a:json=[1,{"b":[null]}])"),
+            "a[1].b[0]: there is no null in messages");
+  EXPECT_EQ(complaint(QVPayloadOf::configuration, R"({"a":{"b":1,"c":null}})", nullptr),
+            "a.c: there is no null in configurations");
+  EXPECT_EQ(complaint(QVPayloadOf::message, "[]", nullptr), "the payload: no JSON object");
+  EXPECT_EQ(complaint(QVPayloadOf::configuration, "[]", nullptr),
+            "the configuration: no JSON object");
+  EXPECT_EQ(complaint(QVPayloadOf::configuration, "", "a=\xFF"),
+            "a=\xFF: a text of the configuration is no UTF-8");
+  const std::string deep = R"({"a":)" + std::string(40, '[') + std::string(40, ']') + "}";
+  EXPECT_EQ(complaint(QVPayloadOf::configuration, deep.c_str(), nullptr),
+            "the configuration is nested too deeply");
 }
 
 }  // namespace
