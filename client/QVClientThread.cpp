@@ -1,20 +1,35 @@
 #include "client/QVClientThread.h"
 
-#include <cerrno>
 #include <csignal>
 #include <cstddef>
 #include <memory>
 #include <new>
+#include <span>
 #include <string>
 #include <system_error>
 #include <utility>
 
+#include <link.h>
 #include <sched.h>
 
 namespace {
 
 // Bytes. The library itself needs a tenth; callbacks of the program's run here as well.
 constexpr std::size_t kStackBytes = std::size_t{512} << 10;
+
+// Bytes that every thread of the program has for its own at the end of its stack: thread-local
+// variables of all that is loaded.
+std::size_t threadLocalBytes() {
+  std::size_t bytes = 0;
+  const auto add = [](dl_phdr_info* object, std::size_t, void* sum) {
+    for (const ElfW(Phdr) & part : std::span(object->dlpi_phdr, object->dlpi_phnum)) {
+      if (part.p_type == PT_TLS) *static_cast<std::size_t*>(sum) += part.p_memsz + part.p_align;
+    }
+    return 0;
+  };
+  static_cast<void>(dl_iterate_phdr(add, &bytes));
+  return bytes;
+}
 
 // Blocks all signals of the calling thread while it lives.
 class SignalsBlocked {
@@ -47,11 +62,11 @@ void* run(void* given) {
   return nullptr;
 }
 
-int create(pthread_t& thread, std::size_t stackBytes, Body& body) {
+int create(pthread_t& thread, Body& body) {
   pthread_attr_t attributes;
   int error = pthread_attr_init(&attributes);
   if (error != 0) return error;
-  if (stackBytes != 0) static_cast<void>(pthread_attr_setstacksize(&attributes, stackBytes));
+  static_cast<void>(pthread_attr_setstacksize(&attributes, kStackBytes + threadLocalBytes()));
   error = pthread_create(&thread, &attributes, run, &body);
   pthread_attr_destroy(&attributes);
   return error;
@@ -64,10 +79,7 @@ QVClientError QVClientThread::start(Body body) {
   const SignalsBlocked signalsBlocked;
   try {
     auto given = std::make_unique<Body>(std::move(body));
-    int error = create(thread_, kStackBytes, *given);
-    // What all threads of the program have of their own lies on the stack: it may be too small.
-    if (error == EINVAL) error = create(thread_, 0, *given);
-    if (error != 0) {
+    if (const int error = create(thread_, *given); error != 0) {
       return {Code::cannotConnect,
               "no thread for the library: " + std::generic_category().message(error)};
     }

@@ -18,7 +18,7 @@ QVRealtimeQueue::~QVRealtimeQueue() {
 
 QVClientPayload* QVRealtimeQueue::begin() noexcept {
   detach();
-  if (ring_->isClosed()) return drop(QVDropReason::connectionLost);
+  if (!ring_->takesIn()) return drop(QVDropReason::connectionLost);
   if (core_->isReportingOff()) return drop(QVDropReason::disabled);
   const std::span<char> slot = ring_->nextSlot();
   if (slot.empty()) return drop(QVDropReason::queueFull);
@@ -42,7 +42,7 @@ bool QVRealtimeQueue::commit(QVClientCategory category, QVClientMessageType type
   return false;
 }
 
-// The slot is written no more, whoever still holds the payload.
+// The slot is the reporter's thread's from now on, or the next payload's.
 void QVRealtimeQueue::detach() noexcept {
   payload_.use({});
   slot_ = nullptr;

@@ -40,9 +40,10 @@ class QV_CLIENT_API QVRealtimeQueue {
   QVRealtimeQueue(const QVRealtimeQueue&) = delete;
   QVRealtimeQueue& operator=(const QVRealtimeQueue&) = delete;
 
-  // The next message's payload, empty. Null where the message would be dropped, because reporting
-  // is off, or the queue is full or closed; that is counted. Beginning again starts the message
-  // anew.
+  // The next message's payload, empty, which stays the queue's: nothing may be moved out of it.
+  // Null where the message would be dropped, because reporting is off, the queue is full or closed,
+  // or its session was lost (QVReporterOptions::restoreSessions); that is counted. Beginning again
+  // starts the message anew.
   QVClientPayload* begin() noexcept;
   // Hands over what begin() gave, which from then on takes nothing in. False where it is not in
   // order or did not fit, another payload was moved into it, or the queue was closed meanwhile,

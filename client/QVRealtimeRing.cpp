@@ -1,15 +1,16 @@
 #include "client/QVRealtimeRing.h"
 
 QVRealtimeRing::QVRealtimeRing(std::size_t slots, std::size_t slotBytes,
-                               QVReporterSessionState* owner)
-    : session(owner),
+                               QVReporterSessionState* ofSession)
+    : owner(ofSession),
+      session(ofSession),
       mask_(slots - 1),
       slotBytes_(slotBytes),
       slots_(new Slot[slots]()),
       memory_(new char[slots * slotBytes]()) {}
 
 std::span<char> QVRealtimeRing::nextSlot() noexcept {
-  const uint64_t written = written_.load(std::memory_order_relaxed) & ~kClosed;
+  const uint64_t written = written_.load(std::memory_order_relaxed) & ~(kClosed | kRefusing);
   if (written - takenSeen_ > mask_) {
     takenSeen_ = taken_.load(std::memory_order_acquire);
     if (written - takenSeen_ > mask_) return {};
@@ -19,9 +20,9 @@ std::span<char> QVRealtimeRing::nextSlot() noexcept {
 
 bool QVRealtimeRing::push(std::size_t bytes, uint32_t category, uint16_t type) noexcept {
   uint64_t written = written_.load(std::memory_order_relaxed);
-  if ((written & kClosed) != 0) return false;
+  if ((written & (kClosed | kRefusing)) != 0) return false;
   slots_[written & mask_] = {bytes, category, type};
-  // Nobody else changes it but close(), once: it need not be tried again.
+  // Nobody else changes it but for the bits: what comes at that moment may be refused.
   return written_.compare_exchange_strong(written, written + 1, std::memory_order_release,
                                           std::memory_order_relaxed);
 }

@@ -16,10 +16,12 @@ struct QVReporterSessionState;
 // as it last saw it, and looks again only when that says full or empty, so that messages cost no
 // traffic between the processors but when they are few.
 //
-//   open --close()--> closed: what was pushed before is still there, nothing more is taken in.
+//   open --refuse()--> refusing --admit()--> open
+//     '--close()--> closed
 //
-// The bit that says closed lies in `written_` itself, so that a message is either seen by the
-// consumer or refused to the producer, whatever the two do at once.
+// In both of the latter nothing more is taken in; what was pushed before is still there. The bits
+// that say so lie in `written_` itself, so that a message is either seen by the consumer or refused
+// to the producer, whatever the two do at once.
 //
 // Used by QVRealtimeQueue (producer) and the reporter's thread (consumer). Threads: as marked.
 // Ownership: shared by both.
@@ -43,11 +45,11 @@ class QVRealtimeRing {
     return slots * (slotBytes + sizeof(Slot));
   }
   // `slots` a power of 2. The session is the consumer's alone.
-  QVRealtimeRing(std::size_t slots, std::size_t slotBytes, QVReporterSessionState* owner);
+  QVRealtimeRing(std::size_t slots, std::size_t slotBytes, QVReporterSessionState* ofSession);
 
   // The producer's. The next slot's memory, empty where all slots are taken.
   std::span<char> nextSlot() noexcept;
-  // Hands over the slot that nextSlot() gave; false where it is closed.
+  // Hands over the slot that nextSlot() gave; false where it takes nothing in.
   bool push(std::size_t bytes, uint32_t category, uint16_t type) noexcept;
   // It will push no more.
   void abandon() noexcept { abandoned_.store(true, std::memory_order_release); }
@@ -55,20 +57,29 @@ class QVRealtimeRing {
   // The consumer's. False where there is no message; one stays where it is until pop().
   bool front(Message& message) noexcept;
   void pop() noexcept;
-  // Takes in no more.
+  // Takes in no more, or not until admit().
   void close() noexcept { written_.fetch_or(kClosed, std::memory_order_acq_rel); }
+  void refuse() noexcept { written_.fetch_or(kRefusing, std::memory_order_acq_rel); }
 
   // Any thread.
+  void admit() noexcept { written_.fetch_and(~kRefusing, std::memory_order_acq_rel); }
   bool isClosed() const noexcept {
     return (written_.load(std::memory_order_relaxed) & kClosed) != 0;
+  }
+  bool takesIn() const noexcept {
+    return (written_.load(std::memory_order_relaxed) & (kClosed | kRefusing)) == 0;
   }
   // No messages are in it, and none will be.
   bool isOver() const noexcept;
   // How many messages were ever pushed, and popped.
-  uint64_t written() const noexcept { return written_.load(std::memory_order_acquire) & ~kClosed; }
+  uint64_t written() const noexcept {
+    return written_.load(std::memory_order_acquire) & ~(kClosed | kRefusing);
+  }
   uint64_t taken() const noexcept { return taken_.load(std::memory_order_acquire); }
   std::size_t bytes() const noexcept { return bytesOf(mask_ + 1, slotBytes_); }
 
+  // Whose it was made for: a name, by which any thread may know it.
+  const QVReporterSessionState* const owner;
   // The consumer's, as the next two; null once the session is destroyed.
   QVReporterSessionState* session;
   // How many messages were pushed before the step of the session, and the flush or the end, that is
@@ -79,6 +90,7 @@ class QVRealtimeRing {
  private:
   static constexpr std::size_t kCacheLine = 64;
   static constexpr uint64_t kClosed = uint64_t{1} << 63;
+  static constexpr uint64_t kRefusing = uint64_t{1} << 62;
 
   const std::size_t mask_;
   const std::size_t slotBytes_;

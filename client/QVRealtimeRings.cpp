@@ -40,6 +40,13 @@ QVRealtimeRings::List QVRealtimeRings::all() {
   return rings_;
 }
 
+void QVRealtimeRings::admitMessages(const QVReporterSessionState& session) {
+  QVMutexLock lock(mutex_);
+  for (const auto& ring : rings_) {
+    if (ring->owner == &session) ring->admit();
+  }
+}
+
 void QVRealtimeRings::forEach(const std::function<void(QVRealtimeRing&)>& visit) {
   QVMutexLock lock(mutex_);
   for (const auto& ring : rings_) visit(*ring);

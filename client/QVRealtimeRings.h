@@ -31,6 +31,8 @@ class QVRealtimeRings {
   // Lets go of those that are over.
   void removeOver();
   List all();
+  // Has those of a session take messages in again.
+  void admitMessages(const QVReporterSessionState& session);
   // Each in its turn, under the lock; needs no memory.
   void forEach(const std::function<void(QVRealtimeRing&)>& visit);
   // Hands all of them out and takes in no more. Needs no memory.

@@ -59,9 +59,15 @@ void QVReporterCalls::end() {
   core_.countDrop(QVDropReason::connectionLost, std::exchange(messagesUnderWay_, 0));
   bytesUnderWay_ = 0;
   answered_ = issued_;
-  core_.sessions.forEach([this](QVReporterSessionState& session) {
+  const bool forgets = !core_.options.restoreSessions;
+  if (forgets) {
+    core_.rings.forEach([this](QVRealtimeRing& ring) {
+      if (ring.session->isOpen) lose(ring);
+    });
+  }
+  core_.sessions.forEach([forgets](QVReporterSessionState& session) {
     session.isPresent = false;
-    if (!core_.options.restoreSessions) session.isStarted = false;
+    if (forgets) session.isStarted = false;
     return true;
   });
 }
@@ -101,9 +107,8 @@ void QVReporterCalls::work() {
     const std::size_t done = turn_ == 0 ? workQueue() : workRing(*rings[turn_ - 1]);
     idle = done == 0 ? idle + 1 : 0;
   }
-  polls_ = std::ranges::any_of(rings, [this](const auto& ring) {
-    return isSent(*ring) && ring->session->isStarted && !ring->isOver();
-  });
+  polls_ = std::ranges::any_of(
+      rings, [](const auto& ring) { return hasSession(*ring) && ring->session->isStarted; });
   core_.rings.removeOver();
 }
 
@@ -229,7 +234,7 @@ bool QVReporterCalls::handleStep(const QVReporterRecord& record, QVReporterSessi
   if (record.kind == Kind::destroy) return destroy(session);
   const bool makes = record.kind == Kind::open || record.kind == Kind::start;
   if (!hasRoom() && (makes || !isGone(session))) return false;
-  if (record.kind == Kind::stop && !drainBeforeStep(session)) return false;
+  if (record.kind == Kind::stop && !isDrainedBeforeStep(session)) return false;
   switch (record.kind) {
     case Kind::open:
       session.serviceType = static_cast<QVClientServiceType>(record.type);
@@ -246,8 +251,8 @@ bool QVReporterCalls::handleStep(const QVReporterRecord& record, QVReporterSessi
       return !session.isPresent || configure(session);
     }
     case Kind::start:
-      // What was committed since it was lost does not belong to the new one.
-      if (isGone(session)) drainBeforeStep(session);
+      // It was lost when its start had been asked for already.
+      core_.rings.admitMessages(session);
       session.isStarted = true;
       return session.isPresent ? start(session) : make(session);
     case Kind::stop:
@@ -265,7 +270,7 @@ bool QVReporterCalls::destroy(QVReporterSessionState& session) {
   if (session.isPresent && !hasRoom()) return false;
   // One that was lost and is to be restored waits for that, where its real-time queues hold
   // something.
-  if ((session.isPresent || session.isStarted) && !drainBeforeStep(session)) return false;
+  if ((session.isPresent || session.isStarted) && !isDrainedBeforeStep(session)) return false;
   if (session.isPresent &&
       !issue(client_->destroyReportingSession(session.reporterID, acknowledge()))) {
     return false;
@@ -281,52 +286,51 @@ bool QVReporterCalls::destroy(QVReporterSessionState& session) {
 
 // Real-time queues.
 
-// False where something is left of what was committed before the step at the queue's front. What
-// is committed from then on does not hold the step up.
-bool QVReporterCalls::drainBeforeStep(const QVReporterSessionState& session) {
-  const QVRealtimeRings::List rings = core_.rings.all();
-  if (std::exchange(markedStep_, core_.queue.consumed()) != core_.queue.consumed()) {
-    for (const auto& ring : rings) ring->writtenBeforeStep = ring->written();
-  }
-  for (const auto& ring : rings) {
-    if (ring->session == &session && !drain(*ring, ring->writtenBeforeStep)) return false;
-  }
-  return true;
+// False where something is left of what was committed before the step at the queue's front: it is
+// worked off in the real-time queues' own turns. What is committed from then on does not hold the
+// step up.
+bool QVReporterCalls::isDrainedBeforeStep(const QVReporterSessionState& session) {
+  const bool marks = std::exchange(markedStep_, core_.queue.consumed()) != core_.queue.consumed();
+  bool isDrained = true;
+  core_.rings.forEach([&session, &isDrained, marks](QVRealtimeRing& ring) {
+    if (ring.session != &session) return;
+    if (marks) ring.writtenBeforeStep = ring.written();
+    isDrained = isDrained && ring.taken() >= ring.writtenBeforeStep;
+  });
+  return isDrained;
 }
 
-// Are its messages to be sent now, or dropped because its session was lost?
-bool QVReporterCalls::isSent(const QVRealtimeRing& ring) const {
-  const QVReporterSessionState* session = ring.session;
-  return session != nullptr && (session->isStarted || (session->isOpen && isGone(*session)));
+// Rings that are over may have left the list of all of them before their session was destroyed.
+bool QVReporterCalls::hasSession(const QVRealtimeRing& ring) {
+  return !ring.isOver() && ring.session != nullptr;
 }
 
 std::size_t QVReporterCalls::workRing(QVRealtimeRing& ring) {
-  if (!isSent(ring)) return 0;
-  const uint64_t before = ring.taken();
-  drain(ring, std::min(before + kTurn, ring.written()));
-  return ring.taken() - before;
-}
-
-// False where something is left of its first `upTo` messages.
-bool QVReporterCalls::drain(QVRealtimeRing& ring, uint64_t upTo) {
-  QVRealtimeRing::Message message;
-  while (ring.taken() < upTo && ring.front(message)) {
-    if (!handleMessage(
-            {.type = message.type, .category = message.category, .session = ring.session},
-            message.payload)) {
-      return false;
-    }
+  if (!hasSession(ring)) return 0;
+  const uint64_t last = ring.session->isStarted ? ring.written() : ring.writtenBeforeStep;
+  std::size_t done = 0;
+  for (QVRealtimeRing::Message message;
+       done < kTurn && ring.taken() < last && ring.front(message) &&
+       handleMessage({.type = message.type, .category = message.category, .session = ring.session},
+                     message.payload);
+       ++done) {
     ring.pop();
   }
-  return true;
+  return done;
 }
 
-// It takes in no more, and what is in it is lost. Needs no memory.
+// What is in it is lost, and what comes is refused. Needs no memory, as the next.
+void QVReporterCalls::lose(QVRealtimeRing& ring) {
+  ring.refuse();
+  QVRealtimeRing::Message message;
+  for (; ring.front(message); ring.pop()) core_.countDrop(QVDropReason::connectionLost);
+}
+
+// The same for good.
 void QVReporterCalls::drop(QVRealtimeRing& ring) {
   ring.close();
   ring.session = nullptr;
-  QVRealtimeRing::Message message;
-  for (; ring.front(message); ring.pop()) core_.countDrop(QVDropReason::connectionLost);
+  lose(ring);
 }
 
 void QVReporterCalls::markRings() {
@@ -335,8 +339,8 @@ void QVReporterCalls::markRings() {
 
 bool QVReporterCalls::areRingsWorkedOff() {
   bool are = true;
-  core_.rings.forEach([this, &are](const QVRealtimeRing& ring) {
-    are = are && (!isSent(ring) || ring.taken() >= ring.writtenBeforeFlush);
+  core_.rings.forEach([&are](const QVRealtimeRing& ring) {
+    are = are && (!ring.session->isStarted || ring.taken() >= ring.writtenBeforeFlush);
   });
   return are;
 }

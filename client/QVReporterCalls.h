@@ -64,10 +64,10 @@ class QVReporterCalls {
   bool handleStep(const QVReporterRecord& record, QVReporterSessionState& session);
   bool handleMessage(const QVReporterRecord& record, std::span<char> payload);
   bool destroy(QVReporterSessionState& session);
-  bool drainBeforeStep(const QVReporterSessionState& session);
-  bool drain(QVRealtimeRing& ring, uint64_t upTo);
+  bool isDrainedBeforeStep(const QVReporterSessionState& session);
+  static bool hasSession(const QVRealtimeRing& ring);
+  void lose(QVRealtimeRing& ring);
   void drop(QVRealtimeRing& ring);
-  bool isSent(const QVRealtimeRing& ring) const;
   // How many records, or messages, of a turn were worked off.
   std::size_t workQueue();
   std::size_t workRing(QVRealtimeRing& ring);

@@ -52,7 +52,10 @@ QVClientError::Code QVReporterSession::setConfiguration(const QVClientPayload& c
 }
 
 QVClientError::Code QVReporterSession::start() {
-  return core_->take({.kind = Kind::start, .session = &state_});
+  const Code code = core_->take({.kind = Kind::start, .session = &state_});
+  // What is committed from now on belongs to the session that the start makes.
+  if (code == Code::none) core_->rings.admitMessages(state_);
+  return code;
 }
 
 QVClientError::Code QVReporterSession::sendMessage(const QVClientPayload& message,
@@ -79,11 +82,12 @@ QVClientResult<std::unique_ptr<QVRealtimeQueue>> QVReporterSession::makeRealtime
     Code code = core_->rings.admit(QVRealtimeRing::bytesOf(slots, options.bytesPerMessage));
     if (code != Code::none) return fail(code);
     auto ring = std::make_shared<QVRealtimeRing>(slots, options.bytesPerMessage, &state_);
-    code = core_->rings.add(ring);
+    std::unique_ptr<QVRealtimeQueue> queue(new QVRealtimeQueue(core_, ring));
+    code = core_->rings.add(std::move(ring));
     if (code != Code::none) return fail(code);
     // From now on the reporter's thread looks at it.
     core_->bell.ring();
-    return std::unique_ptr<QVRealtimeQueue>(new QVRealtimeQueue(core_, std::move(ring)));
+    return queue;
   } catch (const std::bad_alloc&) {
     return fail(Code::outOfMemory);
   }

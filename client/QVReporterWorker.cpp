@@ -50,10 +50,8 @@ void QVReporterWorker::run() {
 
 bool QVReporterWorker::work() {
   if (std::exchange(hasNewsOfSwitch_, false)) {
-    const bool wasOff = core_.isReportingOff();
     core_.reportingSwitch.readNews();
-    // What the switch has dropped is told of now that it is over.
-    if (wasOff && !core_.isReportingOff()) core_.ledger.reportAll(Clock::now());
+    followSwitch();
   }
   if (client_ != nullptr && std::exchange(hasAnswers_, false)) client_->dispatch();
   const TimePoint now = Clock::now();
@@ -73,10 +71,17 @@ bool QVReporterWorker::work() {
   if (calls_.isAnswered() && !std::exchange(isSwitchSettled_, true)) {
     // The service runs, and has made what was missing to hear of its switch.
     core_.reportingSwitch.lookAgain();
+    followSwitch();
   }
   workOffFlush();
   core_.ledger.report(now);
   return !isEnding || !mayEnd(now);
+}
+
+void QVReporterWorker::followSwitch() {
+  // What the switch has dropped is told of now that it is over.
+  const bool isOff = core_.isReportingOff();
+  if (std::exchange(wasOff_, isOff) && !isOff) core_.ledger.reportAll(Clock::now());
 }
 
 void QVReporterWorker::connect(TimePoint now) {
@@ -107,6 +112,10 @@ void QVReporterWorker::loseConnection(TimePoint now) {
   client_.reset();
   calls_.end();
   delay_.failed(now);
+  // Given up by this side, which happens for want of memory alone.
+  if (!core_.connection.error()) {
+    core_.connection.setError({QVClientError::Code::outOfMemory, "out of memory"});
+  }
 }
 
 void QVReporterWorker::beginFlush() {

@@ -33,6 +33,7 @@ class QVReporterWorker {
 
   // False at the end.
   bool work();
+  void followSwitch();
   void connect(TimePoint now);
   void loseConnection(TimePoint now);
   void beginFlush();
@@ -50,6 +51,7 @@ class QVReporterWorker {
   bool hasAnswers_ = false;
   bool isEnding_ = false;
   bool hasTriedAtEnd_ = false;
+  bool wasOff_ = core_.isReportingOff();
   bool isSwitchSettled_ = false;  // looked at since the service answered on this connection
 
   // The flush under way: first its records have to be worked off, then the calls answered.

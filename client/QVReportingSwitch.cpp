@@ -8,6 +8,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
+#include <new>
 #include <string_view>
 #include <system_error>
 
@@ -52,9 +53,14 @@ QVReportingSwitch::QVReportingSwitch(const std::string& configurationDirectory,
 void QVReportingSwitch::readPreference() {
   // Why a file cannot be read is for the service to say.
   QVJSONFailure failure;
-  const auto values = QVJSONFile::readDictionary(preferences_, failure);
-  isOff_.store(values && QVPreferences::booleanReading(values->find(kPreference)),
-               std::memory_order_relaxed);
+  try {
+    const auto values = QVJSONFile::readDictionary(preferences_, failure);
+    if (failure.passing) return;
+    isOff_.store(values && QVPreferences::booleanReading(values->find(kPreference)),
+                 std::memory_order_relaxed);
+  } catch (const std::bad_alloc&) {
+    // As where descriptors are short.
+  }
 }
 
 int QVReportingSwitch::add(std::size_t level) const {
@@ -84,9 +90,10 @@ void QVReportingSwitch::watch() {
 }
 
 void QVReportingSwitch::lookAgain() {
-  if (hearsPosts()) return;
-  if (watch_ >= 0) remove(watch_);
+  const int before = watch_;
   watch();
+  // One directory has one watch.
+  if (before >= 0 && before != watch_) remove(before);
   readPreference();
 }
 
@@ -116,7 +123,6 @@ void QVReportingSwitch::readNews() {
     }
   }
   if (isAnew) {
-    level_ = 0;
     lookAgain();
   } else if (isNews) {
     readPreference();

@@ -13,11 +13,14 @@
 //
 // The notification is a file of a directory that the service makes; where that is missing, the
 // nearest directory above that there is is watched for it. Whenever a watch begins anew the
-// preference is read, since a post may have been lost.
+// preference is read, since a post may have been lost. That a directory above the one that is
+// watched was renamed, or a link led elsewhere, lookAgain() finds.
 //
 // Used by QVReporterCore. Threads: isOff() any, at once; the rest one at a time. Failures: where
 // nothing can be watched, as without inotify instances left, lookAgain() alone reads the preference
-// again.
+// again. Where the preference cannot be read for want of descriptors or memory, what is known
+// stands until it is next read; where it is missing or in disorder, reporting is on, as for the
+// service.
 class QVReportingSwitch {
  public:
   QVReportingSwitch(const std::string& configurationDirectory, const std::string& runtimeDirectory);
@@ -28,7 +31,7 @@ class QVReportingSwitch {
   int descriptor() const noexcept { return inotify_.get(); }
   // Takes the news in; does not wait.
   void readNews();
-  // Watches what it could not before, now that the service runs, and reads the preference.
+  // Watches anew what there is, now that the service runs, and reads the preference.
   void lookAgain();
 
  private:

@@ -127,7 +127,8 @@ std::optional<std::string> contents(const std::string& path, QVJSONFailure& fail
   if (error == 0) error = file.read(QVJSONFile::kMaximumBytes, text);
   if (error == 0) return text;
   failure = {.reason = QVRegularFile::reason(error, QVJSONFile::kMaximumBytes),
-             .missing = error == ENOENT || error == ENOTDIR};
+             .missing = error == ENOENT || error == ENOTDIR,
+             .passing = error == EMFILE || error == ENFILE || error == ENOMEM};
   return std::nullopt;
 }
 

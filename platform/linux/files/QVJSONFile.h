@@ -20,6 +20,7 @@ struct QVJSONFailure {
   std::size_t line = 0;
   std::size_t column = 0;
   bool missing = false;  // there is no such file
+  bool passing = false;  // descriptors or memory are short: it may be read later
 
   // "line 3, column 7: reason", or the reason alone.
   std::string description() const;

@@ -2,6 +2,7 @@
 
 #include "client/QVRealtimeRing.h"
 #include "client/QVRealtimeRings.h"
+#include "client/QVReporterSessionState.h"
 #include "tests/unit/client/QVReporterFixture.h"
 
 #include <cstring>
@@ -151,6 +152,27 @@ TEST_F(QVRealtimeRingsTest, BoundsTheirBytes) {
   EXPECT_EQ(code_, Code::none);
   add(1'024, 64);
   EXPECT_EQ(code_, Code::queueFull);
+}
+
+TEST_F(QVRealtimeRingsTest, AdmitMessagesOfOneSession) {
+  QVReporterSessionState first(1);
+  QVReporterSessionState second(2);
+  const auto ofFirst = std::make_shared<QVRealtimeRing>(2, 64, &first);
+  const auto ofSecond = std::make_shared<QVRealtimeRing>(2, 64, &second);
+  for (const auto& ring : {ofFirst, ofSecond}) {
+    EXPECT_EQ(rings_.add(ring), Code::none);
+    EXPECT_TRUE(push(*ring, 1));
+    ring->refuse();
+    EXPECT_FALSE(push(*ring, 2));
+    EXPECT_FALSE(ring->takesIn());
+    EXPECT_EQ(ring->written(), 1U);
+  }
+  rings_.admitMessages(second);
+  EXPECT_FALSE(ofFirst->takesIn());
+  EXPECT_TRUE(push(*ofSecond, 2));
+  ofSecond->close();
+  rings_.admitMessages(second);
+  EXPECT_FALSE(push(*ofSecond, 3));
 }
 
 TEST_F(QVRealtimeRingsTest, TakeInNothingOnceTheyAreClosed) {
@@ -392,6 +414,30 @@ TEST_F(QVFullRealtimeQueueTest, HoldsUpNoOtherQueue) {
   EXPECT_EQ(call, "send 7 99");
 }
 
+TEST_F(QVFullRealtimeQueueTest, HoldsUpNoOtherQueueBeforeAStop) {
+  beginFull();
+  const auto other = openSession(8);
+  other->start();
+  const auto made = other->makeRealtimeQueue({.messages = 1});
+  ASSERT_TRUE(made) << made.error().text();
+  std::string call;
+  for (std::size_t i = 0; i < 3 * kSlots && call != "valid 8"; ++i) call = serveFull();
+  EXPECT_EQ(call, "valid 8");
+  fillUp();
+  session_->stop();
+  QVClientPayload* message = made.value()->begin();
+  ASSERT_NE(message, nullptr);
+  message->set("n", 99);
+  EXPECT_TRUE(made.value()->commit(kPlayback, QVClientMessageType::generic));
+  // Without more of the full one: its stop has to wait for what it holds, this has not.
+  Strings calls;
+  do calls.push_back(serve(*service_));
+  while (calls.back() != "send 8 99" && calls.back() != "stop 7" && !HasFailure());
+  EXPECT_EQ(calls.back(), "send 8 99");
+  do calls.push_back(serve(*service_));
+  while (calls.back() != "stop 7" && !HasFailure());
+}
+
 TEST_F(QVRealtimeQueueTest, IsNotHeldUpByTheQueueOfOtherThreads) {
   begin();
   session_->start();
@@ -461,15 +507,22 @@ TEST_F(QVRealtimeQueueTest, HandsNothingOfALostSessionToTheNext) {
   auto service = accept();
   serve(*service, 4);
   EXPECT_EQ(reporter_->flush(kPatience), Code::none);
+  QVClientPayload* message = queue_->begin();
+  ASSERT_NE(message, nullptr);
+  message->set("n", 1);
   service->hangUp();
   awaitConnectionError();
-  EXPECT_TRUE(commit(1));
+  EXPECT_EQ(reporter_->flush(kPatience), Code::none);
+  EXPECT_FALSE(queue_->commit(kPlayback, QVClientMessageType::generic));
+  for (int i = 0; i < 1'000; ++i) EXPECT_EQ(queue_->begin(), nullptr);
+  EXPECT_EQ(reporter_->counters().dropped.of(QVDropReason::connectionLost), 1'001U);
+  EXPECT_FALSE(queue_->isClosed());
+  // What comes behind the start waits for it.
   session_->start();
-  service = accept();
-  EXPECT_THAT(serve(*service, 4), ElementsAre("create 7", "type 7 2", "start 7", "valid 7"));
-  EXPECT_EQ(awaitDrops(1).of(QVDropReason::connectionLost), 1U);
   EXPECT_TRUE(commit(2));
-  EXPECT_EQ(serve(*service), "send 7 2");
+  service = accept();
+  EXPECT_THAT(serve(*service, 5),
+              ElementsAre("create 7", "type 7 2", "start 7", "valid 7", "send 7 2"));
 }
 
 TEST_F(QVRealtimeQueueTest, RefusesSizesBeyondItsLimits) {

@@ -186,9 +186,13 @@ uint64_t QVReporterFixture::awaitDrops(QVDropReason reason, uint64_t count) {
   return drops_.of(reason);
 }
 
-void QVReporterFixture::switchReporting(bool on) {
+void QVReporterFixture::configure(bool on) {
   root_.configure("preferences/net.quillon.quietvox.json",
                   on ? "{}" : R"({"disable_reporting": true})");
+}
+
+void QVReporterFixture::switchReporting(bool on) {
+  configure(on);
   post();
 }
 

@@ -57,7 +57,8 @@ class QVReporterFixture : public testing::Test {
   QVDropCounts awaitDrops(uint64_t count);
   // The same for one reason; answers how many.
   uint64_t awaitDrops(QVDropReason reason, uint64_t count);
-  // Switches reporting and posts the service's notification.
+  // Switches reporting; the latter posts the service's notification, too.
+  void configure(bool on);
   void switchReporting(bool on);
   void post();
 

@@ -54,6 +54,19 @@ TEST_F(QVReporterSwitchTest, IsHeardOfOffAndOn) {
   EXPECT_EQ(counters.sent + counters.dropped.inAll(), attempts + 1);
 }
 
+TEST_F(QVReporterSwitchTest, DropsAreToldOfWhereAConnectionBringsTheNews) {
+  switchReporting(false);
+  open();
+  EXPECT_EQ(
+      reporter_->sendToEverySession(QVClientPayload(), kPlayback, QVClientMessageType::generic),
+      Code::disabled);
+  configure(true);
+  const auto session = openSession(7);
+  const auto service = accept();
+  serve(*service, 2);
+  EXPECT_EQ(awaitDrops(QVDropReason::disabled, 1), 1U);
+}
+
 TEST_F(QVReporterSwitchTest, DropsWhatIsQueued) {
   stopListening();
   open();
@@ -222,6 +235,31 @@ TEST_F(QVReportingSwitchTest, HearsOfADirectoryAboveThatIsMadeAnew) {
   configureOff(true);
   std::filesystem::create_directories(runtime / "notify");
   awaitNews(reportingSwitch);
+  EXPECT_TRUE(reportingSwitch.isOff());
+}
+
+TEST_F(QVReportingSwitchTest, FindsADirectoryOfAnotherPathWhenItLooksAgain) {
+  const std::filesystem::path above = root_.path() / "above";
+  std::filesystem::create_directories(above / "run" / "notify");
+  QVReportingSwitch reportingSwitch(root_.configuration(), above / "run");
+  std::filesystem::rename(above, root_.path() / "elsewhere");
+  std::filesystem::create_directories(above / "run" / "notify");
+  configureOff(true);
+  reportingSwitch.lookAgain();
+  EXPECT_TRUE(reportingSwitch.isOff());
+  configureOff(false);
+  std::ofstream(above / "run" / "notify" / "net.quillon.quietvox.reporting") << "posted";
+  awaitNews(reportingSwitch);
+  EXPECT_FALSE(reportingSwitch.isOff());
+}
+
+TEST_F(QVReportingSwitchTest, KeepsWhatItKnowsWhereThePreferenceCannotBeReadNow) {
+  configureOff(true);
+  QVReportingSwitch reportingSwitch = makeSwitch();
+  {
+    const QVDescriptorLimit noMore;
+    reportingSwitch.lookAgain();
+  }
   EXPECT_TRUE(reportingSwitch.isOff());
 }
 
