@@ -58,3 +58,20 @@ std::vector<QVFuzzFileSeed> QVFuzzJSONFileSeeds() {
       {"wrong", "{\"a\": oops}", {0, 0}},
   };
 }
+
+std::vector<QVFuzzFileSeed> QVFuzzJSONScanSeeds() {
+  return {
+      {"summary",
+       R"([{"category": 3, "payload": {"frames": 480, "level": -3.5, "route": "speaker"}},)"
+       "\n"
+       R"({"category": 9, "payload": {"list": [null, true, 1e300]}}])",
+       {1, 14}},
+      {"texts", R"(["\u0000\u00e4\ud83c\udfb5\n\"\\\/\b\f\r\t", "ä", ""])", {1, 4}},
+      {"deep", std::string(64, '[') + std::string(64, ']'), {1, 64}},
+      {"too-deep", std::string(65, '[') + std::string(65, ']'), {0, 0}},
+      {"empty", "[]", {1, 1}},
+      {"no-array", "{}", {0, 0}},
+      {"two", "[] []", {0, 0}},
+      {"nul", std::string("[1]\0", 4), {0, 0}},
+  };
+}

@@ -16,3 +16,4 @@ struct QVFuzzFileSeed {
 std::vector<QVFuzzFileSeed> QVFuzzMMVSeeds();
 std::vector<QVFuzzFileSeed> QVFuzzKernelTextSeeds();
 std::vector<QVFuzzFileSeed> QVFuzzJSONFileSeeds();
+std::vector<QVFuzzFileSeed> QVFuzzJSONScanSeeds();

@@ -22,3 +22,5 @@ QVFuzzFileProgress QVFuzzMMV(std::string_view input);
 QVFuzzFileProgress QVFuzzKernelText(std::string_view input);
 // A configuration. What is read and written again is read as the same value.
 QVFuzzFileProgress QVFuzzJSONFile(std::string_view input);
+// An array that is scanned. What the reader of configurations takes in is taken in, too.
+QVFuzzFileProgress QVFuzzJSONScan(std::string_view input);

@@ -30,6 +30,7 @@ int main(int count, char** arguments) {
   const std::filesystem::path directory = arguments[1];
   const bool written = write(directory / "mmv", QVFuzzMMVSeeds()) &&
                        write(directory / "kernel-text", QVFuzzKernelTextSeeds()) &&
-                       write(directory / "json-file", QVFuzzJSONFileSeeds());
+                       write(directory / "json-file", QVFuzzJSONFileSeeds()) &&
+                       write(directory / "json-scan", QVFuzzJSONScanSeeds());
   return written ? 0 : 1;
 }

@@ -52,7 +52,8 @@ INSTANTIATE_TEST_SUITE_P(
     , QVFuzzFilesTest,
     testing::Values(Target{"MMV", QVFuzzMMV, QVFuzzMMVSeeds(), 1000},
                     Target{"KernelText", QVFuzzKernelText, QVFuzzKernelTextSeeds(), 100},
-                    Target{"JSONFile", QVFuzzJSONFile, QVFuzzJSONFileSeeds(), 1000}),
+                    Target{"JSONFile", QVFuzzJSONFile, QVFuzzJSONFileSeeds(), 1000},
+                    Target{"JSONScan", QVFuzzJSONScan, QVFuzzJSONScanSeeds(), 1000}),
     [](const auto& instance) { return instance.param.name; });
 
 }  // namespace
