@@ -267,12 +267,11 @@ bool QVReporterCalls::handleStep(const QVReporterRecord& record, QVReporterSessi
 }
 
 bool QVReporterCalls::destroy(QVReporterSessionState& session) {
-  if (session.isPresent && !hasRoom()) return false;
   // One that was lost and is to be restored waits for that, where its real-time queues hold
   // something.
   if ((session.isPresent || session.isStarted) && !isDrainedBeforeStep(session)) return false;
   if (session.isPresent &&
-      !issue(client_->destroyReportingSession(session.reporterID, acknowledge()))) {
+      (!hasRoom() || !issue(client_->destroyReportingSession(session.reporterID, acknowledge())))) {
     return false;
   }
   for (const auto& ring : core_.rings.all()) {
