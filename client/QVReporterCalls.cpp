@@ -115,8 +115,11 @@ void QVReporterCalls::work() {
 std::size_t QVReporterCalls::workQueue() {
   if (!isRestored_) return 0;
   std::size_t done = 0;
-  for (QVReporterRecord record; done < kTurn && core_.queue.front(record) && handle(record);
-       ++done) {
+  for (QVReporterRecord record; done < kTurn && core_.queue.front(record); ++done) {
+    const bool isHandled = record.kind == Kind::message
+                               ? handleMessage(record, core_.queue.frontPayload())
+                               : handleStep(record, *record.session);
+    if (!isHandled) break;
     core_.queue.pop();
   }
   return done;
@@ -188,12 +191,7 @@ bool QVReporterCalls::isGone(const QVReporterSessionState& session) const {
   return !session.isPresent && !core_.options.restoreSessions;
 }
 
-// False where it has to wait; the record then stays where it is.
-bool QVReporterCalls::handle(const QVReporterRecord& record) {
-  if (record.kind == Kind::message) return handleMessage(record, core_.queue.frontPayload());
-  return handleStep(record, *record.session);
-}
-
+// False where it has to wait and so stays where it is, as in all that follow.
 bool QVReporterCalls::handleMessage(const QVReporterRecord& record, std::span<char> payload) {
   if (core_.isReportingOff()) {
     core_.countDrop(QVDropReason::disabled);

@@ -60,7 +60,6 @@ class QVReporterCalls {
   bool start(QVReporterSessionState& session);
   bool configure(QVReporterSessionState& session);
   bool isGone(const QVReporterSessionState& session) const;
-  bool handle(const QVReporterRecord& record);
   bool handleStep(const QVReporterRecord& record, QVReporterSessionState& session);
   bool handleMessage(const QVReporterRecord& record, std::span<char> payload);
   bool destroy(QVReporterSessionState& session);
