@@ -62,7 +62,7 @@ void QVReporterCalls::end() {
   const bool forgets = !core_.options.restoreSessions;
   if (forgets) {
     core_.rings.forEach([this](QVRealtimeRing& ring) {
-      if (ring.session->isOpen) lose(ring);
+      if (ring.session->isPresent) lose(ring);
     });
   }
   core_.sessions.forEach([forgets](QVReporterSessionState& session) {
