@@ -51,7 +51,8 @@ class QVReporterFixture : public testing::Test {
   static std::string describe(const Call& call);
   static void answer(QVScriptedService& service, const Call& call);
 
-  // Waits until the reporter says that it is without its service.
+  // Waits until the reporter says that it is without its service; where nobody listens, it stays
+  // so.
   void awaitConnectionError() const;
   // The drops that the reporter told of, in all; waits until there are so many.
   QVDropCounts awaitDrops(uint64_t count);

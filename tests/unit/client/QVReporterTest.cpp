@@ -286,6 +286,7 @@ TEST_F(QVReporterTest, SaysWhatKeepsItFromTheService) {
   serve(*service, 2);
   EXPECT_EQ(reporter_->flush(kPatience), Code::none);
   EXPECT_EQ(reporter_->connectionError().code(), Code::none);
+  stopListening();
   service->hangUp();
   awaitConnectionError();
 }
