@@ -166,7 +166,11 @@ TEST_P(QVClientWaitingTest, WaitingUntilSentDoesNotWaitForTheBatchesOfOthers) {
   const QVClientBatch batch(*client_);
   EXPECT_EQ(client_->createReportingSession(1, nullptr).code(), Code::queueFull);
   EXPECT_EQ(service_.nextCall().member, "SendMessage");
-  EXPECT_FALSE(client_->createReportingSession(2, nullptr));
+  // There is room once the thread that waits has noted what has left.
+  QVClientError kept;
+  do kept = client_->createReportingSession(2, nullptr);
+  while (kept.code() == Code::queueFull);
+  EXPECT_FALSE(kept);
   EXPECT_FALSE(sent.get());
 }
 
