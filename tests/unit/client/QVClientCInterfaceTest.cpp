@@ -28,6 +28,7 @@ namespace {
 
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
+using ::testing::UnorderedElementsAre;
 
 constexpr uint32_t kCategory = QUIETVOX_COMPONENT_SESSION + QUIETVOX_KIND_PLAYBACK;
 
@@ -74,10 +75,10 @@ TEST_F(QVClientCInterfaceTest, ReportsFromPlainC) {
   QuietVoxRealtimeQueue* queue = nullptr;
   EXPECT_EQ(quietvox_c99_report(handle_, &queue, &session), QUIETVOX_OK);
   const auto service = accept();
-  EXPECT_THAT(serve(*service, 6), ElementsAre("create 7", "type 7 2", "configure 7 48000",
-                                              "start 7", "valid 7", "send 7 480"));
-  EXPECT_EQ(serve(*service), "send * 481");
-  EXPECT_EQ(serve(*service), "send 7 482");
+  EXPECT_THAT(serve(*service, 5),
+              ElementsAre("create 7", "type 7 2", "configure 7 48000", "start 7", "valid 7"));
+  // The queues take turns.
+  EXPECT_THAT(serve(*service, 3), UnorderedElementsAre("send 7 480", "send * 481", "send 7 482"));
   EXPECT_EQ(quietvox_session_set_service_type(session, QUIETVOX_SERVICE_ALARMS), QUIETVOX_OK);
   EXPECT_EQ(quietvox_session_stop(session), QUIETVOX_OK);
   quietvox_realtime_close(queue);
