@@ -377,6 +377,23 @@ TEST_F(QVToolSessionTest, PassesSignalsOnToTheCommand) {
   EXPECT_EQ(at(last[0], {"signal"}), QVValue(SIGKILL));
 }
 
+TEST_F(QVToolSessionTest, GivesTheCommandTheSignalsThatItWasStartedWith) {
+  service();
+  // Without the C library's own, which it ignores in what it spawns: signals 1 to 28.
+  const Arguments show{"grep", "-oE", "Sig(Blk|Ign)|[0-9a-f]{7}$", "/proc/self/status"};
+  Arguments arguments{"session", "run", "--"};
+  arguments.insert(arguments.end(), show.begin(), show.end());
+  for (const std::string how : {"--default-signal=PIPE", "--ignore-signal=PIPE",
+                                "--ignore-signal=HUP", "--block-signal=USR1"}) {
+    Arguments direct{"env", how};
+    direct.insert(direct.end(), show.begin(), show.end());
+    const Output output = qvctl(arguments, {"env", how});
+    EXPECT_EQ(output.status, 0) << output.error;
+    EXPECT_THAT(output.out, HasSubstr("SigIgn"));
+    EXPECT_EQ(output.out, QVSubprocess::run(direct).text) << how;
+  }
+}
+
 TEST_F(QVToolSessionTest, GivesTheCommandItsStandardInput) {
   service();
   const auto ran = terminal({"session", "run", "--", "sh", "-c", "read line; echo got $line"});
@@ -421,6 +438,19 @@ TEST_F(QVToolSessionTest, EndsWithItsCommandWhereTheServiceWentAway) {
   ran->type("\n");
   EXPECT_EQ(ran->wait(), 5);
   EXPECT_THAT(ran->shown(), HasSubstr("not reported"));
+}
+
+TEST_F(QVToolSessionTest, DoesNotWaitOnWhereTheServiceFallsSilent) {
+  const auto ran = terminal({"session", "run", "--id", "7", "--", "sh", "-c",
+                             "kill -STOP " + std::to_string(service().pid()) + "; exit 6"});
+  ASSERT_TRUE(ran->await("waiting for the service"));
+  ran->signal(SIGTERM);
+  EXPECT_EQ(ran->wait(), 6);
+  EXPECT_THAT(ran->shown(), HasSubstr("not known to be reported"));
+  // All of it had been sent.
+  service().signal(SIGCONT);
+  endService();
+  EXPECT_THAT(messages(7).back(), HasSubstr(R"("exit_status":6)"));
 }
 
 }  // namespace
