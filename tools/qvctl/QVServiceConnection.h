@@ -58,6 +58,11 @@ class QVServiceConnection {
     isSaid_ = isSaid_ || (notice != nullptr && notice->end());
     return result;
   }
+  // Makes one of the client's calls that do not wait: the reply comes on the library's thread.
+  template <class... Parameters, class... Arguments>
+  void send(QVClientError (QVClient::*call)(Parameters...), Arguments&&... arguments) {
+    expectTaken((client_.get()->*call)(std::forward<Arguments>(arguments)...));
+  }
 
   std::vector<int64_t> reporters();
   // The session's service type; nothing where there is no such session.

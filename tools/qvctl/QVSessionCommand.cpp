@@ -26,21 +26,18 @@ QVToolStatus QVSessionCommand::run(const QVToolContext& context, const Options& 
 void QVSessionCommand::create(const QVToolContext& context, const Options& options) {
   options.setup.check();
   const QVSessionKeeper keeper(context.places);
-  const auto kept = keeper.start(options.setup, options.start);
-  try {
-    if (context.output.isJSON()) {
-      context.output.json(QVDictionary{{"session", kept.reporterID}, {"keeper", kept.keeper}});
+  const auto tell = [&output = context.output](const QVSessionKeeper::Kept& kept) {
+    if (output.isJSON()) {
+      output.json(QVDictionary{{"session", kept.reporterID}, {"keeper", kept.keeper}});
     } else {
-      context.output.line(std::to_string(kept.reporterID));
+      output.line(std::to_string(kept.reporterID));
     }
-    context.output.flush();
+    output.flush();
+  };
+  try {
+    keeper.start(options.setup, options.start, tell);
   } catch (const QVReaderGone&) {
-    keeper.ask(kept.reporterID, QVSessionKeeper::Request::destroy);
     throw QVToolFailure(QVToolStatus::failed, "nobody reads which session was created");
-  } catch (const QVToolFailure&) {
-    // A session that nobody knows of would stay for good.
-    keeper.ask(kept.reporterID, QVSessionKeeper::Request::destroy);
-    throw;
   }
 }
 

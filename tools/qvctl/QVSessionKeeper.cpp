@@ -8,12 +8,17 @@
 #include <array>
 #include <cerrno>
 #include <chrono>
+#include <csignal>
+#include <cstddef>
 #include <exception>
 #include <string_view>
+#include <utility>
+#include <vector>
 
 #include <fcntl.h>
 #include <poll.h>
 #include <sys/eventfd.h>
+#include <sys/prctl.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/time.h>
@@ -22,14 +27,14 @@
 
 namespace {
 
-// Requests that may wait for the keeper.
+// Connections that may wait for the keeper to take them, and of those it took, that may wait for
+// their own request. Scripts have one or two.
 constexpr int kBacklog = 16;
+constexpr std::size_t kMostConnections = 16;
 // Bytes of an answer: a status and a text for people.
 constexpr std::size_t kAnswerBytes = 4096;
-// How long either side waits for the other: the service's answer, and a little.
-constexpr timeval kPatience{
-    .tv_sec = std::chrono::ceil<std::chrono::seconds>(QVServiceConnection::kTimeLimit).count() + 5,
-    .tv_usec = 0};
+// What the creator says when the session is known of.
+constexpr char kHandOver = 'h';
 
 struct Answer {
   QVToolStatus status = QVToolStatus::done;
@@ -44,19 +49,23 @@ struct Answer {
   }
 };
 
-Answer receive(int descriptor) {
+// Waits, where the socket has no time limit for as long as there is somebody at the other end.
+Answer receive(int socket) {
   std::array<char, kAnswerBytes> bytes;
   ssize_t count = 0;
   do {
-    count = ::read(descriptor, bytes.data(), bytes.size());
+    count = ::recv(socket, bytes.data(), bytes.size(), 0);
   } while (count < 0 && errno == EINTR);
+  if (count < 0 && (errno == EAGAIN || errno == EWOULDBLOCK)) {
+    return {QVToolStatus::notRunning, "the session's keeper does not answer"};
+  }
   return Answer::fromBytes({bytes.data(), static_cast<std::size_t>(std::max<ssize_t>(count, 0))});
 }
 
-void send(int descriptor, const Answer& answer) {
+// Whoever asked may have gone, and is not waited for.
+void send(int socket, const Answer& answer) {
   const std::string bytes = answer.bytes().substr(0, kAnswerBytes);
-  // Whoever asked may have gone.
-  static_cast<void>(::write(descriptor, bytes.data(), bytes.size()));
+  static_cast<void>(::send(socket, bytes.data(), bytes.size(), MSG_NOSIGNAL | MSG_DONTWAIT));
 }
 
 // Whose process is at the other end, as the kernel has it.
@@ -74,14 +83,24 @@ bool isTrusted(int connection) {
 }
 
 QVDescriptor makeSocket() {
-  QVDescriptor made(::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0));
+  QVDescriptor made(::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
   if (!made.isOpen()) throw QVToolFailure::ofSystem("a socket", errno);
-  ::setsockopt(made.get(), SOL_SOCKET, SO_RCVTIMEO, &kPatience, sizeof kPatience);
   return made;
 }
 
-const sockaddr* generic(const sockaddr_un& address) {
-  return reinterpret_cast<const sockaddr*>(&address);
+// At once or not at all: whoever has taken a keeper's name, and takes no connections, holds nobody
+// up. The socket is one that does not block.
+bool connectTo(int socket, const sockaddr_un& address) {
+  return ::connect(socket, reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0;
+}
+
+// From now on the socket blocks, for that long.
+void waitFor(int socket, std::chrono::milliseconds patience) {
+  const auto seconds = std::chrono::floor<std::chrono::seconds>(patience);
+  const std::chrono::microseconds rest = patience - seconds;
+  const timeval limit{.tv_sec = seconds.count(), .tv_usec = rest.count()};
+  ::setsockopt(socket, SOL_SOCKET, SO_RCVTIMEO, &limit, sizeof limit);
+  ::fcntl(socket, F_SETFL, ::fcntl(socket, F_GETFL) & ~O_NONBLOCK);
 }
 
 // The caller's locks and pipes would otherwise last as long as the keeper.
@@ -116,6 +135,82 @@ Answer carryOut(QVServiceConnection& service, int64_t reporterID,
   }
 }
 
+// Ends with the process that made this one, whose number that is.
+void dependOn(pid_t creator) {
+  ::prctl(PR_SET_PDEATHSIG, SIGKILL);
+  // It may have ended before.
+  if (::getppid() != creator) ::_exit(static_cast<int>(QVToolStatus::failed));
+}
+
+// Whether the creator has told of the session; it waits for the end of this, and may end then.
+bool isHandedOver(int creator) {
+  char byte = 0;
+  while (::recv(creator, &byte, 1, 0) < 0 && errno == EINTR) {
+  }
+  if (byte != kHandOver) return false;
+  ::prctl(PR_SET_PDEATHSIG, 0);
+  ::close(creator);
+  return true;
+}
+
+// In the keeper: those who are connected and have not said yet what they want.
+class Requests {
+ public:
+  Requests(QVServiceConnection& service, int64_t reporterID)
+      : service_(service), reporterID_(reporterID) {}
+
+  // Serves until the session's end.
+  void serve(int listener, int lost) {
+    const QVSignals signals{SIGINT, SIGTERM};
+    while (true) {
+      std::vector<pollfd> entries{
+          {listener, POLLIN, 0}, {signals.descriptor(), POLLIN, 0}, {lost, POLLIN, 0}};
+      for (const QVDescriptor& connection : waiting_)
+        entries.push_back({connection.get(), POLLIN, 0});
+      if (::poll(entries.data(), entries.size(), -1) < 0) continue;
+      if (entries[2].revents != 0) return;
+      if (entries[1].revents != 0) {
+        carryOut(service_, reporterID_, QVSessionKeeper::Request::destroy);
+        return;
+      }
+      // Last to first, as those that are answered go.
+      for (std::size_t i = entries.size(); i-- > kOthers;) {
+        if (entries[i].revents != 0 && isLast(i - kOthers)) return;
+      }
+      if (entries[0].revents != 0) accept(listener);
+    }
+  }
+
+ private:
+  static constexpr std::size_t kOthers = 3;
+
+  void accept(int listener) {
+    QVDescriptor connection(::accept4(listener, nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
+    // Others are not even waited for.
+    if (!connection.isOpen() || !isTrusted(connection.get())) return;
+    // Whoever has been silent for the longest time has the least to say.
+    if (waiting_.size() == kMostConnections) waiting_.erase(waiting_.begin());
+    waiting_.push_back(std::move(connection));
+  }
+
+  // Does what that one wants; whether that was the session's end.
+  bool isLast(std::size_t index) {
+    using Request = QVSessionKeeper::Request;
+    const QVDescriptor connection = std::move(waiting_[index]);
+    waiting_.erase(waiting_.begin() + static_cast<std::ptrdiff_t>(index));
+    char request = 0;
+    if (::recv(connection.get(), &request, 1, 0) != 1) return false;
+    const bool isEnd = request == static_cast<char>(Request::destroy);
+    if (!isEnd && request != static_cast<char>(Request::stop)) return false;
+    send(connection.get(), carryOut(service_, reporterID_, static_cast<Request>(request)));
+    return isEnd;
+  }
+
+  QVServiceConnection& service_;
+  const int64_t reporterID_;
+  std::vector<QVDescriptor> waiting_;  // in the order they came
+};
+
 }  // namespace
 
 sockaddr_un QVSessionKeeper::address(int64_t reporterID) const {
@@ -136,82 +231,89 @@ sockaddr_un QVSessionKeeper::address(int64_t reporterID) const {
   return address;
 }
 
-QVSessionKeeper::Kept QVSessionKeeper::start(const QVSessionSetup& setup, bool startSession) const {
+void QVSessionKeeper::start(const QVSessionSetup& setup, bool startSession,
+                            const std::function<void(const Kept& kept)>& tell) const {
   std::array<int, 2> ends{-1, -1};
-  if (::pipe2(ends.data(), O_CLOEXEC) != 0) throw QVToolFailure::ofSystem("a pipe", errno);
-  const QVDescriptor report(ends[0]);
-  QVDescriptor keepersEnd(ends[1]);
+  if (::socketpair(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0, ends.data()) != 0) {
+    throw QVToolFailure::ofSystem("a socket", errno);
+  }
+  QVDescriptor own(ends[0]);
+  QVDescriptor keepers(ends[1]);
+  const pid_t creator = ::getpid();
   const pid_t keeper = ::fork();
   if (keeper < 0) throw QVToolFailure::ofSystem("a process", errno);
-  if (keeper == 0) keep(setup, startSession, keepersEnd.get());
-  keepersEnd = QVDescriptor();
-  const Answer answer = receive(report.get());
-  if (answer.status != QVToolStatus::done) {
-    ::waitpid(keeper, nullptr, 0);
-    throw QVToolFailure(answer.status, answer.text);
+  if (keeper == 0) {
+    dependOn(creator);
+    keep(setup, startSession, keepers.get());
   }
-  return {std::stoll(answer.text), keeper};
+  keepers = QVDescriptor();
+  try {
+    const Answer answer = receive(own.get());
+    if (answer.status != QVToolStatus::done) throw QVToolFailure(answer.status, answer.text);
+    tell({std::stoll(answer.text), keeper});
+  } catch (...) {
+    own = QVDescriptor();
+    ::waitpid(keeper, nullptr, 0);
+    throw;
+  }
+  ::send(own.get(), &kHandOver, 1, MSG_NOSIGNAL);
+  // Until then it would end with this process.
+  receive(own.get());
 }
 
-void QVSessionKeeper::keep(const QVSessionSetup& setup, bool startSession, int report) const {
-  closeInherited(report);
+void QVSessionKeeper::keep(const QVSessionSetup& setup, bool startSession, int creator) const {
+  closeInherited(creator);
   try {
     const QVDescriptor lost(::eventfd(0, EFD_CLOEXEC));
     QVServiceConnection service(places_, [&lost] { ::eventfd_write(lost.get(), 1); });
     const int64_t session = setup.create(service);
-    const sockaddr_un place = address(session);
-    const QVDescriptor listener = makeSocket();
-    if (::bind(listener.get(), generic(place), sizeof place) != 0 ||
-        ::listen(listener.get(), kBacklog) != 0) {
-      throw QVToolFailure::ofSystem("the keeper's socket", errno);
-    }
+    const QVDescriptor listener = listenFor(session);
     if (startSession) {
       service.ask(&QVClient::startReportingSessionForIDAndWait, session, nullptr);
     }
-    send(report, {QVToolStatus::done, std::to_string(session)});
-    ::close(report);
-    detach();
-    serve(service, session, listener.get(), lost.get());
+    send(creator, {QVToolStatus::done, std::to_string(session)});
+    if (isHandedOver(creator)) {
+      detach();
+      Requests(service, session).serve(listener.get(), lost.get());
+    } else {
+      carryOut(service, session, Request::destroy);
+    }
   } catch (const QVToolFailure& failure) {
-    send(report, {failure.status(), failure.what()});
+    send(creator, {failure.status(), failure.what()});
     ::_exit(static_cast<int>(failure.status()));
   } catch (const std::exception& failure) {
-    send(report, {QVToolStatus::failed, failure.what()});
+    send(creator, {QVToolStatus::failed, failure.what()});
     ::_exit(static_cast<int>(QVToolStatus::failed));
   }
   ::_exit(static_cast<int>(QVToolStatus::done));
 }
 
-void QVSessionKeeper::serve(QVServiceConnection& service, int64_t reporterID, int listener,
-                            int lost) const {
-  const QVSignals signals{SIGINT, SIGTERM};
-  while (true) {
-    std::array<pollfd, 3> entries{
-        {{listener, POLLIN, 0}, {signals.descriptor(), POLLIN, 0}, {lost, POLLIN, 0}}};
-    if (::poll(entries.data(), entries.size(), -1) < 0) continue;
-    if (entries[2].revents != 0) return;
-    if (entries[1].revents != 0) {
-      carryOut(service, reporterID, Request::destroy);
-      return;
-    }
-    const QVDescriptor connection(::accept4(listener, nullptr, nullptr, SOCK_CLOEXEC));
-    // Others are not even waited for.
-    if (!connection.isOpen() || !isTrusted(connection.get())) continue;
-    char request = 0;
-    ::setsockopt(connection.get(), SOL_SOCKET, SO_RCVTIMEO, &kPatience, sizeof kPatience);
-    if (::read(connection.get(), &request, 1) != 1) continue;
-    const bool isEnd = request == static_cast<char>(Request::destroy);
-    if (!isEnd && request != static_cast<char>(Request::stop)) continue;
-    const Answer answer = carryOut(service, reporterID, static_cast<Request>(request));
-    send(connection.get(), answer);
-    if (isEnd) return;
+QVDescriptor QVSessionKeeper::listenFor(int64_t reporterID) const {
+  const sockaddr_un place = address(reporterID);
+  QVDescriptor listener = makeSocket();
+  if (::bind(listener.get(), reinterpret_cast<const sockaddr*>(&place), sizeof place) == 0 &&
+      ::listen(listener.get(), kBacklog) == 0) {
+    return listener;
   }
+  const int number = errno;
+  const QVDescriptor taken = makeSocket();
+  if (number == EADDRINUSE && connectTo(taken.get(), place) && !isTrusted(taken.get())) {
+    throw QVToolFailure(QVToolStatus::notPermitted,
+                        QVText("the user ", userOf(taken.get()),
+                               " has taken the place of the keeper of session ", reporterID));
+  }
+  throw QVToolFailure::ofSystem(QVText("the place of the keeper of session ", reporterID), number);
 }
 
 void QVSessionKeeper::ask(int64_t reporterID, Request request) const {
   const QVDescriptor connection = makeSocket();
-  const sockaddr_un place = address(reporterID);
-  if (::connect(connection.get(), generic(place), sizeof place) != 0) {
+  if (!connectTo(connection.get(), address(reporterID))) {
+    // Its own, or one of somebody who has taken the name.
+    if (errno == EAGAIN) {
+      throw QVToolFailure(QVToolStatus::notRunning,
+                          QVText("the keeper of session ", reporterID,
+                                 " does not answer: it does not take connections"));
+    }
     throw QVToolFailure(QVToolStatus::failed,
                         QVText("session ", reporterID,
                                " was not created with qvctl session create; "
@@ -222,6 +324,7 @@ void QVSessionKeeper::ask(int64_t reporterID, Request request) const {
     throw QVToolFailure(QVToolStatus::notPermitted,
                         QVText("session ", reporterID, " is another user's"));
   }
+  waitFor(connection.get(), patience_);
   const char byte = static_cast<char>(request);
   if (::send(connection.get(), &byte, 1, MSG_NOSIGNAL) != 1) {
     throw QVToolFailure::ofSystem("the session's keeper", errno);

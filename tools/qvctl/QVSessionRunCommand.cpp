@@ -3,6 +3,7 @@
 #include "platform/QVText.h"
 #include "tools/qvctl/QVNames.h"
 #include "tools/qvctl/QVSendCommand.h"
+#include "tools/qvctl/QVSessionEnd.h"
 #include "tools/qvctl/QVSignals.h"
 
 #include <array>
@@ -60,8 +61,9 @@ class Session {
 
   int64_t reporterID() const { return reporterID_; }
 
-  // `ownPeak`: of this process's memory when the command began.
-  void end(const Outcome& outcome, int64_t ownPeak) {
+  // `ownPeak`: of this process's memory when the command began. A signal ends the wait for the
+  // service: the command, which they were meant for, is no more.
+  void end(const Outcome& outcome, int64_t ownPeak, const QVSignals& signals) {
     QVClientPayload message = endMessage(outcome.exitStatus());
     message.set("wall_seconds", std::chrono::duration<double>(outcome.wall).count())
         .set("user_seconds", secondsOf(outcome.used.ru_utime))
@@ -70,11 +72,13 @@ class Session {
     // not to be told from it.
     if (outcome.used.ru_maxrss > ownPeak) message.set("max_resident_kib", outcome.used.ru_maxrss);
     if (WIFSIGNALED(outcome.status)) message.set("signal", WTERMSIG(outcome.status));
-    finish(message);
+    finish(message, signals);
   }
 
   // The command never began.
-  void endWithoutCommand(int status) { finish(endMessage(status)); }
+  void endWithoutCommand(int status, const QVSignals& signals) {
+    finish(endMessage(status), signals);
+  }
 
  private:
   QVClientPayload endMessage(int exitStatus) const {
@@ -83,9 +87,10 @@ class Session {
     return message;
   }
 
-  void finish(const QVClientPayload& message) {
-    send(message, QVClientMessageType::stop);
-    service_.ask(&QVClient::stopReportingSessionForIDAndWait, reporterID_);
+  void finish(const QVClientPayload& message, const QVSignals& signals) {
+    const QVSessionEnd end(service_, reporterID_, message, QVClientCategory(category_));
+    const std::string problem = end.await(signals.descriptor());
+    if (!problem.empty()) QVToolOutput::note(problem);
   }
 
   // Reporting that is switched off is no reason not to run the command.
@@ -122,13 +127,14 @@ std::vector<char*> pointersTo(std::vector<std::string>& texts) {
 
 // Begins the command; answers an error number.
 int spawn(std::vector<std::string> command, const std::optional<int64_t>& session,
-          const QVSignals& signals, pid_t& pid) {
+          const QVSignals& signals, bool ignoresPipes, pid_t& pid) {
   std::vector<std::string> environment = environmentWith(session);
   posix_spawnattr_t attributes;
   ::posix_spawnattr_init(&attributes);
   sigset_t defaults;
   ::sigemptyset(&defaults);
-  ::sigaddset(&defaults, SIGPIPE);
+  // Which qvctl ignores for itself.
+  if (!ignoresPipes) ::sigaddset(&defaults, SIGPIPE);
   ::posix_spawnattr_setsigmask(&attributes, &signals.previous());
   ::posix_spawnattr_setsigdefault(&attributes, &defaults);
   ::posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGMASK | POSIX_SPAWN_SETSIGDEF);
@@ -138,7 +144,9 @@ int spawn(std::vector<std::string> command, const std::optional<int64_t>& sessio
   return error;
 }
 
-// Those that the terminal sends go to all of its processes, to the command as well.
+// Those that the terminal sends go to all of its processes, to the command as well. Of a process
+// that signals the whole group nothing tells it from one that means qvctl alone, as a script's
+// `kill $!` does; that one is not to be lost, so the command gets the former's twice.
 bool isFromTerminal(const signalfd_siginfo& signal) {
   return signal.ssi_code == SI_KERNEL;
 }
@@ -202,18 +210,18 @@ QVToolStatus QVSessionRunCommand::run(const QVToolContext& context, const Option
   const auto began = Clock::now();
   pid_t pid = -1;
   const auto reporterID = session ? std::optional(session->reporterID()) : std::nullopt;
-  if (const int error = spawn(options.command, reporterID, signals, pid)) {
+  if (const int error = spawn(options.command, reporterID, signals, context.ignoresPipes, pid)) {
     QVToolOutput::note(options.command[0] + ": " + std::generic_category().message(error));
     const int status = error == ENOENT ? kNotFound : kCannotRun;
     report([&] {
-      if (session) session->endWithoutCommand(status);
+      if (session) session->endWithoutCommand(status, signals);
     });
     return static_cast<QVToolStatus>(status);
   }
   const int64_t ownPeak = ownPeakKiB();
   const Outcome outcome = await(pid, signals, began);
   report([&] {
-    if (session) session->end(outcome, ownPeak);
+    if (session) session->end(outcome, ownPeak, signals);
   });
   return static_cast<QVToolStatus>(outcome.exitStatus());
 }

@@ -8,4 +8,6 @@
 struct QVToolContext {
   QVToolPlaces places;
   QVToolOutput& output;
+  // Whether qvctl was started with SIGPIPE ignored: programs that it runs begin with that, too.
+  bool ignoresPipes = false;
 };

@@ -9,12 +9,12 @@
 
 namespace {
 
-QVToolStatus runCommand(int argc, char** argv) {
+QVToolStatus runCommand(int argc, char** argv, bool ignoresPipes) {
   QVCommandLine commandLine;
   auto status = QVToolStatus::done;
   if (!commandLine.parse(argc, argv, status)) return status;
   QVToolOutput output(commandLine.wantsJSON());
-  const QVToolContext context{commandLine.places(), output};
+  const QVToolContext context{commandLine.places(), output, ignoresPipes};
   status = commandLine.run(context);
   output.flush();
   return status;
@@ -24,9 +24,9 @@ QVToolStatus runCommand(int argc, char** argv) {
 
 int main(int argc, char** argv) {
   // Whoever reads may go away; that is no failure, and has to be told from one.
-  static_cast<void>(std::signal(SIGPIPE, SIG_IGN));
+  const bool ignoresPipes = std::signal(SIGPIPE, SIG_IGN) == SIG_IGN;
   try {
-    return static_cast<int>(runCommand(argc, argv));
+    return static_cast<int>(runCommand(argc, argv, ignoresPipes));
   } catch (const QVReaderGone&) {
     return static_cast<int>(QVToolStatus::done);
   } catch (const QVToolFailure& failure) {

@@ -37,6 +37,21 @@ class QVToolSessionTest : public QVToolTest {
     return store().rows("SELECT category, type, payload FROM beacon_message WHERE session_id = " +
                         std::to_string(session) + " AND type <> 65535 ORDER BY id");
   }
+  // Where the session's keeper listens.
+  sockaddr_un keeperAddress(int64_t session) const {
+    struct stat file {};
+    EXPECT_EQ(::stat(root_.socket().c_str(), &file), 0);
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    QVText("quietvox-session/", uint64_t{file.st_dev}, "/", uint64_t{file.st_ino}, "/", session)
+        .copy(address.sun_path + 1, sizeof address.sun_path - 1);
+    return address;
+  }
+  static int connectToKeeper(const sockaddr_un& address) {
+    const int made = ::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0);
+    EXPECT_EQ(::connect(made, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+    return made;
+  }
 };
 
 TEST_F(QVToolSessionTest, SendsToSessionsOfOthers) {
@@ -122,25 +137,62 @@ TEST_F(QVToolSessionTest, IsNotHeldUpByOtherUsers) {
   if (::getuid() != 0) GTEST_SKIP() << "only root can turn into another user";
   service();
   EXPECT_EQ(run({"session", "create", "7"}), "7\n");
-  struct stat file {};
-  ASSERT_EQ(::stat(root_.socket().c_str(), &file), 0);
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  QVText("quietvox-session/", uint64_t{file.st_dev}, "/", uint64_t{file.st_ino}, "/7")
-      .copy(address.sun_path + 1, sizeof address.sun_path - 1);
-  const int other = ::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0);
+  const sockaddr_un address = keeperAddress(7);
   // The kernel tells the keeper who it was that connected.
   ASSERT_EQ(::seteuid(kNobody), 0);
-  const int connected =
-      ::connect(other, reinterpret_cast<const sockaddr*>(&address), sizeof address);
+  const int other = connectToKeeper(address);
   ASSERT_EQ(::seteuid(0), 0);
-  ASSERT_EQ(connected, 0);
   // It says nothing, and is not waited for.
   pollfd entry{other, POLLIN, 0};
   EXPECT_EQ(::poll(&entry, 1, 10'000), 1);
   EXPECT_NE(entry.revents & POLLHUP, 0);
   EXPECT_EQ(run({"session", "destroy", "7"}), "");
   ::close(other);
+}
+
+TEST_F(QVToolSessionTest, IsNotHeldUpByWhoSaysNothing) {
+  service();
+  EXPECT_EQ(run({"session", "create", "7", "--start"}), "7\n");
+  // More than a keeper keeps at a time.
+  std::vector<int> silent;
+  for (int i = 0; i < 20; ++i) silent.push_back(connectToKeeper(keeperAddress(7)));
+  EXPECT_EQ(run({"session", "stop", "7"}), "");
+  EXPECT_EQ(run({"session", "destroy", "7"}), "");
+  for (const int descriptor : silent) ::close(descriptor);
+}
+
+TEST_F(QVToolSessionTest, IsNotHeldUpByWhoTakesAKeepersName) {
+  const int service = listenInstead();
+  const sockaddr_un address = keeperAddress(7);
+  const int taken = ::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0);
+  ASSERT_EQ(::bind(taken, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+  ASSERT_EQ(::listen(taken, 0), 0);
+  // The only one that may wait.
+  const int first = connectToKeeper(address);
+  for (const char* request : {"stop", "destroy"}) {
+    const Output output = qvctl({"session", request, "7"});
+    EXPECT_EQ(output.status, 3);
+    EXPECT_THAT(output.error, HasSubstr("does not answer"));
+  }
+  for (const int descriptor : {first, taken, service}) ::close(descriptor);
+}
+
+TEST_F(QVToolSessionTest, SaysWhoHasTakenAKeepersName) {
+  if (::getuid() != 0) GTEST_SKIP() << "only root can turn into another user";
+  service();
+  const sockaddr_un address = keeperAddress(7);
+  const int taken = ::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0);
+  ASSERT_EQ(::bind(taken, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+  // The kernel remembers who listens.
+  ASSERT_EQ(::seteuid(kNobody), 0);
+  const int listening = ::listen(taken, 4);
+  ASSERT_EQ(::seteuid(0), 0);
+  ASSERT_EQ(listening, 0);
+  const Output output = qvctl({"session", "create", "7"});
+  EXPECT_EQ(output.status, 4);
+  EXPECT_THAT(output.error, HasSubstr("the user 65534 has taken"));
+  EXPECT_FALSE(client().isValid(7));
+  ::close(taken);
 }
 
 TEST_F(QVToolSessionTest, IsEndedWithItsKeeper) {
@@ -176,6 +228,43 @@ TEST_F(QVToolSessionTest, LeavesNoSessionThatNobodyKnowsOf) {
                        .standardErrorFile = root_.path() / "error"});
   EXPECT_EQ(create.wait(std::chrono::seconds(60)), 1);
   EXPECT_FALSE(client().isValid(7));
+}
+
+TEST_F(QVToolSessionTest, LeavesNoKeeperWhereNobodyWaitsForItAnyMore) {
+  const int silent = listenInstead();
+  QVSubprocess create({.arguments = command({"session", "create", "7", "--start"}),
+                       .environment = environment(),
+                       .standardErrorFile = root_.path() / "error"});
+  pollfd entry{silent, POLLIN, 0};
+  ASSERT_EQ(::poll(&entry, 1, 60'000), 1);
+  const int keeper = ::accept4(silent, nullptr, nullptr, SOCK_CLOEXEC);
+  create.signal(SIGTERM);
+  EXPECT_EQ(create.wait(std::chrono::seconds(60)), -SIGTERM);
+  // Well before it would give a silent service up.
+  pollfd connection{keeper, POLLRDHUP, 0};
+  EXPECT_EQ(::poll(&connection, 1, 10'000), 1);
+  ::close(keeper);
+  ::close(silent);
+}
+
+TEST_F(QVToolSessionTest, LeavesNoSessionWhereWhoPrintsItIsKilled) {
+  service();
+  // Nobody reads, and there is room for nothing more.
+  const auto pipe = root_.path() / "pipe";
+  ASSERT_EQ(::mkfifo(pipe.c_str(), 0600), 0);
+  const int reader = ::open(pipe.c_str(), O_RDWR | O_NONBLOCK | O_CLOEXEC);
+  const std::string page(4096, 'x');
+  while (::write(reader, page.data(), page.size()) > 0) {
+  }
+  QVSubprocess create({.arguments = command({"session", "create", "7", "--start"}),
+                       .environment = environment(),
+                       .standardOutputFile = pipe});
+  expectLogged("QVReportingUtilityWait: continuing");
+  create.signal(SIGTERM);
+  EXPECT_EQ(create.wait(std::chrono::seconds(60)), -SIGTERM);
+  expectLogged("deallocing this session");
+  EXPECT_FALSE(client().isValid(7));
+  ::close(reader);
 }
 
 TEST_F(QVToolSessionTest, RefusesWhatTheServiceWouldTakeWithoutAWord) {
@@ -288,6 +377,23 @@ TEST_F(QVToolSessionTest, PassesSignalsOnToTheCommand) {
   EXPECT_EQ(at(last[0], {"signal"}), QVValue(SIGKILL));
 }
 
+TEST_F(QVToolSessionTest, GivesTheCommandTheSignalsThatItWasStartedWith) {
+  service();
+  // Without the C library's own, which it ignores in what it spawns: signals 1 to 28.
+  const Arguments show{"grep", "-oE", "Sig(Blk|Ign)|[0-9a-f]{7}$", "/proc/self/status"};
+  Arguments arguments{"session", "run", "--"};
+  arguments.insert(arguments.end(), show.begin(), show.end());
+  for (const std::string how : {"--default-signal=PIPE", "--ignore-signal=PIPE",
+                                "--ignore-signal=HUP", "--block-signal=USR1"}) {
+    Arguments direct{"env", how};
+    direct.insert(direct.end(), show.begin(), show.end());
+    const Output output = qvctl(arguments, {"env", how});
+    EXPECT_EQ(output.status, 0) << output.error;
+    EXPECT_THAT(output.out, HasSubstr("SigIgn"));
+    EXPECT_EQ(output.out, QVSubprocess::run(direct).text) << how;
+  }
+}
+
 TEST_F(QVToolSessionTest, GivesTheCommandItsStandardInput) {
   service();
   const auto ran = terminal({"session", "run", "--", "sh", "-c", "read line; echo got $line"});
@@ -332,6 +438,19 @@ TEST_F(QVToolSessionTest, EndsWithItsCommandWhereTheServiceWentAway) {
   ran->type("\n");
   EXPECT_EQ(ran->wait(), 5);
   EXPECT_THAT(ran->shown(), HasSubstr("not reported"));
+}
+
+TEST_F(QVToolSessionTest, DoesNotWaitOnWhereTheServiceFallsSilent) {
+  const auto ran = terminal({"session", "run", "--id", "7", "--", "sh", "-c",
+                             "kill -STOP " + std::to_string(service().pid()) + "; exit 6"});
+  ASSERT_TRUE(ran->await("waiting for the service"));
+  ran->signal(SIGTERM);
+  EXPECT_EQ(ran->wait(), 6);
+  EXPECT_THAT(ran->shown(), HasSubstr("not known to be reported"));
+  // All of it had been sent.
+  service().signal(SIGCONT);
+  endService();
+  EXPECT_THAT(messages(7).back(), HasSubstr(R"("exit_status":6)"));
 }
 
 }  // namespace
