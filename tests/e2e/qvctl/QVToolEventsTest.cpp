@@ -8,6 +8,7 @@
 #include <csignal>
 #include <filesystem>
 #include <fstream>
+#include <limits>
 #include <set>
 
 #include <fcntl.h>
@@ -274,6 +275,17 @@ TEST_F(QVToolEventsTest, MayHaveTheLargestNumbers) {
   EXPECT_THAT(kindsOf({"events", "--last", "3"}), ElementsAre("message", "start", "stop"));
   EXPECT_THAT(kindsOf({"watch", "--since", "@0", "--for", "0"}),
               ElementsAre("message", "start", "stop"));
+}
+
+TEST_F(QVToolEventsTest, ThatWereLostMayBeMoreThanANumberHolds) {
+  fillStore();
+  endService();
+  execute(
+      "INSERT INTO loss(at, cause, count) VALUES(1, 'store_full', 9223372036854775807), "
+      "(2, 'store_full', 9223372036854775807)");
+  const Output status = qvctl({"status", "--json"});
+  EXPECT_EQ(at(parseLines(status.out)[0], {"store", "losses", "store_full"}),
+            QVValue(std::numeric_limits<int64_t>::max()));
 }
 
 TEST_F(QVToolEventsTest, EndQuietlyWhereTheReaderGoesAway) {
