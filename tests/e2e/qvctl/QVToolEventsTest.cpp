@@ -445,7 +445,7 @@ class QVToolStuckWatchTest : public QVToolWatchTest {
         "INSERT INTO beacon_message(sent_at, session_id, service_name, category, type, payload) "
         "SELECT i, 7, 'telephony', 3, 1, '{\"frames\":480}' FROM n");
   }
-  // watch, which prints all that there is; it has begun to when this returns.
+  // watch, which prints all that there is.
   std::unique_ptr<QVSubprocess> watch(const Arguments& options = {}) {
     // A new one, with nothing in it.
     std::filesystem::remove(pipe_);
@@ -453,13 +453,14 @@ class QVToolStuckWatchTest : public QVToolWatchTest {
     reader_ = QVDescriptor(::open(pipe_.c_str(), O_RDWR | O_CLOEXEC));
     Arguments arguments{"watch", "--since", "@0", "--json"};
     arguments.insert(arguments.end(), options.begin(), options.end());
-    auto process =
-        std::make_unique<QVSubprocess>(QVSubprocess::Options{.arguments = command(arguments),
-                                                             .environment = environment(),
-                                                             .standardOutputFile = pipe_});
+    return std::make_unique<QVSubprocess>(QVSubprocess::Options{.arguments = command(arguments),
+                                                                .environment = environment(),
+                                                                .standardOutputFile = pipe_});
+  }
+  // Until it has begun to print.
+  void awaitOutput() const {
     pollfd entry{reader_.get(), POLLIN, 0};
     EXPECT_EQ(::poll(&entry, 1, 60'000), 1);
-    return process;
   }
 
  private:
@@ -471,6 +472,7 @@ TEST_F(QVToolStuckWatchTest, EndsWhenItIsAskedToWhileNobodyReads) {
   fillPipesStore();
   for (const int number : {SIGINT, SIGTERM, SIGHUP}) {
     const auto process = watch();
+    awaitOutput();
     process->signal(number);
     EXPECT_EQ(process->wait(std::chrono::seconds(60)), 0) << number;
   }
@@ -478,7 +480,7 @@ TEST_F(QVToolStuckWatchTest, EndsWhenItIsAskedToWhileNobodyReads) {
 
 TEST_F(QVToolStuckWatchTest, EndsAfterItsTimeWhileNobodyReads) {
   fillPipesStore();
-  EXPECT_EQ(watch({"--for", "20ms"})->wait(std::chrono::seconds(60)), 0);
+  EXPECT_EQ(watch({"--for", "500ms"})->wait(std::chrono::seconds(60)), 0);
 }
 
 TEST_F(QVToolWatchTest, EndsAfterItsTimeWhileTheStoreIsLocked) {
@@ -534,14 +536,12 @@ TEST_F(QVToolWatchTest, SaysThatEventsMayHaveBeenMissed) {
   fillStore();
   client_.reset();
   endService();
-  const auto watch = terminal({"watch", "--kind", "message", "--json"});
-  // It has looked at the store when it shows what comes first.
-  const std::string row =
+  const auto watch = terminal({"watch", "--kind", "message"});
+  ASSERT_TRUE(watch->await("CONTENTS"));
+  execute(
       "INSERT INTO beacon_message(sent_at, session_id, service_name, category, type, payload) "
-      "VALUES(";
-  execute(row + "1, 7, 'telephony', 3, 1, '{}')");
-  execute(row + "2, 7, 'telephony', 3, 1, '{}')");
-  ASSERT_TRUE(watch->await("\n"));
+      "VALUES(1, 7, 'telephony', 3, 1, '{\"frames\":4711}')");
+  ASSERT_TRUE(watch->await("4711"));
   execute("DELETE FROM beacon_message");
   ASSERT_TRUE(watch->await("may have been missed"));
   watch->type("\x03");
