@@ -1,7 +1,6 @@
 #include "tools/qvctl/QVEventFollower.h"
 
 #include <algorithm>
-#include <tuple>
 #include <vector>
 
 #include <sys/stat.h>
@@ -17,71 +16,87 @@ constexpr std::array<Kind, 5> kKindsWithRows{Kind::start, Kind::message, Kind::a
 
 void QVEventFollower::skip() {
   noticeOtherStore();
+  // Sessions that are started meanwhile lie above the mark, and are looked at then.
   for (const Kind kind : kKindsWithRows) {
-    after_[static_cast<std::size_t>(kind)] = reader_.range(kind).last;
+    marks_[static_cast<std::size_t>(kind)] = markAt(kind, reader_.range(kind));
   }
-  addSessionRows(QVEventRowReader::Sessions::running);
-  // Those above the running ones have stopped, and are left out, too.
-  openAfter_ = after_[static_cast<std::size_t>(Kind::start)];
+  marks_[static_cast<std::size_t>(Kind::stop)] = marks_[static_cast<std::size_t>(Kind::start)];
+  for (const int64_t row : reader_.running(kMaximumOpen)) open_.insert(row);
 }
 
 void QVEventFollower::noticeOtherStore() {
   struct stat file {};
   if (::stat(reader_.path().c_str(), &file) != 0 || file.st_ino == inode_) return;
   if (inode_ != 0) {
-    after_.fill(0);
+    marks_.fill({});
     open_.clear();
-    openAfter_ = 0;
   }
   inode_ = file.st_ino;
 }
 
-void QVEventFollower::noticeEmptiedSessions() {
-  if (reader_.range(Kind::start).last >= openAfter_) return;
-  open_.clear();
-  openAfter_ = 0;
+QVEventFollower::Mark QVEventFollower::markAt(Kind kind,
+                                              const QVEventRowReader::Range& range) const {
+  // The time of a stop may yet change, that of its start does not.
+  const auto time = reader_.timeOf(kind == Kind::stop ? Kind::start : kind, range.last);
+  if (!time && range.last == 0) return {};
+  return {range.last, time};
 }
 
-void QVEventFollower::addSessionRows(QVEventRowReader::Sessions which) {
-  for (const int64_t row : reader_.sessionRows(which, openAfter_, kMaximumOpen)) {
-    open_.insert(row);
-    openAfter_ = std::max(openAfter_, row);
+bool QVEventFollower::goesOn(Kind kind, const QVEventRowReader::Range& range) const {
+  const Mark& mark = marks_[static_cast<std::size_t>(kind)];
+  if (range.last < *mark.row) return false;
+  // The oldest rows go first, and of sessions some: that it is gone says nothing.
+  const auto time = reader_.timeOf(kind == Kind::stop ? Kind::start : kind, *mark.row);
+  return !time || !mark.time || *time == *mark.time;
+}
+
+QVEventRowReader::Span QVEventFollower::advance(Kind kind) {
+  Mark& mark = marks_[static_cast<std::size_t>(kind)];
+  const QVEventRowReader::Range range = reader_.range(kind);
+  QVEventRowReader::Span span = QVEventRowReader::spanOf(range);
+  if (mark.row) {
+    if (goesOn(kind, range)) {
+      if (span.after > *mark.row) mayHaveMissed_ = true;
+      span.after = *mark.row;
+    } else {
+      mayHaveMissed_ = true;
+      if (kind == Kind::stop) open_.clear();
+    }
+  }
+  mark = markAt(kind, range);
+  return span;
+}
+
+void QVEventFollower::take(const QVEventRowReader::Sessions& sessions,
+                           QVEventHistory::Stops& stops) {
+  for (const auto& session : sessions) {
+    if (session.stopped) {
+      stops.emplace_back(*session.stopped, session.row);
+      open_.erase(session.row);
+    } else {
+      open_.insert(session.row);
+    }
   }
   while (open_.size() > kMaximumOpen) open_.erase(open_.begin());
 }
 
-void QVEventFollower::addStops(QVEventRowReader::Events& events) {
-  const std::size_t before = events.size();
-  // Of those that are not wanted, too, for they need not be asked for again.
-  QVEventRowReader(reader_.path(), QVEventFilter())
-      .readStops(std::vector<int64_t>(open_.begin(), open_.end()), events);
-  for (std::size_t i = before; i < events.size(); ++i) open_.erase(events[i].id);
-  std::erase_if(events, [this](const QVStoredEvent& event) {
-    return event.kind == Kind::stop && !reader_.filter().wants(event);
-  });
+QVEventHistory::Stops QVEventFollower::newStops() {
+  QVEventHistory::Stops stops;
+  QVEventRowReader::Span rows = advance(Kind::stop);
+  take(reader_.sessions(std::vector<int64_t>(open_.begin(), open_.end())), stops);
+  // Those that were started and stopped meanwhile, too.
+  while (!rows.isEmpty() && !enough_()) take(reader_.sessions(rows), stops);
+  std::ranges::sort(stops);
+  return stops;
 }
 
-void QVEventFollower::readNew(const Receiver& receiver) {
+void QVEventFollower::readNew(const QVEventHistory::Receiver& receiver) {
   noticeOtherStore();
-  QVEventRowReader::Events events;
+  QVEventHistory::Part part;
+  // Before the rows: what a session has sent is there when its stop is.
+  if (reader_.filter().wants(Kind::stop)) part.stops = newStops();
   for (const Kind kind : kKindsWithRows) {
-    if (!reader_.filter().wants(kind)) continue;
-    int64_t& after = after_[static_cast<std::size_t>(kind)];
-    const int64_t last = reader_.range(kind).last;
-    if (last < after) after = 0;
-    while (after < last) {
-      reader_.read(kind, after, last, events);
-      after = std::min(last, after + QVEventRowReader::kRowsAtATime);
-    }
+    if (reader_.filter().wants(kind)) part.rows[static_cast<std::size_t>(kind)] = advance(kind);
   }
-  if (reader_.filter().wants(Kind::stop)) {
-    noticeEmptiedSessions();
-    // Those that were started and stopped meanwhile, too.
-    addSessionRows(QVEventRowReader::Sessions::all);
-    addStops(events);
-  }
-  std::ranges::sort(events, [](const QVStoredEvent& one, const QVStoredEvent& other) {
-    return std::tie(one.time, one.kind, one.id) < std::tie(other.time, other.kind, other.id);
-  });
-  std::ranges::for_each(events, receiver);
+  QVEventHistory(reader_, enough_).read(std::move(part), receiver);
 }

@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <array>
 #include <iterator>
-#include <ranges>
 #include <tuple>
 #include <utility>
 #include <vector>
@@ -15,71 +14,85 @@ using Kind = QVStoredEvent::Kind;
 constexpr std::array<Kind, QVStoredEvent::kKinds> kAllKinds{
     Kind::start, Kind::message, Kind::analytics, Kind::energy, Kind::stop, Kind::loss};
 
+// Two numbers may be further apart than one can say.
+double distance(int64_t from, int64_t to) {
+  return static_cast<double>(to) - static_cast<double>(from);
+}
+
 bool isEarlier(const QVStoredEvent& one, const QVStoredEvent& other) {
   return std::tie(one.time, one.kind, one.id) < std::tie(other.time, other.kind, other.id);
 }
 
 }  // namespace
 
-QVEventHistory::Source QVEventHistory::sourceOf(Kind kind) {
-  Source source{.kind = kind};
-  if (!reader_.filter().wants(kind)) return source;
-  if (kind == Kind::stop) {
-    source.stops = reader_.stops([this](double part) { progress_.show(part); });
-    source.last = static_cast<int64_t>(source.stops.size());
-    return source;
+QVEventHistory::Stops QVEventHistory::allStops() {
+  Stops stops;
+  const auto whole = QVEventRowReader::spanOf(reader_.range(Kind::stop));
+  auto rest = whole;
+  while (!rest.isEmpty() && !enough_()) {
+    for (const auto& session : reader_.sessions(rest)) {
+      if (session.stopped) stops.emplace_back(*session.stopped, session.row);
+    }
+    progress_.show(distance(whole.after, rest.after) / distance(whole.after, whole.last));
   }
-  const QVEventRowReader::Range range = reader_.range(kind);
-  source.first = source.after = range.first - 1;
-  source.last = range.last;
-  return source;
+  std::ranges::sort(stops);
+  return stops;
 }
 
-QVEventRowReader::Events QVEventHistory::read(const Source& source, int64_t after,
-                                              int64_t last) const {
-  QVEventRowReader::Events events;
-  if (source.kind != Kind::stop) {
-    reader_.read(source.kind, after, last, events);
-    return events;
+QVEventHistory::Part QVEventHistory::all() {
+  Part part;
+  for (const Kind kind : kAllKinds) {
+    if (!reader_.filter().wants(kind)) continue;
+    if (kind == Kind::stop) {
+      part.stops = allStops();
+    } else {
+      part.rows[static_cast<std::size_t>(kind)] = QVEventRowReader::spanOf(reader_.range(kind));
+    }
   }
-  std::vector<int64_t> rows;
-  for (int64_t i = after; i < last; ++i) {
-    rows.push_back(source.stops[static_cast<std::size_t>(i)].second);
-  }
-  reader_.readStops(rows, events);
-  return events;
+  return part;
 }
 
-void QVEventHistory::refill(Source& source) const {
-  while (source.waiting.empty() && source.after < source.last) {
-    const int64_t next = std::min(source.last, source.after + QVEventRowReader::kRowsAtATime);
-    std::ranges::move(read(source, source.after, next), std::back_inserter(source.waiting));
-    source.after = next;
+void QVEventHistory::refill(Source& source, const Stops& stops) const {
+  while (source.waiting.empty() && !source.rows.isEmpty() && !enough_()) {
+    QVEventRowReader::Events events;
+    if (source.kind == Kind::stop) {
+      std::vector<int64_t> rows;
+      while (!source.rows.isEmpty() && std::ssize(rows) < QVEventRowReader::kRowsAtATime) {
+        rows.push_back(stops[static_cast<std::size_t>(source.rows.after++)].second);
+      }
+      reader_.readStops(rows, events);
+    } else {
+      reader_.read(source.kind, source.rows, events);
+    }
+    std::ranges::move(events, std::back_inserter(source.waiting));
   }
 }
 
 double QVEventHistory::partOf(const Source& source) {
-  if (source.last <= source.first) return 1;
-  return static_cast<double>(source.after - source.first) /
-         static_cast<double>(source.last - source.first);
+  if (source.rows.isEmpty()) return 1;
+  return distance(source.first, source.rows.after) / distance(source.first, source.rows.last);
 }
 
-void QVEventHistory::readAll(const Receiver& receiver) {
+void QVEventHistory::read(Part part, const Receiver& receiver) {
   std::vector<Source> sources;
-  for (const Kind kind : kAllKinds) sources.push_back(sourceOf(kind));
-  while (true) {
+  part.rows[static_cast<std::size_t>(Kind::stop)] = {0, std::ssize(part.stops)};
+  for (const Kind kind : kAllKinds) {
+    const auto& rows = part.rows[static_cast<std::size_t>(kind)];
+    sources.push_back({.kind = kind, .rows = rows, .first = rows.after});
+  }
+  while (!enough_()) {
     Source* earliest = nullptr;
-    double part = 1;
+    double done = 1;
     for (Source& source : sources) {
-      if (source.waiting.empty()) refill(source);
-      part = std::min(part, partOf(source));
+      if (source.waiting.empty()) refill(source, part.stops);
+      done = std::min(done, partOf(source));
       if (source.waiting.empty()) continue;
       const bool isFirst =
           earliest == nullptr || isEarlier(source.waiting.front(), earliest->waiting.front());
       if (isFirst) earliest = &source;
     }
-    progress_.show(part);
-    if (earliest == nullptr) break;
+    progress_.show(done);
+    if (earliest == nullptr || enough_()) break;
     progress_.makeRoom();
     receiver(earliest->waiting.front());
     earliest->waiting.pop_front();
@@ -87,25 +100,37 @@ void QVEventHistory::readAll(const Receiver& receiver) {
   progress_.clear();
 }
 
-std::vector<QVStoredEvent> QVEventHistory::lastOf(Kind kind, std::size_t count) {
-  const Source source = sourceOf(kind);
-  std::vector<QVStoredEvent> found;
-  for (int64_t end = source.last; end > source.after && found.size() < count;) {
-    const int64_t begin = std::max(source.after, end - QVEventRowReader::kRowsAtATime);
-    QVEventRowReader::Events part = read(source, begin, end);
-    std::ranges::move(std::views::reverse(part), std::back_inserter(found));
-    progress_.show(static_cast<double>(source.last - begin) /
-                   static_cast<double>(source.last - source.after));
-    end = begin;
+void QVEventHistory::readAll(const Receiver& receiver) {
+  read(all(), receiver);
+}
+
+QVEventRowReader::Events QVEventHistory::lastOf(Kind kind, const Part& part,
+                                                std::size_t count) const {
+  QVEventRowReader::Events found;
+  if (kind != Kind::stop) {
+    auto rest = part.rows[static_cast<std::size_t>(kind)];
+    while (!rest.isEmpty() && found.size() < count) reader_.readBackwards(kind, rest, found);
+  } else {
+    for (auto stop = part.stops.rbegin(); stop != part.stops.rend() && found.size() < count;) {
+      std::vector<int64_t> rows;
+      for (; stop != part.stops.rend() && std::ssize(rows) < QVEventRowReader::kRowsAtATime;
+           ++stop) {
+        rows.push_back(stop->second);
+      }
+      reader_.readStops(rows, found);
+    }
   }
   found.resize(std::min(found.size(), count));
   return found;
 }
 
 void QVEventHistory::readLast(std::size_t count, const Receiver& receiver) {
-  std::vector<QVStoredEvent> found;
-  for (const Kind kind : kAllKinds)
-    std::ranges::move(lastOf(kind, count), std::back_inserter(found));
+  QVEventRowReader::Events found;
+  const Part part = all();
+  for (const Kind kind : kAllKinds) {
+    std::ranges::move(lastOf(kind, part, count), std::back_inserter(found));
+    progress_.show(static_cast<double>(kind) / static_cast<double>(kAllKinds.size()));
+  }
   progress_.clear();
   std::ranges::sort(found, isEarlier);
   const std::size_t tooMany = found.size() - std::min(found.size(), count);

@@ -3,13 +3,15 @@
 #include "tools/qvctl/QVEventRowReader.h"
 #include "tools/qvctl/QVProgress.h"
 
+#include <array>
 #include <cstddef>
 #include <cstdint>
 #include <deque>
 #include <functional>
+#include <utility>
 #include <vector>
 
-// What the store has kept so far, in the order of time: the tables' rows, merged.
+// What the store has kept, in the order of time: the tables' rows, merged.
 //
 // Only what comes next of each kind is in memory, but for the times of stopped sessions, which lie
 // in no order in the store.
@@ -18,33 +20,46 @@
 class QVEventHistory {
  public:
   using Receiver = std::function<void(const QVStoredEvent& event)>;
+  // Asked before each event and each look into the store: whether that was enough.
+  using Enough = std::function<bool()>;
 
-  explicit QVEventHistory(const QVEventRowReader& reader) : reader_(reader) {}
+  // When sessions were stopped, and their rows.
+  using Stops = std::vector<std::pair<int64_t, int64_t>>;
+  // Some of what is there: rows of each kind, and stops, which come from the rows of starts.
+  struct Part {
+    std::array<QVEventRowReader::Span, QVStoredEvent::kKinds> rows{};
+    Stops stops = {};  // in the order of time
+  };
 
+  explicit QVEventHistory(
+      const QVEventRowReader& reader, Enough enough = [] { return false; })
+      : reader_(reader), enough_(std::move(enough)) {}
+
+  // What is wanted of a part, the oldest first.
+  void read(Part part, const Receiver& receiver);
   // Everything that is wanted, the oldest first.
   void readAll(const Receiver& receiver);
   // The last `count` of it.
   void readLast(std::size_t count, const Receiver& receiver);
 
  private:
-  // The rows of one kind that have not been handed out.
+  // What has not been handed out of one kind.
   struct Source {
     QVStoredEvent::Kind kind;
-    int64_t first = 0;
-    int64_t after = 0;
-    int64_t last = 0;
-    QVEventRowReader::Stops stops = {};  // of the kind `stop`, in place of the numbers
+    QVEventRowReader::Span rows;  // of the kind `stop`, places in the part's stops
+    int64_t first = 0;            // what `rows` began after
     std::deque<QVStoredEvent> waiting = {};
   };
 
-  Source sourceOf(QVStoredEvent::Kind kind);
-  // What is wanted of the rows above `after` up to `last`, kRowsAtATime at the most.
-  QVEventRowReader::Events read(const Source& source, int64_t after, int64_t last) const;
-  void refill(Source& source) const;
+  Part all();
+  Stops allStops();
+  void refill(Source& source, const Stops& stops) const;
   // The last ones, newest first.
-  std::vector<QVStoredEvent> lastOf(QVStoredEvent::Kind kind, std::size_t count);
+  QVEventRowReader::Events lastOf(QVStoredEvent::Kind kind, const Part& part,
+                                  std::size_t count) const;
   static double partOf(const Source& source);
 
   const QVEventRowReader& reader_;
+  const Enough enough_;
   QVProgress progress_{"reading events"};
 };

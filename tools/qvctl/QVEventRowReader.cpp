@@ -6,6 +6,8 @@
 
 #include <algorithm>
 #include <array>
+#include <iterator>
+#include <limits>
 #include <memory>
 #include <utility>
 
@@ -60,6 +62,13 @@ void takeNames(QVStoredEvent& event) {
   event.type = QVParseMessageType(rest.substr(dot + 1));
 }
 
+QVEventRowReader::Session sessionIn(const QVStoreQuery& row) {
+  QVEventRowReader::Session session;
+  session.row = row.integer(0);
+  if (!row.isNull(1)) session.stopped = row.integer(1);
+  return session;
+}
+
 }  // namespace
 
 QVEventRowReader::QVEventRowReader(std::filesystem::path store, QVEventFilter filter)
@@ -74,14 +83,47 @@ QVEventRowReader::Range QVEventRowReader::range(Kind kind) const {
           store->number("SELECT max(id) FROM " + table)};
 }
 
-void QVEventRowReader::read(Kind kind, int64_t after, int64_t last, Events& events) const {
+QVEventRowReader::Span QVEventRowReader::spanOf(const Range& range) {
+  constexpr int64_t kLeast = std::numeric_limits<int64_t>::min();
+  return {range.first > kLeast ? range.first - 1 : kLeast, range.last};
+}
+
+void QVEventRowReader::read(Kind kind, Span& span, Events& events) const {
+  read(kind, Direction::forwards, span, events);
+}
+
+void QVEventRowReader::readBackwards(Kind kind, Span& span, Events& events) const {
+  read(kind, Direction::backwards, span, events);
+}
+
+void QVEventRowReader::read(Kind kind, Direction direction, Span& span, Events& events) const {
   const auto store = QVReadOnlyStore::open(path_);
-  if (store == nullptr) return;
+  const bool isForwards = direction == Direction::forwards;
+  int64_t count = 0;
+  if (store != nullptr) {
+    QVStoreQuery rows(*store, QVText("SELECT ", tableOf(kind).columns, " FROM ", tableOf(kind).name,
+                                     " WHERE id > ?1 AND id <= ?2 ORDER BY id ",
+                                     isForwards ? "ASC" : "DESC", " LIMIT ?3"));
+    rows.bind(1, span.after);
+    rows.bind(2, span.last);
+    rows.bind(3, kRowsAtATime);
+    for (; rows.next(); ++count) {
+      take(kind, rows, events);
+      // Of the numbers none is below `after`, so none is the least there is.
+      (isForwards ? span.after : span.last) = rows.integer(0) - (isForwards ? 0 : 1);
+    }
+  }
+  if (count < kRowsAtATime) span.after = span.last;
+}
+
+std::optional<int64_t> QVEventRowReader::timeOf(Kind kind, int64_t row) const {
+  const auto store = QVReadOnlyStore::open(path_);
+  if (store == nullptr) return std::nullopt;
   QVStoreQuery rows(*store, QVText("SELECT ", tableOf(kind).columns, " FROM ", tableOf(kind).name,
-                                   " WHERE id > ?1 AND id <= ?2 ORDER BY id"));
-  rows.bind(1, after);
-  rows.bind(2, std::min(last, after + kRowsAtATime));
-  while (rows.next()) take(kind, rows, events);
+                                   " WHERE id = ?1"));
+  rows.bind(1, row);
+  if (!rows.next()) return std::nullopt;
+  return rows.integer(1);
 }
 
 void QVEventRowReader::take(Kind kind, const QVStoreQuery& row, Events& events) const {
@@ -121,23 +163,32 @@ void QVEventRowReader::take(Kind kind, const QVStoreQuery& row, Events& events) 
   events.push_back(std::move(event));
 }
 
-QVEventRowReader::Stops QVEventRowReader::stops(
-    const std::function<void(double part)>& progress) const {
-  Stops stops;
-  const Range all = range(Kind::stop);
-  for (int64_t after = all.first - 1; after < all.last; after += kRowsAtATime) {
-    const auto store = QVReadOnlyStore::open(path_);
-    if (store == nullptr) break;
+QVEventRowReader::Sessions QVEventRowReader::sessions(Span& span) const {
+  Sessions found;
+  if (const auto store = QVReadOnlyStore::open(path_)) {
     QVStoreQuery rows(*store,
-                      "SELECT flushed_at, id FROM beacon_session WHERE id > ?1 AND id <= ?2 AND "
-                      "flushed_at IS NOT NULL");
-    rows.bind(1, after);
-    rows.bind(2, std::min(all.last, after + kRowsAtATime));
-    while (rows.next()) stops.emplace_back(rows.integer(0), rows.integer(1));
-    progress(static_cast<double>(after) / static_cast<double>(all.last + 1));
+                      "SELECT id, flushed_at FROM beacon_session WHERE id > ?1 AND id <= ?2 "
+                      "ORDER BY id LIMIT ?3");
+    rows.bind(1, span.after);
+    rows.bind(2, span.last);
+    rows.bind(3, kRowsAtATime);
+    while (rows.next()) found.push_back(sessionIn(rows));
   }
-  std::ranges::sort(stops);
-  return stops;
+  span.after = std::ssize(found) < kRowsAtATime ? span.last : found.back().row;
+  return found;
+}
+
+QVEventRowReader::Sessions QVEventRowReader::sessions(const std::vector<int64_t>& rows) const {
+  Sessions found;
+  const auto store = QVReadOnlyStore::open(path_);
+  if (store == nullptr) return found;
+  QVStoreQuery session(*store, "SELECT id, flushed_at FROM beacon_session WHERE id = ?1");
+  for (const int64_t id : rows) {
+    session.bind(1, id);
+    if (session.next()) found.push_back(sessionIn(session));
+    session.reset();
+  }
+  return found;
 }
 
 void QVEventRowReader::readStops(const std::vector<int64_t>& rows, Events& events) const {
@@ -153,16 +204,14 @@ void QVEventRowReader::readStops(const std::vector<int64_t>& rows, Events& event
   }
 }
 
-std::vector<int64_t> QVEventRowReader::sessionRows(Sessions which, int64_t after,
-                                                   int64_t maximum) const {
+std::vector<int64_t> QVEventRowReader::running(int64_t maximum) const {
   std::vector<int64_t> found;
   const auto store = QVReadOnlyStore::open(path_);
   if (store == nullptr) return found;
-  const char* const running = which == Sessions::running ? "AND flushed_at IS NULL " : "";
-  QVStoreQuery rows(*store, QVText("SELECT id FROM beacon_session WHERE id > ?1 ", running,
-                                   "ORDER BY id DESC LIMIT ?2"));
-  rows.bind(1, after);
-  rows.bind(2, maximum);
+  QVStoreQuery rows(*store,
+                    "SELECT id FROM beacon_session WHERE flushed_at IS NULL "
+                    "ORDER BY id DESC LIMIT ?1");
+  rows.bind(1, maximum);
   while (rows.next()) found.push_back(rows.integer(0));
   std::ranges::reverse(found);
   return found;

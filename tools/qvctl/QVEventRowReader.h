@@ -6,10 +6,8 @@
 
 #include <cstdint>
 #include <filesystem>
-#include <functional>
 #include <optional>
 #include <string>
-#include <utility>
 #include <vector>
 
 // Reads rows of the store's tables as events, some at a time: the store is opened anew for each
@@ -35,20 +33,39 @@ class QVEventRowReader {
   const std::filesystem::path& path() const { return path_; }
 
   Range range(Kind kind) const;
-  // Appends what is wanted of the rows above `after` up to `last`, kRowsAtATime of them at the
-  // most.
-  void read(Kind kind, int64_t after, int64_t last, Events& events) const;
+  // Rows above `after` up to `last`. There may be any gaps between their numbers.
+  struct Span {
+    int64_t after = 0;
+    int64_t last = 0;
+    bool isEmpty() const { return after >= last; }
+  };
+  // Of all rows that a table can have.
+  static Span spanOf(const Range& range);
+  // Appends what is wanted of the first kRowsAtATime rows of the span, which is left with the rest.
+  void read(Kind kind, Span& span, Events& events) const;
+  // The same of the last ones, the last one first.
+  void readBackwards(Kind kind, Span& span, Events& events) const;
+  // When something came that is still in its row.
+  std::optional<int64_t> timeOf(Kind kind, int64_t row) const;
 
-  // When and of which rows sessions were stopped, in the order of time.
-  using Stops = std::vector<std::pair<int64_t, int64_t>>;
-  Stops stops(const std::function<void(double part)>& progress) const;
+  // A session's row and, where it was stopped, when.
+  struct Session {
+    int64_t row = 0;
+    std::optional<int64_t> stopped;
+  };
+  using Sessions = std::vector<Session>;
+  // The first kRowsAtATime sessions of the span, which is left with the rest.
+  Sessions sessions(Span& span) const;
+  // Those of these rows that are there.
+  Sessions sessions(const std::vector<int64_t>& rows) const;
+  // The latest `maximum` sessions that run, in ascending order.
+  std::vector<int64_t> running(int64_t maximum) const;
   // The stops of these rows, as far as they are wanted and have come.
   void readStops(const std::vector<int64_t>& rows, Events& events) const;
-  // The latest `maximum` rows of sessions above `after`, in ascending order.
-  enum class Sessions { all, running };
-  std::vector<int64_t> sessionRows(Sessions which, int64_t after, int64_t maximum) const;
 
  private:
+  enum class Direction { forwards, backwards };
+  void read(Kind kind, Direction direction, Span& span, Events& events) const;
   void take(Kind kind, const QVStoreQuery& row, Events& events) const;
 
   const std::filesystem::path path_;

@@ -9,12 +9,16 @@
 #include <sys/signalfd.h>
 
 // Takes signals as something to wait for, in place of what they would do. Made before any thread
-// is: threads inherit the blocking.
+// is: threads inherit the blocking. A signal that the process ignores, as nohup has it and as
+// shells have it for what runs in the background of a script, stays ignored: blocked, it would
+// come.
 //
 // Threads: the main one. The signals stay blocked when it goes, which is when the process ends.
 class QVSignals {
  public:
   explicit QVSignals(std::initializer_list<int> signals);
+
+  static bool isIgnored(int number);
 
   // Readable when there is one.
   int descriptor() const { return descriptor_.get(); }

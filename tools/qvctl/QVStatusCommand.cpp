@@ -86,7 +86,7 @@ QVStatusCommand::Store QVStatusCommand::findStore() const {
     found.messages = count("beacon_message");
     found.analytics = count("countwise_event");
     found.energy = count("joulewell_event");
-    QVStoreQuery losses(*store, "SELECT cause, sum(count) FROM loss GROUP BY cause");
+    QVStoreQuery losses(*store, "SELECT cause, total(count) FROM loss GROUP BY cause");
     while (losses.next()) {
       found.losses.emplace_back(std::string(losses.text(0)), losses.integer(1));
     }

@@ -7,6 +7,7 @@
 #include <cerrno>
 #include <cstdio>
 
+#include <poll.h>
 #include <sys/ioctl.h>
 #include <unistd.h>
 
@@ -86,6 +87,10 @@ void QVToolOutput::flush() {
       rest.remove_prefix(static_cast<std::size_t>(count));
     } else if (errno == EPIPE) {
       throw QVReaderGone();
+    } else if (errno == EAGAIN) {
+      // Whoever shares the descriptor has made it non-blocking; that is theirs to change.
+      pollfd entry{descriptor_, POLLOUT, 0};
+      ::poll(&entry, 1, -1);
     } else if (errno != EINTR) {
       throw QVToolFailure::ofSystem("standard output", errno);
     }

@@ -42,7 +42,8 @@ class QVToolOutput {
   void json(const QVValue& value);
   // Bytes as they are.
   void raw(std::string_view bytes);
-  // Hands everything on. Throws QVReaderGone where nobody reads.
+  // Hands everything on, and waits for a reader that is slow. Throws QVReaderGone where nobody
+  // reads.
   void flush();
 
   // A line to standard error, which begins with the program's name.

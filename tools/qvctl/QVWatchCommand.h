@@ -10,7 +10,8 @@
 
 // qvctl watch: what reaches the store, as it does. Waits for changes of the store's files; between
 // them nothing wakes up. Ends after so many events, after so long, when it is interrupted or asked
-// to end, and when nobody reads its output any more, each in good order.
+// to end, and when nobody reads its output any more, each in good order; the first three also while
+// it reads or writes (QVEnding).
 //
 // Threads: one.
 class QVWatchCommand {

@@ -1,15 +1,21 @@
 // qvctl events and watch.
 
 #include "platform/QVText.h"
+#include "platform/linux/QVDescriptor.h"
 #include "tests/e2e/qvctl/QVToolTest.h"
 
+#include <algorithm>
 #include <csignal>
 #include <filesystem>
 #include <fstream>
+#include <limits>
 #include <set>
 
+#include <fcntl.h>
 #include <gmock/gmock.h>
+#include <poll.h>
 #include <sqlite3.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 namespace {
@@ -251,6 +257,37 @@ TEST_F(QVToolEventsTest, ThatWereLostAreShown) {
   EXPECT_EQ(at(parseLines(status.out)[0], {"store", "losses", "store_full"}), QVValue(12));
 }
 
+TEST_F(QVToolEventsTest, MayHaveTheLargestNumbers) {
+  fillStore();
+  endService();
+  execute(
+      "INSERT INTO beacon_session(id, opened_at, session_id, user_info, flushed_at) "
+      "VALUES(9223372036854775807, 9223372036854775807, 9, '{}', 9223372036854775807),"
+      "(-9223372036854775807, -9223372036854775807, 9, '{}', NULL);"
+      "INSERT INTO beacon_message(id, sent_at, session_id, service_name, category, type, payload) "
+      "VALUES(9223372036854775807, 1, 9, 'telephony', 3, 1, '{}')");
+  const Arguments kinds{"--kind", "start,stop,message", "--session", "9"};
+  const auto kindsOf = [&](Arguments arguments) {
+    arguments.insert(arguments.end(), kinds.begin(), kinds.end());
+    return property(jsonLines(arguments), "kind");
+  };
+  EXPECT_THAT(kindsOf({"events"}), ElementsAre("start", "message", "start", "stop"));
+  EXPECT_THAT(kindsOf({"events", "--last", "3"}), ElementsAre("message", "start", "stop"));
+  EXPECT_THAT(kindsOf({"watch", "--since", "@0", "--for", "0"}),
+              ElementsAre("message", "start", "stop"));
+}
+
+TEST_F(QVToolEventsTest, ThatWereLostMayBeMoreThanANumberHolds) {
+  fillStore();
+  endService();
+  execute(
+      "INSERT INTO loss(at, cause, count) VALUES(1, 'store_full', 9223372036854775807), "
+      "(2, 'store_full', 9223372036854775807)");
+  const Output status = qvctl({"status", "--json"});
+  EXPECT_EQ(at(parseLines(status.out)[0], {"store", "losses", "store_full"}),
+            QVValue(std::numeric_limits<int64_t>::max()));
+}
+
 TEST_F(QVToolEventsTest, EndQuietlyWhereTheReaderGoesAway) {
   fillStore();
   endService();
@@ -394,6 +431,121 @@ TEST_F(QVToolWatchTest, EndsQuietlyWhereTheReaderGoesAway) {
       .standardOutputFile = root_.path() / "out",
       .standardErrorFile = root_.path() / "out"});
   EXPECT_EQ(shell->wait(std::chrono::seconds(60)), 0);
+}
+
+// A pipe that is open and that nobody reads, in the place of watch's output.
+class QVToolStuckWatchTest : public QVToolWatchTest {
+ protected:
+  // A store with more than the pipe holds.
+  void fillPipesStore() {
+    fillStore();
+    endService();
+    execute(
+        "WITH RECURSIVE n(i) AS (VALUES(1) UNION ALL SELECT i + 1 FROM n WHERE i < 20000) "
+        "INSERT INTO beacon_message(sent_at, session_id, service_name, category, type, payload) "
+        "SELECT i, 7, 'telephony', 3, 1, '{\"frames\":480}' FROM n");
+  }
+  // watch, which prints all that there is.
+  std::unique_ptr<QVSubprocess> watch(const Arguments& options = {}) {
+    // A new one, with nothing in it.
+    std::filesystem::remove(pipe_);
+    EXPECT_EQ(::mkfifo(pipe_.c_str(), 0600), 0);
+    reader_ = QVDescriptor(::open(pipe_.c_str(), O_RDWR | O_CLOEXEC));
+    Arguments arguments{"watch", "--since", "@0", "--json"};
+    arguments.insert(arguments.end(), options.begin(), options.end());
+    return std::make_unique<QVSubprocess>(QVSubprocess::Options{.arguments = command(arguments),
+                                                                .environment = environment(),
+                                                                .standardOutputFile = pipe_});
+  }
+  // Until it has begun to print.
+  void awaitOutput() const {
+    pollfd entry{reader_.get(), POLLIN, 0};
+    EXPECT_EQ(::poll(&entry, 1, 60'000), 1);
+  }
+
+ private:
+  const std::string pipe_ = root_.path() / "pipe";
+  QVDescriptor reader_;
+};
+
+TEST_F(QVToolStuckWatchTest, EndsWhenItIsAskedToWhileNobodyReads) {
+  fillPipesStore();
+  for (const int number : {SIGINT, SIGTERM, SIGHUP}) {
+    const auto process = watch();
+    awaitOutput();
+    process->signal(number);
+    EXPECT_EQ(process->wait(std::chrono::seconds(60)), 0) << number;
+  }
+}
+
+TEST_F(QVToolStuckWatchTest, EndsAfterItsTimeWhileNobodyReads) {
+  fillPipesStore();
+  EXPECT_EQ(watch({"--for", "500ms"})->wait(std::chrono::seconds(60)), 0);
+}
+
+TEST_F(QVToolWatchTest, EndsAfterItsTimeWhileTheStoreIsLocked) {
+  fillStore();
+  endService();
+  sqlite3* holder = nullptr;
+  ASSERT_EQ(::sqlite3_open(root_.store().c_str(), &holder), SQLITE_OK);
+  EXPECT_EQ(::sqlite3_exec(holder,
+                           "PRAGMA locking_mode = EXCLUSIVE; "
+                           "INSERT INTO loss(at, cause, count) VALUES(1, 'x', 1)",
+                           nullptr, nullptr, nullptr),
+            SQLITE_OK);
+  EXPECT_EQ(run({"watch", "--since", "@0", "--for", "20ms", "--json"}), "");
+  ::sqlite3_close(holder);
+}
+
+TEST_F(QVToolWatchTest, LeavesIgnoredSignalsIgnored) {
+  fillStore();
+  client_.reset();
+  endService();
+  QVTerminal watch(
+      {.arguments = {"sh", "-c", "trap '' HUP INT; exec \"$0\" watch --kind message --count 1",
+                     QVDaemonProcess::program("qvctl").string()},
+       .environment = environment()});
+  ASSERT_TRUE(watch.await("CONTENTS"));
+  watch.signal(SIGHUP);
+  watch.signal(SIGINT);
+  execute(
+      "INSERT INTO beacon_message(sent_at, session_id, service_name, category, type, payload) "
+      "VALUES(1, 7, 'telephony', 3, 1, '{\"frames\":4711}')");
+  EXPECT_EQ(watch.wait(), 0);
+  EXPECT_THAT(watch.shown(), HasSubstr("4711"));
+}
+
+TEST_F(QVToolWatchTest, BeginsWithAllStopsThatHaveComeBefore) {
+  fillStore();
+  endService();
+  execute(
+      "WITH RECURSIVE n(i) AS (VALUES(1) UNION ALL SELECT i + 1 FROM n WHERE i < 6000) "
+      "INSERT INTO beacon_session(opened_at, session_id, user_info, flushed_at) "
+      "SELECT i, i, '{}', 10000 - i FROM n");
+  const Arguments options{"--kind", "stop", "--since", "@0", "--json"};
+  Arguments all{"events"};
+  all.insert(all.end(), options.begin(), options.end());
+  Arguments watch{"watch", "--for", "0"};
+  watch.insert(watch.end(), options.begin(), options.end());
+  const std::string shown = run(watch);
+  EXPECT_EQ(std::count(shown.begin(), shown.end(), '\n'), 6002);
+  EXPECT_EQ(shown, run(all));
+}
+
+TEST_F(QVToolWatchTest, SaysThatEventsMayHaveBeenMissed) {
+  fillStore();
+  client_.reset();
+  endService();
+  const auto watch = terminal({"watch", "--kind", "message"});
+  ASSERT_TRUE(watch->await("CONTENTS"));
+  execute(
+      "INSERT INTO beacon_message(sent_at, session_id, service_name, category, type, payload) "
+      "VALUES(1, 7, 'telephony', 3, 1, '{\"frames\":4711}')");
+  ASSERT_TRUE(watch->await("4711"));
+  execute("DELETE FROM beacon_message");
+  ASSERT_TRUE(watch->await("may have been missed"));
+  watch->type("\x03");
+  EXPECT_EQ(watch->wait(), 0);
 }
 
 TEST_F(QVToolWatchTest, SaysThatThereIsNothingToWatch) {
