@@ -8,6 +8,7 @@
 
 #include <fcntl.h>
 #include <sys/random.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 namespace {
@@ -63,6 +64,12 @@ void QVPosixAtomicFile::open() {
   }
   if (!file_.isOpen()) temporaryName_.clear();
   check(file_.isOpen());
+}
+
+void QVPosixAtomicFile::setAccess(mode_t mode, uid_t owner, gid_t group) {
+  if (failure_) return;
+  static_cast<void>(::fchown(file_.get(), owner, group));
+  check(::fchmod(file_.get(), mode) == 0);
 }
 
 void QVPosixAtomicFile::write(std::string_view bytes) {

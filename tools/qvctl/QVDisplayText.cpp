@@ -45,8 +45,10 @@ Character firstCharacter(std::string_view text) {
 
 // Above ASCII: what has a terminal or a reader see something else than what is there.
 bool isTreacherous(char32_t code) {
-  return (code >= 0x80 && code <= 0x9F) || code == 0x061C || (code >= 0x200B && code <= 0x200F) ||
-         (code >= 0x2028 && code <= 0x202E) || (code >= 0x2060 && code <= 0x206F) || code == 0xFEFF;
+  return (code >= 0x80 && code <= 0x9F) || code == 0xAD || code == 0x061C || code == 0x180E ||
+         code == 0x3164 || (code >= 0xE0000 && code <= 0xE007F) ||
+         (code >= 0x200B && code <= 0x200F) || (code >= 0x2028 && code <= 0x202E) ||
+         (code >= 0x2060 && code <= 0x206F) || code == 0xFEFF;
 }
 
 void appendFormatted(std::string& out, const char* format, unsigned number) {
@@ -108,7 +110,11 @@ std::string QVDisplayJSON(std::string_view text) {
   while (!text.empty()) {
     const Character character = firstCharacter(text);
     if (character.isValid && (character.code == 0x7F || isTreacherous(character.code))) {
-      appendFormatted(out, "\\u%04x", character.code);
+      // Beyond 16 bits JSON has two halves.
+      const unsigned above = character.code - 0x10000;
+      if (character.code >= 0x10000) appendFormatted(out, "\\u%04x", 0xD800 + (above >> 10U));
+      const bool isWhole = character.code < 0x10000;
+      appendFormatted(out, "\\u%04x", isWhole ? character.code : 0xDC00 + (above & 0x3FFU));
     } else {
       out.append(text.substr(0, character.bytes));
     }

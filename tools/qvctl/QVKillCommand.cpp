@@ -5,7 +5,7 @@
 
 QVToolStatus QVKillCommand::run(const QVToolContext& context, const Options& /*options*/) {
   const QVServiceState state = QVServiceState::find(context.places);
-  if (!state.isRunning() && state.kind != QVServiceState::Kind::unknown) {
+  if (!state.isRunning()) {
     throw QVToolFailure(QVToolStatus::notRunning, state.complaint(context.places));
   }
   QVServiceConnection(context.places).ask(&QVClient::killServiceAndWait);

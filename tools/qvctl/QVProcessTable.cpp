@@ -83,6 +83,17 @@ std::string QVProcessTable::name(pid_t pid) {
   return text;
 }
 
+std::optional<uid_t> QVProcessTable::user(pid_t pid) {
+  // The user who started it, then whose rights it has.
+  constexpr std::string_view kLine = "\nUid:\t";
+  const std::string text = read(placeOf(pid, "status"));
+  const std::size_t line = text.find(kLine);
+  if (line == std::string::npos) return std::nullopt;
+  const std::size_t next = text.find('\t', line + kLine.size());
+  if (next == std::string::npos) return std::nullopt;
+  return numberIn<uid_t>(std::string_view(text).substr(next + 1));
+}
+
 std::optional<int64_t> QVProcessTable::startTime(pid_t pid) {
   const std::string text = read(placeOf(pid, "stat"));
   // The name, in parentheses, may hold anything.

@@ -15,6 +15,8 @@ struct QVProcessTable {
   static std::vector<pid_t> all();
   // "quietvoxd"; empty where there is no such process.
   static std::string name(pid_t pid);
+  // Whose rights it has; nothing where there is no such process.
+  static std::optional<uid_t> user(pid_t pid);
   // In microseconds since 1970.
   static std::optional<int64_t> startTime(pid_t pid);
 

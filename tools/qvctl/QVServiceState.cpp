@@ -20,19 +20,25 @@ bool isService(pid_t pid) {
   return QVProcessTable::name(pid) == kServiceName;
 }
 
-// The service among those that hold the listening socket; its manager may hold it as well.
-void findService(const std::vector<pid_t>& listeners, const std::vector<pid_t>& hidden,
+// The service among those that hold the listening socket, whose file is `owner`'s; its manager may
+// hold it as well.
+void findService(const std::vector<pid_t>& listeners, const std::vector<pid_t>& hidden, uid_t owner,
                  QVServiceState& state) {
   using Kind = QVServiceState::Kind;
   const auto seen = std::ranges::find_if(listeners, isService);
   if (seen != listeners.end()) {
     state.pid = *seen;
   } else {
-    // One that may not be looked into is the one, if there is no other of that name.
+    // One that may not be looked into is the one, if it is its owner's and there is no other. Of
+    // what a manager has made and given to nobody, any of them may be.
+    std::vector<pid_t> called;
+    std::ranges::copy_if(hidden, std::back_inserter(called), isService);
     std::vector<pid_t> candidates;
-    std::ranges::copy_if(hidden, std::back_inserter(candidates), isService);
+    std::ranges::copy_if(called, std::back_inserter(candidates),
+                         [owner](pid_t pid) { return QVProcessTable::user(pid) == owner; });
+    const bool isAnybodys = owner == 0 && candidates.empty() && !called.empty();
     if (candidates.size() == 1) state.pid = candidates[0];
-    if (candidates.size() > 1 && !state.isRunning()) state.kind = Kind::unknown;
+    if ((candidates.size() > 1 || isAnybodys) && !state.isRunning()) state.kind = Kind::unknown;
   }
   if (state.pid == 0) return;
   state.kind = Kind::running;
@@ -101,9 +107,15 @@ QVServiceState QVServiceState::find(const QVToolPlaces& places) {
   std::vector<pid_t> hidden;
   const auto holders = QVProcessTable::holders(wanted, hidden);
   const auto listening = holders.find(listener);
-  findService(listening == holders.end() ? std::vector<pid_t>() : listening->second, hidden, state);
+  findService(listening == holders.end() ? std::vector<pid_t>() : listening->second, hidden,
+              file.st_uid, state);
+  if (state.kind == Kind::unknown && ::access(places.socket.c_str(), W_OK) != 0) {
+    throw QVToolFailure::ofFile(places.socket, W_OK, errno);
+  }
   for (const QVUnixSocket& connection : connections) {
     const auto holder = holders.find(connection.peer);
+    // A client that has gone since, or whose end is closed.
+    if (connection.peer == 0 || (holder == holders.end() && hidden.empty())) continue;
     const pid_t pid = holder == holders.end() ? 0 : holder->second.front();
     state.clients.push_back({pid, pid == 0 ? std::string() : QVProcessTable::name(pid)});
   }

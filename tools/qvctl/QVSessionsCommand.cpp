@@ -63,12 +63,11 @@ QVToolStatus QVSessionsCommand::run(const QVToolContext& context, const Options&
 std::vector<QVSessionsCommand::Session> QVSessionsCommand::find(const QVToolContext& context,
                                                                 const Options& options) {
   const QVServiceState state = QVServiceState::find(context.places);
-  const bool mayAsk = state.isRunning() || state.kind == QVServiceState::Kind::unknown;
-  if (!mayAsk && !options.start) {
-    const bool startsOnDemand = state.kind == QVServiceState::Kind::onDemand;
-    throw QVToolFailure(
-        QVToolStatus::notRunning,
-        state.complaint(context.places) + (startsOnDemand ? "; it starts on demand: --start" : ""));
+  if (!state.isRunning() && !options.start) {
+    std::string text = state.complaint(context.places);
+    if (state.kind == QVServiceState::Kind::onDemand) text += "; it starts on demand: --start";
+    if (state.kind == QVServiceState::Kind::unknown) text += "; --start asks it all the same";
+    throw QVToolFailure(QVToolStatus::notRunning, text);
   }
   QVServiceConnection service(context.places);
   std::vector<Session> sessions;

@@ -137,8 +137,12 @@ QVValue QVStatusCommand::json(const Findings& findings) const {
 void QVStatusCommand::showLine(const char* title, const std::string& text, Style style) const {
   std::string line(title);
   line.resize(kTitleColumns, ' ');
+  // On a terminal as much as there is room for.
+  const std::size_t columns = context_.output.columns();
+  const std::string shown =
+      columns > kTitleColumns ? QVClippedText(text, columns - kTitleColumns) : text;
   context_.output.line(context_.output.painted(Style::title, line) +
-                       context_.output.painted(style, text));
+                       context_.output.painted(style, shown));
 }
 
 void QVStatusCommand::show(const Findings& findings) const {
@@ -161,8 +165,6 @@ void QVStatusCommand::show(const Findings& findings) const {
       text.append(name == names.begin()->first ? ": " : ", ").append(QVDisplayText(name));
       if (count > 1) text.append(QVText(" (", count, ")"));
     }
-    const std::size_t columns = context_.output.columns();
-    if (columns > kTitleColumns) text = QVClippedText(text, columns - kTitleColumns);
     showLine("clients", text);
   }
   if (findings.sessions) showLine("sessions", std::to_string(*findings.sessions));

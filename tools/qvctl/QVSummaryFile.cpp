@@ -85,7 +85,9 @@ std::vector<QVSummaryFile> QVSummaryFile::list(const std::filesystem::path& dire
   std::error_code error;
   std::filesystem::directory_iterator entries(directory, error);
   for (; !error && entries != std::filesystem::directory_iterator(); entries.increment(error)) {
-    if (!isSummaryName(entries->path().filename().string())) continue;
+    // Sessions leave no links, and one of another system would lead into this one.
+    std::error_code gone;
+    if (entries->is_symlink(gone) || !isSummaryName(entries->path().filename().string())) continue;
     files.push_back(QVSummaryFile(entries->path()));
   }
   if (error && error != std::errc::no_such_file_or_directory) {

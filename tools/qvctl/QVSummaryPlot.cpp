@@ -11,6 +11,7 @@
 #include <algorithm>
 #include <cstdio>
 #include <deque>
+#include <iterator>
 #include <utility>
 
 #include <fnmatch.h>
@@ -27,6 +28,8 @@ constexpr std::string_view kBar = " |";
 
 // Keys that a message names, of those that there are.
 constexpr std::size_t kNamedKeys = 10;
+// Columns of each of them: an application may call a number what it likes.
+constexpr std::size_t kNamedColumns = 100;
 
 // Does the terminal show other characters than ASCII?
 bool isUnicode() {
@@ -82,7 +85,14 @@ void QVSummaryPlot::show() {
 
 void QVSummaryPlot::findRanges() {
   QVSummaryNumbers numbers([this](const std::string& key, int64_t /*message*/, double number) {
-    Range& range = ranges_[key];
+    const auto known = ranges_.find(key);
+    if (known == ranges_.end()) {
+      if (ranges_.size() >= kMaximumKeys || !isWanted(options_.keys, key)) {
+        leaveOut(key);
+        return;
+      }
+    }
+    Range& range = known == ranges_.end() ? ranges_[key] : known->second;
     range.lowest = range.count == 0 ? number : std::min(range.lowest, number);
     range.highest = range.count == 0 ? number : std::max(range.highest, number);
     range.last = number;
@@ -90,14 +100,24 @@ void QVSummaryPlot::findRanges() {
   });
   file_.scan(numbers);
   messages_ = numbers.messages();
-  std::vector<std::string> keys;
-  for (const auto& [key, range] : ranges_) keys.push_back(key);
-  std::erase_if(ranges_,
-                [this](const auto& entry) { return !isWanted(options_.keys, entry.first); });
   if (ranges_.empty()) {
+    const std::vector<std::string> keys(others_.begin(), others_.end());
     throw QVToolFailure(QVToolStatus::failed,
                         QVText(file_.path().string(), ": ", complaint(options_.keys, keys)));
   }
+  if (!isCut_) return;
+  QVToolOutput::note(QVText(file_.path().string(), ": it has more keys than the ", kMaximumKeys,
+                            " that are shown; --key chooses others"));
+}
+
+void QVSummaryPlot::leaveOut(const std::string& key) {
+  if (isWanted(options_.keys, key)) {
+    isCut_ = true;
+    return;
+  }
+  others_.insert(QVClippedText(key, kNamedColumns));
+  // One more than are named, so that it shows that there are more.
+  if (others_.size() > kNamedKeys + 1) others_.erase(std::prev(others_.end()));
 }
 
 void QVSummaryPlot::printPictures() const {
@@ -119,15 +139,21 @@ void QVSummaryPlot::printPictures() const {
     if (plot != plots.end()) plot->second.add(message, number);
   });
   file_.scan(numbers);
-  output_.line(QVDisplayText(file_.path().filename().string()));
+  const std::string name = QVDisplayText(file_.path().filename().string());
+  output_.line(output_.columns() == 0 ? name : QVClippedText(name, output_.columns()));
   for (const auto& [key, range] : ranges_) printPicture(key, range, plots.at(key).rows());
 }
 
 void QVSummaryPlot::printPicture(const std::string& key, const Range& range,
                                  const std::vector<std::string>& rows) const {
   output_.line("");
-  output_.line(output_.painted(Style::title, QVDisplayText(key)) +
-               QVText("  ", range.count, " of ", messages_, " messages, last ", range.last));
+  std::string title = QVDisplayText(key);
+  std::string rest = QVText("  ", range.count, " of ", messages_, " messages, last ", range.last);
+  if (const std::size_t columns = output_.columns(); columns > 0) {
+    title = QVClippedText(title, columns);
+    rest = QVClippedText(rest, columns - QVDisplayWidth(title));
+  }
+  output_.line(output_.painted(Style::title, title) + rest);
   for (std::size_t i = 0; i < rows.size(); ++i) {
     std::string edge;
     const bool isLevel = range.lowest == range.highest;

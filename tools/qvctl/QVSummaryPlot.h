@@ -6,6 +6,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <map>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -24,6 +25,9 @@ class QVSummaryPlot {
   static constexpr std::size_t kSmallestColumns = 23;
   static constexpr std::size_t kLargestColumns = 1000;
   static constexpr std::size_t kLargestRows = 200;
+  // Different keys that are shown, those that come first: applications choose them, and each takes
+  // memory for its picture.
+  static constexpr std::size_t kMaximumKeys = 256;
 
   struct Options {
     std::vector<std::string> keys;  // patterns; empty: all
@@ -47,6 +51,8 @@ class QVSummaryPlot {
   };
 
   void findRanges();
+  // Of a number that is not shown.
+  void leaveOut(const std::string& key);
   void printPictures() const;
   void printPicture(const std::string& key, const Range& range,
                     const std::vector<std::string>& rows) const;
@@ -57,4 +63,6 @@ class QVSummaryPlot {
   const Options& options_;
   int64_t messages_ = 0;
   std::map<std::string, Range> ranges_;  // by key
+  std::set<std::string> others_;         // the first of the keys that are not wanted, cut
+  bool isCut_ = false;                   // there are more keys than are shown
 };

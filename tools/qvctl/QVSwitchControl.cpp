@@ -6,11 +6,13 @@
 #include "platform/linux/QVJSONText.h"
 #include "platform/linux/QVPosixAtomicFile.h"
 #include "platform/linux/files/QVJSONFile.h"
+#include "tools/qvctl/QVOtherRoot.h"
 #include "tools/qvctl/QVToolFailure.h"
 
 #include <cerrno>
 #include <filesystem>
 #include <string>
+#include <utility>
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -25,6 +27,8 @@ constexpr int kMaximumLinks = 40;
 
 // What the file is where there was none: the service has to read it whatever this user's umask.
 constexpr mode_t kPreferencesMode = 0644;
+// What of a file's mode is kept: who may read and write, and no program's rights.
+constexpr mode_t kAccessBits = 0777;
 // Of the notification's file, which whoever may post may touch.
 constexpr mode_t kNotificationMode = 0660;
 
@@ -36,9 +40,9 @@ void expectWritable(const std::filesystem::path& directory) {
 
 // Whoever may post in the directory may touch the file, too. It is posted already: what this user
 // may not give away stays this user's.
-void letOthersPost(int file, const std::filesystem::path& directory) {
+void letOthersPost(int file, int directory) {
   struct stat place {};
-  if (::stat(directory.c_str(), &place) == 0 && ::fchown(file, place.st_uid, place.st_gid) != 0) {
+  if (::fstat(directory, &place) == 0 && ::fchown(file, place.st_uid, place.st_gid) != 0) {
     static_cast<void>(::fchown(file, static_cast<uid_t>(-1), place.st_gid));
   }
   // Made with this user's umask.
@@ -48,13 +52,14 @@ void letOthersPost(int file, const std::filesystem::path& directory) {
 }  // namespace
 
 QVDictionary QVSwitchControl::read() const {
-  const std::string path = places_.servicePreferences().string();
+  const std::filesystem::path path = places_.servicePreferences();
+  if (!places_.root.empty()) QVOtherRoot::refuseLinks(places_.root, path);
   QVJSONFailure failure;
-  auto values = QVJSONFile::readDictionary(path, failure);
+  auto values = QVJSONFile::readDictionary(path.string(), failure);
   if (values) return *std::move(values);
   if (failure.missing) return {};
   if (::access(path.c_str(), R_OK) != 0) throw QVToolFailure::ofFile(path, R_OK, errno);
-  throw QVToolFailure(QVToolStatus::failed, QVText(path, ": ", failure.description()));
+  throw QVToolFailure(QVToolStatus::failed, QVText(path.string(), ": ", failure.description()));
 }
 
 std::optional<bool> QVSwitchControl::isOn() const {
@@ -69,18 +74,22 @@ bool QVSwitchControl::set(bool on) const {
   const QVDictionary values = read();
   const std::filesystem::path file = target();
   checkPermission(file);
+  withdraw();
   write(file, values.merging({{kDisableKey, !on}}));
-  return post();
+  try {
+    return post();
+  } catch (const QVToolFailure& failure) {
+    throw QVToolFailure(
+        QVToolStatus::failed,
+        QVText("the preference is written, but the service has not been told: ", failure.what()));
+  }
 }
 
 std::filesystem::path QVSwitchControl::target() const {
   std::filesystem::path path = places_.servicePreferences();
+  if (!places_.root.empty()) return path;
   std::error_code error;
   for (int i = 0; std::filesystem::is_symlink(path, error); ++i) {
-    if (places_.isOtherRoot) {
-      throw QVToolFailure(QVToolStatus::failed,
-                          path.string() + ": a symbolic link, which is not followed with --root");
-    }
     if (i == kMaximumLinks) {
       throw QVToolFailure::ofSystem(places_.servicePreferences().string(), ELOOP);
     }
@@ -98,43 +107,73 @@ void QVSwitchControl::checkPermission(const std::filesystem::path& file) const {
   expectWritable(places_.directories.notifications());
 }
 
-void QVSwitchControl::write(const std::filesystem::path& path, const QVDictionary& values) const {
+QVDescriptor QVSwitchControl::preferenceDirectory(const std::filesystem::path& file) const {
   // Not that of a link's file: where that is missing, the link is wrong.
   const std::filesystem::path directory = places_.directories.preferences();
+  if (!places_.root.empty()) {
+    QVDescriptor made = QVOtherRoot::make(places_.root, directory);
+    if (!made.isOpen()) throw QVToolFailure::ofSystem(directory.string(), errno);
+    return made;
+  }
   std::error_code error;
   std::filesystem::create_directories(directory, error);
   if (error) throw QVToolFailure::ofSystem(directory.string(), error.value());
+  return QVDescriptor(::open(file.parent_path().c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+}
+
+QVDescriptor QVSwitchControl::notificationDirectory() const {
+  const std::filesystem::path directory = places_.directories.notifications();
+  if (!places_.root.empty()) return QVOtherRoot::open(places_.root, directory);
+  return QVDescriptor(::open(directory.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+}
+
+void QVSwitchControl::write(const std::filesystem::path& path, const QVDictionary& values) const {
+  QVDescriptor directory = preferenceDirectory(path);
+  // Who may read it stays as it was. What is a link by now gives nothing to go by.
   struct stat before {};
-  const bool isNew = ::stat(path.c_str(), &before) != 0;
-  QVPosixAtomicFile file(path.string(), QVDescriptor(::open(path.parent_path().c_str(),
-                                                            O_PATH | O_DIRECTORY | O_CLOEXEC)));
+  const bool isThere =
+      ::fstatat(directory.get(), path.filename().c_str(), &before, AT_SYMLINK_NOFOLLOW) == 0 &&
+      S_ISREG(before.st_mode);
+  QVPosixAtomicFile file(path.string(), std::move(directory));
+  if (isThere) {
+    file.setAccess(before.st_mode & kAccessBits, before.st_uid, before.st_gid);
+  } else {
+    file.setAccess(kPreferencesMode, static_cast<uid_t>(-1), static_cast<gid_t>(-1));
+  }
   QVJSONText text;
   file.write(text.write(values));
   file.write("\n");
   if (const auto failure = file.commit()) {
     throw QVToolFailure::ofSystem(path.string(), static_cast<int>(failure->code));
   }
-  // Who may read it stays as it was. Only root can give a file away, and need not.
-  [[maybe_unused]] const bool kept =
-      isNew || ::lchown(path.c_str(), before.st_uid, before.st_gid) == 0;
-  if (::chmod(path.c_str(), isNew ? kPreferencesMode : before.st_mode & 07777U) != 0) {
-    throw QVToolFailure::ofSystem(path.string(), errno);
-  }
 }
 
-// With a file of its own in the place of the one that is there, which may be somebody's who lets
+// Before the preference is written: in a directory with the sticky bit, what is somebody else's is
+// not this user's to remove.
+void QVSwitchControl::withdraw() const {
+  const std::filesystem::path path = places_.reportingNotification();
+  const QVDescriptor directory = notificationDirectory();
+  if (!directory.isOpen() || ::unlinkat(directory.get(), path.filename().c_str(), 0) == 0) return;
+  if (errno != ENOENT) throw QVToolFailure::ofSystem(path.string(), errno);
+}
+
+// With a file of its own in the place of the one that was there, which may be somebody's who lets
 // nobody else touch it. Nothing is written through a link, either.
 bool QVSwitchControl::post() const {
-  const std::string path = places_.reportingNotification().string();
-  if (::unlink(path.c_str()) != 0 && errno != ENOENT) throw QVToolFailure::ofSystem(path, errno);
-  const QVDescriptor file(
-      ::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kNotificationMode));
+  const std::filesystem::path path = places_.reportingNotification();
+  const QVDescriptor directory = notificationDirectory();
+  if (!directory.isOpen()) {
+    if (errno == ENOENT) return false;
+    throw QVToolFailure::ofSystem(path.parent_path().string(), errno);
+  }
+  const QVDescriptor file(::openat(directory.get(), path.filename().c_str(),
+                                   O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kNotificationMode));
   if (!file.isOpen()) {
     // Somebody else posted, after the preference was written.
     if (errno == EEXIST) return true;
     if (errno == ENOENT) return false;
-    throw QVToolFailure::ofSystem(path, errno);
+    throw QVToolFailure::ofSystem(path.string(), errno);
   }
-  letOthersPost(file.get(), places_.directories.notifications());
+  letOthersPost(file.get(), directory.get());
   return true;
 }

@@ -9,6 +9,9 @@ namespace {
 
 using std::chrono::microseconds;
 
+// How far clocks are ahead of UTC or behind it anywhere.
+constexpr int kLargestOffsetHours = 14;
+
 constexpr int64_t kSecond = 1'000'000;
 constexpr int64_t kMinute = 60 * kSecond;
 constexpr int64_t kHour = 60 * kMinute;
@@ -119,6 +122,19 @@ int64_t local(tm parts, int64_t fraction = 0) {
   return int64_t{::mktime(&parts)} * kSecond + fraction;  // NOLINT(concurrency-mt-unsafe)
 }
 
+// How far a time is ahead of UTC, to the end of the text: "+01:00", or without the colon.
+std::optional<int64_t> parseOffset(std::string_view text) {
+  const bool isWest = text.starts_with('-');
+  int hours = 0;
+  int minutes = 0;
+  if (!(take(text, '+') || take(text, '-')) || !takeNumber(text, 2, hours)) return std::nullopt;
+  take(text, ':');
+  if (!takeNumber(text, 2, minutes) || !text.empty()) return std::nullopt;
+  if (hours > kLargestOffsetHours || minutes > 59) return std::nullopt;
+  const int64_t ahead = hours * kHour + minutes * kMinute;
+  return isWest ? -ahead : ahead;
+}
+
 // A date, with a clock's time or without.
 std::optional<int64_t> parseDate(std::string_view text) {
   tm parts{};
@@ -128,8 +144,10 @@ std::optional<int64_t> parseDate(std::string_view text) {
     return std::nullopt;
   }
   if (take(text, 'Z') && text.empty()) return int64_t{::timegm(&parts)} * kSecond + fraction;
-  if (!text.empty()) return std::nullopt;
-  return local(parts, fraction);
+  if (text.empty()) return local(parts, fraction);
+  const auto east = parseOffset(text);
+  if (!east) return std::nullopt;
+  return int64_t{::timegm(&parts)} * kSecond + fraction - *east;
 }
 
 std::string formatted(const tm& parts, const char* format, int64_t fraction) {

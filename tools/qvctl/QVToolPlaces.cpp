@@ -2,11 +2,17 @@
 
 #include "client/QVClientOptions.h"
 #include "platform/QVText.h"
+#include "platform/linux/QVDescriptor.h"
+#include "tools/qvctl/QVOtherRoot.h"
+#include "tools/qvctl/QVToolFailure.h"
 
+#include <cerrno>
 #include <cstdlib>
 
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <sys/un.h>
+#include <unistd.h>
 
 namespace {
 
@@ -21,7 +27,7 @@ QVToolPlaces QVToolPlaces::find(const std::string& socket, const std::string& ro
     places.directories = QVServiceDirectories::fromEnvironment();
   } else {
     const std::filesystem::path top(root);
-    places.isOtherRoot = true;
+    places.root = top;
     places.directories = {.runtime = top / "run/quietvox",
                           .state = top / "var/lib/quietvox",
                           .configuration = top / "etc/quietvox",
@@ -37,7 +43,21 @@ QVToolPlaces QVToolPlaces::find(const std::string& socket, const std::string& ro
   } else {
     places.socket = places.directories.socket();
   }
+  if (!root.empty()) places.checkRoot();
   return places;
+}
+
+void QVToolPlaces::checkRoot() const {
+  const QVDescriptor directory(::open(root.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+  if (!directory.isOpen()) throw QVToolFailure::ofFile(root, X_OK, errno);
+  const std::string store = directories.store();
+  for (const std::filesystem::path& place :
+       {directories.socket(), directories.channels(), directories.notifications(),
+        directories.channelConfiguration(), servicePreferences(), summaries(),
+        std::filesystem::path(store), std::filesystem::path(store + "-wal"),
+        std::filesystem::path(store + "-shm"), std::filesystem::path(store + "-journal")}) {
+    QVOtherRoot::refuseLinks(root, place);
+  }
 }
 
 std::string QVToolPlaces::socketProblem() const {

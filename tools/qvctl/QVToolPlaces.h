@@ -8,19 +8,19 @@
 // Where the service listens and keeps its files. A value.
 //
 //   --root DIR   the system whose root directory is DIR: DIR/run/quietvox, DIR/var/lib/quietvox,
-//   ... else         RUNTIME_DIRECTORY, STATE_DIRECTORY, CONFIGURATION_DIRECTORY and
-//   LOGS_DIRECTORY, as
-//                the service takes them, else the usual ones
+//                and so on; else RUNTIME_DIRECTORY, STATE_DIRECTORY, CONFIGURATION_DIRECTORY and
+//                LOGS_DIRECTORY, as the service takes them, else the usual ones
 //   --socket     the socket; else without --root what QUIETVOX_SOCKET names, as the client library
 //                takes it; else reporting.socket in the runtime directory
 struct QVToolPlaces {
   std::filesystem::path socket;
   QVServiceDirectories directories;
 
-  // Whether this is another system's root directory, whose links lead into that one.
-  bool isOtherRoot = false;
+  // Another system's root directory, below which no link is followed; empty: this system's.
+  std::filesystem::path root;
 
-  // `socket` and `root` as the command line has them; empty where it has none.
+  // `socket` and `root` as the command line has them; empty where it has none. Failures:
+  // QVToolFailure where the root is no directory, or one of the places below it a link.
   static QVToolPlaces find(const std::string& socket, const std::string& root);
 
   // Why no service can be reached at the socket, whether it runs or not: what is there is no
@@ -38,4 +38,7 @@ struct QVToolPlaces {
   std::filesystem::path reportingNotification() const {
     return directories.notifications() / "net.quillon.quietvox.reporting";
   }
+
+ private:
+  void checkRoot() const;
 };

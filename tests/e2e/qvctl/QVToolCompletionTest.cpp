@@ -189,4 +189,45 @@ TEST_F(QVToolCompletionTest, OffersTheSameInZsh) {
   EXPECT_TRUE(shell->await("net.example.player-telephony.json")) << shell->shown();
 }
 
+TEST_F(QVToolCompletionTest, OffersProgramsToRunInZsh) {
+  // Found in a directory of PATH, beside the shell's own commands.
+  std::filesystem::create_directory(root_.path() / "programs");
+  const auto program = root_.path() / "programs/qv-offered-program";
+  std::ofstream(program) << "#!/bin/sh\n";
+  std::filesystem::permissions(program, std::filesystem::perms(0755));
+  for (const char* start : {"qvctl session run -- qv-off", "qvctl session run qv-off"}) {
+    const auto shell = zsh();
+    shell->type("path+=(" + program.parent_path().string() + "); rehash; echo g''o\n");
+    ASSERT_TRUE(shell->await("\ngo")) << shell->shown();
+    shell->type(std::string(start) + "\t\x01: \x05; echo sho''wn\n");
+    EXPECT_TRUE(shell->await("\nshown")) << shell->shown();
+    EXPECT_THAT(shell->shown(), HasSubstr("qv-offered-program")) << start;
+    EXPECT_THAT(shell->shown(), Not(HasSubstr("bad math"))) << start;
+  }
+}
+
+TEST_F(QVToolCompletionTest, AsksTheSystemOfTheCommandLineInZsh) {
+  const auto image = root_.path() / "an image";
+  const auto directory = image / "var/log/quietvox/DiagnosticLogs/Audio/Reporting";
+  std::filesystem::create_directories(directory);
+  std::ofstream(directory / "20261121-075814+0000-quietvox-elsewhere-telephony.json") << "[{}]";
+  leaveSummary("here");
+  std::filesystem::create_directories(image / "run/quietvox/channels");
+  QVDriverProcess driver(image / "run/quietvox/channels/Elsewhere", {"--channel", "frames"});
+  const auto shell = zsh();
+  shell->type("qvctl summary show --root an\\ image 2026\t");
+  EXPECT_TRUE(shell->await("elsewhere-telephony.json")) << shell->shown();
+  shell->type("\x15qvctl --root=an\\ image channels --group El\t");
+  EXPECT_TRUE(shell->await("--group Elsewhere")) << shell->shown();
+  shell->type("\x15qvctl summary show --root '$(>ran1)' 2026\t; echo sho''wn\n");
+  EXPECT_TRUE(shell->await("\nshown")) << shell->shown();
+  EXPECT_FALSE(hasRun("ran1"));
+}
+
+TEST_F(QVToolCompletionTest, OffersShortOptionsInZsh) {
+  const auto shell = zsh();
+  shell->type("qvctl kill -\t\t");
+  EXPECT_TRUE(shell->await("-h ")) << shell->shown();
+}
+
 }  // namespace

@@ -549,9 +549,9 @@ TEST_F(QVToolWatchTest, SaysThatEventsMayHaveBeenMissed) {
 }
 
 TEST_F(QVToolWatchTest, SaysThatThereIsNothingToWatch) {
-  const Output output = qvctl({"watch", "--root", "/nowhere"});
+  const Output output = qvctl({"watch", "--root", root_.path() / "state"});
   EXPECT_EQ(output.status, 1);
-  EXPECT_THAT(output.error, HasSubstr("/nowhere/var/lib/quietvox"));
+  EXPECT_THAT(output.error, HasSubstr((root_.path() / "state/var/lib/quietvox").string()));
 }
 
 }  // namespace

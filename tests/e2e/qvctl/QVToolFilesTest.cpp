@@ -318,4 +318,43 @@ TEST_F(QVToolFilesTest, HasNoChannelsWhereNobodyPublishes) {
   EXPECT_THAT(output.error, HasSubstr("nobody publishes"));
 }
 
+TEST_F(QVToolFilesTest, DrawsSoManyKeysAndSaysThatThereAreMore) {
+  const auto file = root_.path() / "many.json";
+  std::ofstream stream(file);
+  stream << R"([{},{"7":{)";
+  for (int i = 0; i < 300; ++i) stream << (i == 0 ? "" : ",") << "\"k" << 1000 + i << "\":" << i;
+  stream << "}}]";
+  stream.close();
+  for (const Arguments& more : {Arguments{}, {"--json"}}) {
+    Arguments arguments{"summary", "plot", file};
+    arguments.insert(arguments.end(), more.begin(), more.end());
+    const Output output = qvctl(arguments);
+    EXPECT_EQ(output.status, 0) << output.error;
+    EXPECT_THAT(output.out, AllOf(HasSubstr("k1255"), Not(HasSubstr("k1256"))));
+    EXPECT_THAT(output.error, AllOf(HasSubstr("256"), HasSubstr("--key")));
+  }
+  const Output chosen = qvctl({"summary", "plot", file, "--key", "k1299"});
+  EXPECT_THAT(chosen.out, HasSubstr("k1299"));
+  EXPECT_EQ(chosen.error, "");
+  EXPECT_THAT(qvctl({"summary", "plot", file, "--key", "nope"}).error,
+              AllOf(HasSubstr("k1000, k1001"), HasSubstr(", ...")));
+}
+
+TEST_F(QVToolFilesTest, CutsLinesAtTheTerminalsWidth) {
+  const auto file = root_.path() / (std::string(90, 'f') + ".json");
+  std::ofstream(file) << R"([{},{"7":{")" << std::string(90, 'k') << R"(":1}}])";
+  auto all = environment();
+  all["TERM"] = "dumb";
+  for (const Arguments& arguments : {Arguments{"summary", "plot", file}, {"status"}}) {
+    QVTerminal shown({.arguments = command(arguments), .environment = all, .columns = 30});
+    shown.wait();
+    std::istringstream stream(shown.shown());
+    for (std::string line; std::getline(stream, line);) {
+      // The sign that something is missing takes three bytes and one column.
+      EXPECT_LE(line.find_last_not_of('\r') + 1, 32U) << line;
+    }
+    EXPECT_THAT(shown.shown(), HasSubstr("…"));
+  }
+}
+
 }  // namespace

@@ -275,6 +275,47 @@ TEST_F(QVToolStatusTest, ChangesNothingWhereItMayNotPost) {
   std::filesystem::permissions(notifications, std::filesystem::perms(0700));
 }
 
+TEST_F(QVToolStatusTest, ChangesNothingWhereItMayNotPostInAnothersPlace) {
+  const auto notifications = root_.runtime() / "notify";
+  const auto notification = notifications / "net.quillon.quietvox.reporting";
+  std::filesystem::create_directories(notifications);
+  std::ofstream(notification) << "as it was";
+  // In a directory with the sticky bit only the file's owner and the directory's may remove it:
+  // both are somebody else where the test may give them away.
+  const bool isForeign = ::geteuid() == 0;
+  if (isForeign) {
+    ASSERT_EQ(::chown(notification.c_str(), kSomebody, kSomebody), 0);
+    ASSERT_EQ(::chown(notifications.c_str(), kSomebody, kSomebody), 0);
+  }
+  ASSERT_EQ(::chmod(notifications.c_str(), 01777), 0);
+  const Arguments wrapper =
+      isForeign ? Arguments{"setpriv", "--bounding-set=-dac_override,-fowner", "--inh-caps=-all"}
+                : Arguments{};
+  const Output output = qvctl({"reporting", "off"}, wrapper);
+  EXPECT_EQ(output.status, isForeign ? 4 : 0) << output.error;
+  EXPECT_EQ(std::filesystem::exists(preferences()), !isForeign);
+  EXPECT_EQ(std::filesystem::file_size(notification), isForeign ? 9U : 0U);
+}
+
+TEST_F(QVToolStatusTest, ChangesNothingWhereTheNotificationIsADirectory) {
+  const auto notifications = root_.runtime() / "notify";
+  // Where the file would be is a directory, which is not unlinked.
+  std::filesystem::create_directories(notifications / "net.quillon.quietvox.reporting");
+  const Output output = qvctl({"reporting", "off"});
+  EXPECT_EQ(output.status, 1);
+  EXPECT_THAT(output.error, HasSubstr((notifications / "net.quillon.quietvox.reporting").string()));
+  EXPECT_FALSE(std::filesystem::exists(preferences()));
+}
+
+TEST_F(QVToolStatusTest, GivesThePreferenceNoRightsButThoseOfReadingAndWriting) {
+  root_.configure("preferences/net.quillon.quietvox.json", R"({"device_name": "kitchen"})");
+  ASSERT_EQ(::chmod(preferences().c_str(), 06755), 0);
+  EXPECT_EQ(qvctl({"reporting", "off"}).status, 0);
+  struct stat status {};
+  ASSERT_EQ(::stat(preferences().c_str(), &status), 0);
+  EXPECT_EQ(status.st_mode & 07777U, 0755U);
+}
+
 TEST_F(QVToolStatusTest, SaysWhereItIsNotPermitted) {
   service();
   std::filesystem::permissions(root_.socket(), std::filesystem::perms(0));
@@ -376,12 +417,14 @@ TEST_F(QVToolStatusTest, SaysThatItsHelpCouldNotBeWritten) {
 }
 
 TEST_F(QVToolStatusTest, LooksBelowAnotherRootDirectory) {
-  const Output output = qvctl({"status", "--json", "--root", "/nowhere"});
+  const std::string root = root_.path() / "image";
+  std::filesystem::create_directory(root);
+  const Output output = qvctl({"status", "--json", "--root", root});
   EXPECT_EQ(output.status, 3);
   const auto values = parseLines(output.out);
   ASSERT_THAT(values, SizeIs(1));
-  EXPECT_EQ(at(values[0], {"socket"}), QVValue("/nowhere/run/quietvox/reporting.socket"));
-  EXPECT_EQ(at(values[0], {"store", "path"}), QVValue("/nowhere/var/lib/quietvox/reporting.db"));
+  EXPECT_EQ(at(values[0], {"socket"}), QVValue(root + "/run/quietvox/reporting.socket"));
+  EXPECT_EQ(at(values[0], {"store", "path"}), QVValue(root + "/var/lib/quietvox/reporting.db"));
 }
 
 }  // namespace

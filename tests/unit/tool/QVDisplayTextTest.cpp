@@ -27,6 +27,12 @@ TEST(QVDisplayTextTest, WritesChangesOfDirectionOut) {
   EXPECT_EQ(QVDisplayText("\xE2\x80\x8B"), "\\u200B");
 }
 
+TEST(QVDisplayTextTest, WritesInvisibleCharactersOut) {
+  EXPECT_EQ(QVDisplayText("\u00AD\u180E\u3164"), "\\u00AD\\u180E\\u3164");
+  EXPECT_EQ(QVDisplayText("\U000E0041"), "\\uE0041");
+  EXPECT_EQ(QVDisplayJSON("\"\U000E0041\u00AD\""), R"("\udb40\udc41\u00ad")");
+}
+
 TEST(QVDisplayTextTest, WritesBytesThatAreNoTextOut) {
   EXPECT_EQ(QVDisplayText("\xFF"), "\\xFF");
   EXPECT_EQ(QVDisplayText("\xC3"), "\\xC3");

@@ -47,6 +47,12 @@ TEST_F(QVTimeTextTest, RefusesWhatIsNoDuration) {
 
 TEST_F(QVTimeTextTest, ReadsTimes) {
   EXPECT_EQ(QVParseTime("2026-11-21T06:20:01.25Z", 0), kNow);
+  EXPECT_EQ(QVParseTime("2026-11-21T07:20:01.25+01:00", 0), kNow);
+  EXPECT_EQ(QVParseTime("2026-11-21T02:50:01.25-0330", 0), kNow);
+  for (const char* wrong : {"2026-11-21T07:20+1", "2026-11-21T07:20+15:00",
+                            "2026-11-21T07:20+01:60", "2026-11-21T07:20+01:00Z"}) {
+    EXPECT_FALSE(QVParseTime(wrong, 0)) << wrong;
+  }
   EXPECT_EQ(QVParseTime("2026-11-21 08:20:01.25", 0), kNow);
   EXPECT_EQ(QVParseTime("2026-11-21 08:20", 0), kNow - kSecond - 250'000);
   EXPECT_EQ(QVParseTime("08:20:01", kNow), kNow - 250'000);

@@ -1,3 +1,4 @@
+#include "tests/support/QVTemporaryRoot.h"
 #include "tools/qvctl/QVToolPlaces.h"
 
 #include <cstdlib>
@@ -41,12 +42,14 @@ TEST_F(QVToolPlacesTest, AreTakenFromTheEnvironmentAsTheServiceTakesThem) {
 TEST_F(QVToolPlacesTest, LieBelowAnotherRootWhateverTheEnvironmentSays) {
   ::setenv("RUNTIME_DIRECTORY", "/r", 1);
   ::setenv("QUIETVOX_SOCKET", "/q", 1);
-  const auto places = QVToolPlaces::find("", "/image");
-  EXPECT_EQ(places.socket, "/image/run/quietvox/reporting.socket");
-  EXPECT_EQ(places.directories.store(), "/image/var/lib/quietvox/reporting.db");
-  EXPECT_TRUE(places.isOtherRoot);
-  EXPECT_FALSE(QVToolPlaces::find("", "").isOtherRoot);
-  EXPECT_EQ(QVToolPlaces::find("/own", "/image").socket, "/own");
+  const QVTemporaryRoot directory;
+  const std::string image = directory.path().string();
+  const auto places = QVToolPlaces::find("", image);
+  EXPECT_EQ(places.socket, image + "/run/quietvox/reporting.socket");
+  EXPECT_EQ(places.directories.store(), image + "/var/lib/quietvox/reporting.db");
+  EXPECT_EQ(places.root, image);
+  EXPECT_EQ(QVToolPlaces::find("", "").root, "");
+  EXPECT_EQ(QVToolPlaces::find("/own", image).socket, "/own");
   EXPECT_EQ(QVToolPlaces::find("/own", "").socket, "/own");
 }
 
