@@ -1,14 +1,16 @@
 #include "tools/qvctl/QVChannelsCommand.h"
 
 #include "platform/QVText.h"
-#include "tools/qvctl/QVSignals.h"
+#include "tools/qvctl/QVEnding.h"
 #include "tools/qvctl/QVTable.h"
 #include "tools/qvctl/QVTimeText.h"
 
 #include <algorithm>
 #include <array>
+#include <cerrno>
 #include <chrono>
 #include <cstdio>
+#include <optional>
 #include <utility>
 #include <vector>
 
@@ -32,14 +34,17 @@ std::chrono::milliseconds intervalOf(const std::string& text) {
 }
 
 // Waits for the next reading; false where that is the end.
-bool wait(const QVToolOutput& output, const QVSignals& signals, Clock::time_point until) {
-  while (true) {
+bool wait(const QVToolOutput& output, const QVEnding& ending, Clock::time_point until) {
+  while (!QVEnding::isAsked()) {
     const auto rest = std::chrono::ceil<std::chrono::milliseconds>(until - Clock::now());
     if (rest.count() <= 0) return true;
-    std::array<pollfd, 2> entries{{{signals.descriptor(), POLLIN, 0}, {output.descriptor(), 0, 0}}};
-    const int ready = ::poll(entries.data(), entries.size(), static_cast<int>(rest.count()));
-    if (ready > 0 && (entries[0].revents != 0 || (entries[1].revents & POLLERR) != 0)) return false;
+    // Of the output, errors are always told: the reader of a pipe has gone away.
+    std::array<pollfd, 1> entries{{{output.descriptor(), 0, 0}}};
+    const int ready = ending.poll(entries, static_cast<int>(rest.count()));
+    if (ready < 0 && errno != EINTR) throw QVToolFailure::ofSystem("waiting", errno);
+    if (ready > 0 && (entries[0].revents & POLLERR) != 0) return false;
   }
+  return false;
 }
 
 std::string rateText(double rate) {
@@ -62,11 +67,11 @@ QVToolStatus QVChannelsCommand::run(const QVToolContext& context, const Options&
     return QVToolStatus::done;
   }
   const auto interval = intervalOf(options.interval);
-  const QVSignals signals{SIGINT, SIGTERM, SIGHUP};
+  const QVEnding ending(std::nullopt);
   std::optional<Clock::time_point> last;
   QVChannelTable::Reading before;
   for (std::size_t round = 0; !options.count || round < *options.count; ++round) {
-    if (last && !wait(context.output, signals, *last + interval)) break;
+    if (last && !wait(context.output, ending, *last + interval)) break;
     const auto now = Clock::now();
     std::optional<double> seconds;
     if (last) seconds = std::chrono::duration<double>(now - *last).count();

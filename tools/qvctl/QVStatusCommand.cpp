@@ -7,6 +7,7 @@
 #include "tools/qvctl/QVSwitchControl.h"
 #include "tools/qvctl/QVTimeText.h"
 
+#include <algorithm>
 #include <chrono>
 #include <cstdio>
 #include <filesystem>
@@ -77,10 +78,12 @@ QVStatusCommand::Store QVStatusCommand::findStore() const {
       if (!missing) found.bytes += static_cast<int64_t>(bytes);
     }
     // Rows are added at one end and removed at the other. Each end is one look; counting them all,
-    // or asking for both at once, would read the whole table.
+    // or asking for both at once, would read the whole table. In a damaged store the numbers may be
+    // any.
     const auto count = [&store](const char* table) {
       const int64_t last = store->number(QVText("SELECT max(id) FROM ", table));
-      return last == 0 ? 0 : last + 1 - store->number(QVText("SELECT min(id) FROM ", table));
+      if (last <= 0) return int64_t{0};
+      return last - std::max<int64_t>(store->number(QVText("SELECT min(id) FROM ", table)), 1) + 1;
     };
     found.sessions = count("beacon_session");
     found.messages = count("beacon_message");

@@ -47,7 +47,7 @@ QVToolStatus QVSummaryCommand::run(const QVToolContext& context, const Options& 
   }
   const QVSummaryFile file = QVSummaryFile::choose(context.places.summaries(), options.file);
   if (options.operation == Operation::show) show(context, file);
-  if (options.operation == Operation::open) open(file);
+  if (options.operation == Operation::open) open(context, file);
   if (options.operation == Operation::plot) {
     QVSummaryPlot(context.output, file, options.plot).show();
   }
@@ -105,11 +105,11 @@ void QVSummaryCommand::show(const QVToolContext& context, const QVSummaryFile& f
   if (!isLineOver) output.line("");
 }
 
-void QVSummaryCommand::open(const QVSummaryFile& file) {
+void QVSummaryCommand::open(const QVToolContext& context, const QVSummaryFile& file) {
   // Says what is wrong with it before another program does.
   file.check();
   // The program inherits what it would have without qvctl.
-  static_cast<void>(std::signal(SIGPIPE, SIG_DFL));
+  if (!context.ignoresPipes) static_cast<void>(std::signal(SIGPIPE, SIG_DFL));
   const bool hasDesktop =
       !QVEnvironment("WAYLAND_DISPLAY").empty() || !QVEnvironment("DISPLAY").empty();
   const std::string path = std::filesystem::absolute(file.path()).string();

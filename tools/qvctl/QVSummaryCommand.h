@@ -24,5 +24,5 @@ class QVSummaryCommand {
  private:
   static void list(const QVToolContext& context);
   static void show(const QVToolContext& context, const QVSummaryFile& file);
-  static void open(const QVSummaryFile& file);
+  static void open(const QVToolContext& context, const QVSummaryFile& file);
 };
