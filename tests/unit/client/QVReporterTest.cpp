@@ -292,14 +292,15 @@ TEST_F(QVReporterTest, SaysWhatKeepsItFromTheService) {
 }
 
 TEST_F(QVReporterTest, OpensWithoutDescriptorsForTheSwitch) {
-  // In nothing that has virtual functions, which a sanitizer takes a pipe to look at.
-  const auto openWithOne = [](QVReporterOptions given) {
+#if defined(__SANITIZE_ADDRESS__)
+  GTEST_SKIP() << "the sanitizer opens a pipe to look at an object and calls it broken where it "
+                  "gets none";
+#endif
+  {
     const QVDescriptorLimit oneMore(1);
-    return QVReporter::open(std::move(given));
-  };
-  auto opened = openWithOne(options());
-  ASSERT_TRUE(opened) << opened.error().text();
-  reporter_ = std::move(opened.value());
+    open();
+  }
+  ASSERT_NE(reporter_, nullptr);
   const auto session = openSession(7);
   const auto service = accept();
   switchReporting(false);
