@@ -17,9 +17,11 @@ namespace {
 using ::testing::HasSubstr;
 
 // Users that this program does not run as: whose the socket is, and others.
-constexpr uid_t kOwner = 4712;
-constexpr uid_t kOther = 4713;
-constexpr uid_t kCaller = 4714;
+// Users of this test alone: processes of the same ones, as of another such test that runs
+// meanwhile, would count. Three in a row, below those that a container may lack.
+const uid_t kOwner = 20'000 + 3 * static_cast<uid_t>(::getpid() % 10'000);
+const uid_t kOther = kOwner + 1;
+const uid_t kCaller = kOwner + 2;
 
 const std::vector<std::vector<std::string>> kLooking{
     {"status"}, {"sessions"}, {"kill"}, {"reporting", "show"}};
