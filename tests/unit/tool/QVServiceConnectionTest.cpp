@@ -1,13 +1,11 @@
 // A connection to a service that does not answer.
 
-#include "tests/support/QVTemporaryRoot.h"
+#include "tests/unit/tool/QVSilentServiceTest.h"
 #include "tools/qvctl/QVServiceConnection.h"
 
 #include <chrono>
 
 #include <gmock/gmock.h>
-#include <sys/socket.h>
-#include <sys/un.h>
 
 namespace {
 
@@ -17,18 +15,8 @@ using ::testing::HasSubstr;
 constexpr QVServiceConnection::Patience kLittle{.moment = std::chrono::milliseconds(1),
                                                 .limit = std::chrono::milliseconds(10)};
 
-class QVServiceConnectionTest : public testing::Test {
+class QVServiceConnectionTest : public QVSilentServiceTest {
  protected:
-  // Something that is connected to, and never accepts.
-  QVServiceConnectionTest() {
-    places_.socket = root_.socket();
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    places_.socket.string().copy(address.sun_path, sizeof address.sun_path - 1);
-    EXPECT_EQ(::bind(silent_.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address),
-              0);
-    EXPECT_EQ(::listen(silent_.get(), 0), 0);
-  }
   // What is said where something fails.
   template <class Action>
   std::string failureOf(Action action) const {
@@ -41,10 +29,6 @@ class QVServiceConnectionTest : public testing::Test {
     ADD_FAILURE() << "it did not fail";
     return {};
   }
-
-  const QVTemporaryRoot root_;
-  const QVDescriptor silent_{::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)};
-  QVToolPlaces places_;
 };
 
 TEST_F(QVServiceConnectionTest, GivesAServiceUpThatDoesNotAnswer) {

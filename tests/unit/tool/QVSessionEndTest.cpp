@@ -1,41 +1,26 @@
 // The end of a session of which the service says nothing.
 
 #include "platform/linux/QVDescriptor.h"
-#include "tests/support/QVTemporaryRoot.h"
+#include "tests/unit/tool/QVSilentServiceTest.h"
 #include "tools/qvctl/QVSessionEnd.h"
 
 #include <chrono>
 
 #include <gmock/gmock.h>
 #include <sys/eventfd.h>
-#include <sys/socket.h>
-#include <sys/un.h>
 
 namespace {
 
 using ::testing::HasSubstr;
 using ::testing::StartsWith;
 
-class QVSessionEndTest : public testing::Test {
+class QVSessionEndTest : public QVSilentServiceTest {
  protected:
-  // Something that is connected to, and never answers.
-  QVSessionEndTest() {
-    places_.socket = root_.socket();
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    places_.socket.string().copy(address.sun_path, sizeof address.sun_path - 1);
-    EXPECT_EQ(::bind(silent_.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address),
-              0);
-    EXPECT_EQ(::listen(silent_.get(), 1), 0);
-  }
   static QVSessionEnd endOver(QVServiceConnection& service) {
     return {service, 7, QVClientPayload(), QVClientCategory(QVClientKind::generic)};
   }
 
-  const QVTemporaryRoot root_;
-  const QVDescriptor silent_{::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)};
   const QVDescriptor interruption_{::eventfd(0, EFD_CLOEXEC)};
-  QVToolPlaces places_;
 };
 
 TEST_F(QVSessionEndTest, IsWaitedForForOneLimitInAll) {

@@ -2,7 +2,7 @@
 
 #include "platform/QVText.h"
 #include "platform/linux/QVDescriptor.h"
-#include "tests/support/QVTemporaryRoot.h"
+#include "tests/unit/tool/QVSilentServiceTest.h"
 #include "tools/qvctl/QVSessionKeeper.h"
 #include "tools/qvctl/QVToolFailure.h"
 
@@ -21,19 +21,8 @@ using Request = QVSessionKeeper::Request;
 // Whoever waits in these tests does so no longer.
 constexpr std::chrono::milliseconds kLittle{10};
 
-class QVSessionKeeperTest : public testing::Test {
+class QVSessionKeeperTest : public QVSilentServiceTest {
  protected:
-  QVSessionKeeperTest() {
-    places_.socket = root_.socket();
-    sockaddr_un service{};
-    service.sun_family = AF_UNIX;
-    places_.socket.string().copy(service.sun_path, sizeof service.sun_path - 1);
-    listen(service_, service, 0);
-  }
-  static void listen(const QVDescriptor& socket, const sockaddr_un& address, int backlog) {
-    EXPECT_EQ(::bind(socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
-    EXPECT_EQ(::listen(socket.get(), backlog), 0);
-  }
   // Where the keeper of session 7 is looked for.
   sockaddr_un address() const {
     struct stat file {};
@@ -54,10 +43,7 @@ class QVSessionKeeperTest : public testing::Test {
     }
   }
 
-  const QVTemporaryRoot root_;
-  const QVDescriptor service_{::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)};
   const QVDescriptor keeper_{::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0)};
-  QVToolPlaces places_;
 };
 
 TEST_F(QVSessionKeeperTest, IsNotThere) {
