@@ -18,22 +18,22 @@ bool canNameAFile(std::string_view name) {
 // Shared by the watch, the deliveries and the table.
 struct QVInotifyNotifications::Registration {
   const int32_t token;
-  const std::shared_ptr<QVWorkQueue> queue;
   Handler handler;  // the queue's
 
   QVMutex mutex;
+  // Null once it is over: a delivery that is enqueued then must not keep its own queue.
+  std::shared_ptr<QVWorkQueue> queue QV_GUARDED_BY(mutex);
   QVDirectoryWatcher::Token watch QV_GUARDED_BY(mutex) = QVDirectoryWatcher::kNoToken;
-  bool isOver QV_GUARDED_BY(mutex) = false;
   bool isEnqueued QV_GUARDED_BY(mutex) = false;
 
   Registration(int32_t itsToken, std::shared_ptr<QVWorkQueue> itsQueue, Handler itsHandler)
-      : token(itsToken), queue(std::move(itsQueue)), handler(std::move(itsHandler)) {}
+      : token(itsToken), handler(std::move(itsHandler)), queue(std::move(itsQueue)) {}
 
   // Enqueues with the lock held, so that nothing is enqueued once the end has been noted. Nothing
   // runs there, nor does the item hold the last reference.
   static void post(const std::shared_ptr<Registration>& self) {
     const QVMutexLock lock(self->mutex);
-    if (self->isOver || std::exchange(self->isEnqueued, true)) return;
+    if (!self->queue || std::exchange(self->isEnqueued, true)) return;
     try {
       self->queue->async([self] { self->deliver(); });
     } catch (...) {
@@ -118,9 +118,10 @@ std::shared_ptr<QVInotifyNotifications::Registration> QVInotifyNotifications::ta
 
 void QVInotifyNotifications::end(Registration& registration) {
   QVDirectoryWatcher::Token watch = QVDirectoryWatcher::kNoToken;
+  std::shared_ptr<QVWorkQueue> queue;  // may be the last handle: let go without the lock
   {
     const QVMutexLock lock(registration.mutex);
-    registration.isOver = true;
+    queue.swap(registration.queue);
     watch = registration.watch;
   }
   watcher_->unwatch(watch);

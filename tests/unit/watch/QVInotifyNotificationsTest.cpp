@@ -212,6 +212,19 @@ TEST_F(QVInotifyNotificationsTest, StillRunsWhatWasEnqueuedBeforeTheEnd) {
   EXPECT_THAT(delivered_, ElementsAre(cancelled, ended));
 }
 
+TEST_F(QVInotifyNotificationsTest, KeepsNoQueueByADeliveryThatNobodyRan) {
+  auto queue = std::make_shared<QVHeldQueue>();
+  const std::weak_ptr<QVHeldQueue> seen = queue;
+  add("name", queue, delivered_);
+  post("name");
+  settle();
+  EXPECT_EQ(queue->count(), 1U);
+  queue = nullptr;
+  EXPECT_FALSE(seen.expired());
+  notifications_ = nullptr;
+  EXPECT_TRUE(seen.expired());
+}
+
 TEST_F(QVInotifyNotificationsTest, EnqueuesNothingOnceItIsDestroyed) {
   add("name");
   notifications_ = nullptr;
