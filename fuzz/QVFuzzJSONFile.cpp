@@ -1,6 +1,6 @@
 #include "fuzz/QVFuzzFiles.h"
-#include "platform/linux/QVJSONText.h"
 #include "platform/linux/files/QVJSONFile.h"
+#include "platform/linux/store/QVJSONText.h"
 
 #include <cstdlib>
 #include <string>

@@ -4,11 +4,11 @@
 
 #include "platform/fake/QVFakeLog.h"
 #include "platform/fake/QVFakePreferences.h"
-#include "platform/linux/QVJSONText.h"
-#include "platform/linux/QVSQLiteEventStore.h"
-#include "platform/linux/QVStoreBeacon.h"
-#include "platform/linux/QVStoreCountwise.h"
-#include "platform/linux/QVSystemClock.h"
+#include "platform/linux/store/QVJSONText.h"
+#include "platform/linux/store/QVSQLiteEventStore.h"
+#include "platform/linux/store/QVStoreBeacon.h"
+#include "platform/linux/store/QVStoreCountwise.h"
+#include "platform/linux/system/QVSystemClock.h"
 #include "tests/support/QVTemporaryRoot.h"
 
 #include <chrono>

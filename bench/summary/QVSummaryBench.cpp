@@ -5,8 +5,8 @@
 #include "QVServices/Statistics/QVReportingVocabulary.h"
 #include "QVServices/Statistics/Service/QVReportingSession.h"
 #include "platform/fake/QVFakePlatform.h"
-#include "platform/linux/QVPosixFileSystem.h"
-#include "platform/linux/QVRapidJSONOutput.h"
+#include "platform/linux/output/QVPosixFileSystem.h"
+#include "platform/linux/output/QVRapidJSONOutput.h"
 #include "tests/support/QVTemporaryRoot.h"
 
 #include <chrono>

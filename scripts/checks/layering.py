@@ -47,6 +47,7 @@ MACHINE_NAMES = [
 # Libraries that stay behind the adapters.
 LIBRARIES = {
     "Asio": re.compile(r"asio(\.hpp$|/)"),
+    "libsystemd": re.compile(r"systemd/"),
     "RapidJSON": re.compile(r"rapidjson/"),
     "SQLite": re.compile(r"sqlite3"),
 }
@@ -69,30 +70,43 @@ class Layer:
 
 _PLATFORM = r"platform/\w+\.h"
 _ANY = r".*"
-# Of the other adapters the wire code, and with it the client, uses these headers, which need no
-# source: it is linked without the rest.
-_SHARED_WITH_BUS = r"platform/linux/(QVDescriptor|QVThreadAnnotations|QVWakeUpBatch)\.h"
+# What is shared by adapters lies in their folder itself; the wire code, and with it the client, uses
+# those headers of it that need no source: it is linked without the rest.
+_SHARED = r"platform/linux/\w+\.h"
+_SHARED_WITHOUT_SOURCE = r"platform/linux/(QVDescriptor|QVThreadAnnotations|QVWakeUpBatch)\.h"
 
-_SHARED_WITH_TOOLS = (r"platform/linux/(QVDescriptor|QVEventStoreSchema|QVJSONText|QVPosixAtomicFile|"
-                      r"QVServiceDirectories|files/\w+|tally/\w+)\.h")
+_SHARED_WITH_TOOLS = (r"platform/linux/(QVDescriptor|output/QVPosixAtomicFile|settings/QVServiceDirectories|"
+                      r"store/(QVEventStoreSchema|QVJSONText)|files/\w+|tally/\w+)\.h")
+
+
+def adapter(name, others=(), libraries=(), shared=_SHARED):
+    """The layer of an adapter's folder, which may include from those `others`."""
+    folders = [rf"platform/linux/{folder}/\w+\.h" for folder in (name, *others)]
+    return Layer(f"platform/linux/{name}", [_PLATFORM, shared, *folders], system=True, libraries=libraries)
+
 
 # The first folder that a file lies in, or the file itself, decides.
 LAYERS = [
     Layer("platform/fake", [_PLATFORM, r"platform/fake/\w+\.h"]),
-    Layer("platform/linux/bus", [_PLATFORM, r"platform/linux/bus/\w+\.h", _SHARED_WITH_BUS],
-          system=True, libraries=LIBRARIES),
-    # As the codec, this goes into the client without the rest of the adapters.
-    Layer("platform/linux/files",
-          [_PLATFORM, r"platform/linux/files/\w+\.h", r"platform/linux/QVDescriptor\.h"],
-          system=True, libraries=["RapidJSON"]),
-    Layer("platform/linux", [_PLATFORM, r"platform/linux/(\w+/)*\w+\.h"],
-          system=True, libraries=LIBRARIES),
+    # These two go into the client without the rest of the adapters.
+    adapter("bus", libraries=["Asio", "libsystemd"], shared=_SHARED_WITHOUT_SOURCE),
+    adapter("files", libraries=["RapidJSON"], shared=_SHARED_WITHOUT_SOURCE),
+    adapter("log", ["bus"], libraries=["libsystemd"]),
+    adapter("orientation", ["files", "watch"], libraries=["libsystemd"]),
+    adapter("output", libraries=["RapidJSON"]),
+    adapter("queues", libraries=["Asio"]),
+    adapter("settings", ["files"]),
+    adapter("store", ["output"], libraries=["RapidJSON", "SQLite"]),
+    adapter("system", ["bus"]),
+    adapter("tally", ["files"]),
+    adapter("watch"),
+    Layer("platform/linux", [_PLATFORM, _SHARED], system=True),
     Layer("platform", [_PLATFORM], machine=False),
     Layer("QVServices/Statistics/Service", [_PLATFORM, r"QVServices/Statistics/(Service/)?\w+\.h"],
           machine=False),
     Layer("QVServices", [_PLATFORM, r"QVServices/Statistics/\w+\.h"], machine=False),
     Layer("client",
-          [_PLATFORM, r"client/.*\.h", r"platform/linux/(bus|files)/\w+\.h", _SHARED_WITH_BUS],
+          [_PLATFORM, r"client/.*\.h", r"platform/linux/(bus|files)/\w+\.h", _SHARED_WITHOUT_SOURCE],
           system=True),
     Layer("daemon", [_PLATFORM, r"platform/linux/(\w+/)*\w+\.h", r"QVServices/.*\.h", r"daemon/.*\.h"],
           system=True),

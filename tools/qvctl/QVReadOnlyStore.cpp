@@ -1,7 +1,7 @@
 #include "tools/qvctl/QVReadOnlyStore.h"
 
 #include "platform/QVText.h"
-#include "platform/linux/QVEventStoreSchema.h"
+#include "platform/linux/store/QVEventStoreSchema.h"
 #include "tools/qvctl/QVToolFailure.h"
 
 #include <cerrno>

@@ -1,7 +1,7 @@
 #include "tools/qvctl/QVSummaryPlot.h"
 
 #include "platform/QVText.h"
-#include "platform/linux/QVJSONText.h"
+#include "platform/linux/store/QVJSONText.h"
 #include "tools/qvctl/QVDisplayText.h"
 #include "tools/qvctl/QVEnvironment.h"
 #include "tools/qvctl/QVPlot.h"

@@ -3,9 +3,9 @@
 #include "platform/QVPreferences.h"
 #include "platform/QVText.h"
 #include "platform/linux/QVDescriptor.h"
-#include "platform/linux/QVJSONText.h"
-#include "platform/linux/QVPosixAtomicFile.h"
 #include "platform/linux/files/QVJSONFile.h"
+#include "platform/linux/output/QVPosixAtomicFile.h"
+#include "platform/linux/store/QVJSONText.h"
 #include "tools/qvctl/QVOtherRoot.h"
 #include "tools/qvctl/QVToolFailure.h"
 

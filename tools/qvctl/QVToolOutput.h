@@ -1,7 +1,7 @@
 #pragma once
 
 #include "platform/QVValue.h"
-#include "platform/linux/QVJSONText.h"
+#include "platform/linux/store/QVJSONText.h"
 
 #include <cstddef>
 #include <exception>

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "platform/linux/QVServiceDirectories.h"
+#include "platform/linux/settings/QVServiceDirectories.h"
 
 #include <filesystem>
 #include <string>

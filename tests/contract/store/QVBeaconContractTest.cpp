@@ -1,6 +1,6 @@
 #include "platform/QVText.h"
 #include "platform/fake/QVFakeBeacon.h"
-#include "platform/linux/QVStoreBeacon.h"
+#include "platform/linux/store/QVStoreBeacon.h"
 #include "tests/contract/store/QVStoreUnderTest.h"
 
 #include <atomic>

@@ -1,6 +1,6 @@
 #include "platform/QVText.h"
 #include "platform/fake/QVFakeCountwise.h"
-#include "platform/linux/QVStoreCountwise.h"
+#include "platform/linux/store/QVStoreCountwise.h"
 #include "tests/contract/store/QVStoreUnderTest.h"
 
 #include <atomic>

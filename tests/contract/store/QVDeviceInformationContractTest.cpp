@@ -1,7 +1,7 @@
 #include "platform/fake/QVFakeDeviceInformation.h"
 #include "platform/fake/QVFakeLog.h"
-#include "platform/linux/QVJSONDeviceInformation.h"
 #include "platform/linux/files/QVJSONFile.h"
+#include "platform/linux/settings/QVJSONDeviceInformation.h"
 #include "tests/support/QVTemporaryRoot.h"
 
 #include <limits>

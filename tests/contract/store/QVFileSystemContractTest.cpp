@@ -1,5 +1,5 @@
 #include "platform/fake/QVFakeFileSystem.h"
-#include "platform/linux/QVPosixFileSystem.h"
+#include "platform/linux/output/QVPosixFileSystem.h"
 #include "tests/support/QVTemporaryRoot.h"
 
 #include <filesystem>

@@ -1,6 +1,6 @@
 #include "platform/fake/QVFakeJSONOutput.h"
-#include "platform/linux/QVRapidJSONOutput.h"
 #include "platform/linux/files/QVJSONFile.h"
+#include "platform/linux/output/QVRapidJSONOutput.h"
 
 #include <cmath>
 #include <limits>

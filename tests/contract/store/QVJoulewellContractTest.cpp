@@ -1,6 +1,6 @@
 #include "platform/QVText.h"
 #include "platform/fake/QVFakeJoulewell.h"
-#include "platform/linux/QVStoreJoulewell.h"
+#include "platform/linux/store/QVStoreJoulewell.h"
 #include "tests/contract/store/QVStoreUnderTest.h"
 
 #include <thread>

@@ -1,7 +1,7 @@
 #include "platform/fake/QVFakeLog.h"
 #include "platform/fake/QVFakePreferences.h"
-#include "platform/linux/QVJSONPreferences.h"
 #include "platform/linux/files/QVJSONFile.h"
+#include "platform/linux/settings/QVJSONPreferences.h"
 #include "tests/support/QVTemporaryRoot.h"
 
 #include <filesystem>

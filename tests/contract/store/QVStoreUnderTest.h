@@ -3,7 +3,7 @@
 #include "platform/fake/QVFakeClock.h"
 #include "platform/fake/QVFakeLog.h"
 #include "platform/fake/QVFakePreferences.h"
-#include "platform/linux/QVSQLiteEventStore.h"
+#include "platform/linux/store/QVSQLiteEventStore.h"
 #include "tests/support/QVStoreReader.h"
 #include "tests/support/QVTemporaryRoot.h"
 

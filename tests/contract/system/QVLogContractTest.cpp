@@ -1,6 +1,6 @@
 #include "platform/fake/QVFakeLog.h"
 #include "platform/fake/QVFakePreferences.h"
-#include "platform/linux/QVSystemLog.h"
+#include "platform/linux/log/QVSystemLog.h"
 
 #include <memory>
 #include <mutex>

@@ -1,5 +1,5 @@
 #include "platform/fake/QVFakeNotifications.h"
-#include "platform/linux/QVInotifyNotifications.h"
+#include "platform/linux/watch/QVInotifyNotifications.h"
 #include "tests/contract/system/QVQueueHarness.h"
 #include "tests/support/QVTemporaryRoot.h"
 

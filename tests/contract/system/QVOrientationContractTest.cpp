@@ -1,6 +1,6 @@
 #include "platform/fake/QVFakeLog.h"
 #include "platform/fake/QVFakeOrientation.h"
-#include "platform/linux/QVLinuxOrientation.h"
+#include "platform/linux/orientation/QVLinuxOrientation.h"
 #include "tests/support/QVFileReadings.h"
 #include "tests/support/QVTemporaryRoot.h"
 #include "tests/support/QVTestBus.h"

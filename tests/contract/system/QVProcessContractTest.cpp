@@ -1,5 +1,5 @@
 #include "platform/fake/QVFakeProcess.h"
-#include "platform/linux/QVLinuxProcess.h"
+#include "platform/linux/system/QVLinuxProcess.h"
 
 #include <cstdlib>
 #include <filesystem>

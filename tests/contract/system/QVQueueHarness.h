@@ -4,9 +4,9 @@
 #include "platform/fake/QVFakeLog.h"
 #include "platform/fake/QVFakeRunLoopThreads.h"
 #include "platform/fake/QVFakeWorkQueues.h"
-#include "platform/linux/QVAsioRunLoopThreads.h"
-#include "platform/linux/QVAsioWorkQueues.h"
-#include "platform/linux/QVStdConditions.h"
+#include "platform/linux/queues/QVAsioRunLoopThreads.h"
+#include "platform/linux/queues/QVAsioWorkQueues.h"
+#include "platform/linux/queues/QVStdConditions.h"
 
 #include <atomic>
 #include <chrono>

@@ -1,5 +1,5 @@
 #include "platform/fake/QVFakeRandom.h"
-#include "platform/linux/QVSystemRandom.h"
+#include "platform/linux/system/QVSystemRandom.h"
 
 #include <cstdint>
 #include <set>

@@ -179,8 +179,11 @@ TYPED_TEST(QVRunLoopThreadsContract, RunsAgainWithNewTimers) {
 }
 
 TYPED_TEST(QVRunLoopThreadsContract, FiresInTheOrderOfFireDates) {
-  this->runLoopWith(
-      {this->noteTimer(3ms, "c"), this->noteTimer(1ms, "a"), this->noteTimer(2ms, "b")});
+  // Their dates count from their making, and so come in this order however long that takes.
+  const auto a = this->noteTimer(1ms, "a");
+  const auto b = this->noteTimer(2ms, "b");
+  const auto c = this->noteTimer(3ms, "c");
+  this->runLoopWith({c, a, b});
   EXPECT_THAT(this->notes(), ElementsAre("a", "b", "c"));
 }
 
@@ -218,9 +221,10 @@ TYPED_TEST(QVRunLoopThreadsContract, MovesAnAttachedTimerEarlierFromAnotherThrea
 
 TYPED_TEST(QVRunLoopThreadsContract, MovesAnAttachedTimerLater) {
   // Put off before it fires, it comes after what was to come after it.
-  const auto moved = this->noteTimer(10ms, "moved");
-  const auto mover = this->threads().makeTimer(0ms, [moved] { moved->fireAfter(24h); });
-  const auto later = this->threads().makeTimer(20ms, [this, moved] {
+  std::shared_ptr<QVRunLoopTimer> moved;
+  const auto mover = this->threads().makeTimer(0ms, [&moved] { moved->fireAfter(24h); });
+  moved = this->noteTimer(10ms, "moved");
+  const auto later = this->threads().makeTimer(20ms, [this, &moved] {
     this->note("later");
     moved->fireAfter(0ms);
   });

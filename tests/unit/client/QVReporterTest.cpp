@@ -258,8 +258,10 @@ TEST_F(QVReporterTest, AfterItsEndSessionsTakeNothing) {
 
 TEST_F(QVReporterTest, ADropCallbackMayEndIt) {
   QVReporterOptions given = options();
+  std::promise<void> isIdle;  // no other thread uses the reporter any more
   std::promise<Code> flushed;
-  given.dropped = [this, &flushed](const QVDropCounts&) {
+  given.dropped = [this, &isIdle, &flushed](const QVDropCounts&) {
+    isIdle.get_future().get();
     const Code code = reporter_->flush(kPatience);
     reporter_.reset();
     flushed.set_value(code);
@@ -269,6 +271,7 @@ TEST_F(QVReporterTest, ADropCallbackMayEndIt) {
   payload.beginArray("open");
   EXPECT_EQ(reporter_->sendToEverySession(payload, kPlayback, QVClientMessageType::generic),
             Code::invalidPayload);
+  isIdle.set_value();
   EXPECT_EQ(flushed.get_future().get(), Code::wouldDeadlock);
   EXPECT_EQ(reporter_, nullptr);
 }

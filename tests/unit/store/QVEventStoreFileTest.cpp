@@ -1,5 +1,5 @@
-#include "platform/linux/QVEventStoreError.h"
-#include "platform/linux/QVEventStoreSchema.h"
+#include "platform/linux/store/QVEventStoreError.h"
+#include "platform/linux/store/QVEventStoreSchema.h"
 #include "tests/unit/store/QVStoreFixture.h"
 
 #include <filesystem>

@@ -1,6 +1,6 @@
 #include "platform/fake/QVFakeMemoryCharge.h"
-#include "platform/linux/QVEventStoreError.h"
-#include "platform/linux/QVSQLiteDatabase.h"
+#include "platform/linux/store/QVEventStoreError.h"
+#include "platform/linux/store/QVSQLiteDatabase.h"
 #include "tests/unit/store/QVFaultyFileSystem.h"
 #include "tests/unit/store/QVStoreFixture.h"
 

@@ -1,5 +1,5 @@
-#include "platform/linux/QVJSONText.h"
 #include "platform/linux/files/QVJSONFile.h"
+#include "platform/linux/store/QVJSONText.h"
 
 #include <cmath>
 #include <limits>

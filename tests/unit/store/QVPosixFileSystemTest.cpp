@@ -1,6 +1,6 @@
 // What files of the operating system have beyond what all file systems of the service do.
 
-#include "platform/linux/QVPosixFileSystem.h"
+#include "platform/linux/output/QVPosixFileSystem.h"
 #include "tests/support/QVTemporaryRoot.h"
 
 #include <cerrno>

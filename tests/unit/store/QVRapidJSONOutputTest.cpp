@@ -1,5 +1,5 @@
-#include "platform/linux/QVRapidJSONOutput.h"
 #include "platform/linux/files/QVJSONFile.h"
+#include "platform/linux/output/QVRapidJSONOutput.h"
 
 #include <algorithm>
 #include <string>

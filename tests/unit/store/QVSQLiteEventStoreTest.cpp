@@ -1,5 +1,5 @@
 #include "platform/fake/QVFakeMemoryCharge.h"
-#include "platform/linux/QVEventStoreError.h"
+#include "platform/linux/store/QVEventStoreError.h"
 #include "tests/unit/store/QVStoreFixture.h"
 
 #include <atomic>

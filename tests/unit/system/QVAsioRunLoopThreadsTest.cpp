@@ -1,6 +1,6 @@
 #include "platform/fake/QVFakeLog.h"
-#include "platform/linux/QVAsioRunLoopThreads.h"
-#include "platform/linux/QVAsioWorkQueues.h"
+#include "platform/linux/queues/QVAsioRunLoopThreads.h"
+#include "platform/linux/queues/QVAsioWorkQueues.h"
 #include "tests/unit/system/QVEvent.h"
 
 #include <array>

@@ -1,7 +1,7 @@
 #include "platform/fake/QVFakeLog.h"
-#include "platform/linux/QVAsioSerialQueue.h"
-#include "platform/linux/QVStdConditions.h"
 #include "platform/linux/QVWakeUpBatch.h"
+#include "platform/linux/queues/QVAsioSerialQueue.h"
+#include "platform/linux/queues/QVStdConditions.h"
 
 #include <chrono>
 #include <deque>

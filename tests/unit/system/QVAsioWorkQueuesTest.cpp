@@ -1,7 +1,7 @@
 #include "platform/fake/QVFakeLog.h"
-#include "platform/linux/QVAsioWorkQueues.h"
-#include "platform/linux/QVStdConditions.h"
 #include "platform/linux/QVThreads.h"
+#include "platform/linux/queues/QVAsioWorkQueues.h"
+#include "platform/linux/queues/QVStdConditions.h"
 #include "tests/unit/system/QVEvent.h"
 
 #include <array>

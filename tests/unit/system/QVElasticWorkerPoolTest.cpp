@@ -1,6 +1,6 @@
 #include "platform/fake/QVFakeLog.h"
-#include "platform/linux/QVElasticWorkerPool.h"
-#include "platform/linux/QVStdConditions.h"
+#include "platform/linux/queues/QVElasticWorkerPool.h"
+#include "platform/linux/queues/QVStdConditions.h"
 #include "tests/unit/system/QVEvent.h"
 
 #include <algorithm>

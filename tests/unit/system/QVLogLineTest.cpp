@@ -1,5 +1,5 @@
-#include "platform/linux/QVJournalLogSink.h"
-#include "platform/linux/QVLogLine.h"
+#include "platform/linux/log/QVJournalLogSink.h"
+#include "platform/linux/log/QVLogLine.h"
 
 #include <atomic>
 #include <string>

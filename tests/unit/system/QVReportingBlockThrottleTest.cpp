@@ -1,7 +1,7 @@
 #include "QVServices/Statistics/Service/QVReportingBlockThrottle.h"
 #include "platform/QVPlatform.h"
 #include "platform/fake/QVFakeLog.h"
-#include "platform/linux/QVAsioRunLoopThreads.h"
+#include "platform/linux/queues/QVAsioRunLoopThreads.h"
 #include "tests/unit/system/QVEvent.h"
 
 #include <memory>

@@ -1,5 +1,5 @@
-#include "platform/linux/QVStdCondition.h"
-#include "platform/linux/QVStdConditions.h"
+#include "platform/linux/queues/QVStdCondition.h"
+#include "platform/linux/queues/QVStdConditions.h"
 
 #include <chrono>
 #include <memory>

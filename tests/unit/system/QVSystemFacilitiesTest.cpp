@@ -1,6 +1,6 @@
-#include "platform/linux/QVLinuxProcess.h"
-#include "platform/linux/QVSDTTracePoints.h"
-#include "platform/linux/QVSystemClock.h"
+#include "platform/linux/system/QVLinuxProcess.h"
+#include "platform/linux/system/QVSDTTracePoints.h"
+#include "platform/linux/system/QVSystemClock.h"
 
 #include <array>
 #include <cstdio>

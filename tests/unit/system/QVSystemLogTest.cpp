@@ -1,7 +1,7 @@
 #include "platform/QVText.h"
 #include "platform/fake/QVFakePreferences.h"
-#include "platform/linux/QVStandardErrorLogSink.h"
-#include "platform/linux/QVSystemLog.h"
+#include "platform/linux/log/QVStandardErrorLogSink.h"
+#include "platform/linux/log/QVSystemLog.h"
 #include "tests/unit/system/QVEvent.h"
 
 #include <array>

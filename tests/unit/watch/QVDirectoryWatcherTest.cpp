@@ -1,5 +1,5 @@
 #include "platform/fake/QVFakeLog.h"
-#include "platform/linux/QVDirectoryWatcher.h"
+#include "platform/linux/watch/QVDirectoryWatcher.h"
 #include "tests/support/QVDescriptorLimit.h"
 #include "tests/support/QVTemporaryRoot.h"
 #include "tests/unit/watch/QVOccurrences.h"

@@ -1,5 +1,5 @@
 #include "platform/fake/QVFakeLog.h"
-#include "platform/linux/QVFileOrientation.h"
+#include "platform/linux/orientation/QVFileOrientation.h"
 #include "tests/support/QVFileReadings.h"
 #include "tests/support/QVTemporaryRoot.h"
 

@@ -1,5 +1,5 @@
 #include "platform/fake/QVFakeLog.h"
-#include "platform/linux/QVInotifyNotifications.h"
+#include "platform/linux/watch/QVInotifyNotifications.h"
 #include "tests/support/QVTemporaryRoot.h"
 
 #include <chrono>

@@ -1,5 +1,5 @@
 #include "platform/fake/QVFakeLog.h"
-#include "platform/linux/QVOrientationRegistrations.h"
+#include "platform/linux/orientation/QVOrientationRegistrations.h"
 
 #include <cstddef>
 #include <memory>

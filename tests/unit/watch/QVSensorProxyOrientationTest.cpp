@@ -1,7 +1,7 @@
 // The device's orientation, from a sensor daemon on a bus.
 
 #include "platform/fake/QVFakeLog.h"
-#include "platform/linux/QVLinuxOrientation.h"
+#include "platform/linux/orientation/QVLinuxOrientation.h"
 #include "tests/support/QVTemporaryRoot.h"
 #include "tests/support/QVTestBus.h"
 #include "tests/support/QVTestSensor.h"
