@@ -141,8 +141,8 @@ void QVEventRowReader::take(Kind kind, const QVStoreQuery& row, Events& events) 
     case Kind::message:
       event.session = row.integer(2);
       event.service = serviceOf(row.text(3));
-      event.category = static_cast<uint32_t>(row.integer(4));
-      event.type = static_cast<uint16_t>(row.integer(5));
+      event.category = row.numberWithin<uint32_t>(4);
+      event.type = row.numberWithin<uint16_t>(5);
       payload = 6;
       break;
     case Kind::analytics:

@@ -1,10 +1,13 @@
 #pragma once
 
+#include <concepts>
 #include <cstdint>
 #include <filesystem>
 #include <memory>
+#include <optional>
 #include <string>
 #include <string_view>
+#include <utility>
 
 struct sqlite3;
 struct sqlite3_stmt;
@@ -63,6 +66,13 @@ class QVStoreQuery {
   int64_t integer(int column) const;
   std::string_view text(int column) const;
   bool isNull(int column) const;
+  // Absent where the row has no number that one of this kind can be: another program wrote it.
+  template <std::unsigned_integral Number>
+  std::optional<Number> numberWithin(int column) const {
+    const int64_t number = integer(column);
+    if (isNull(column) || !std::in_range<Number>(number)) return std::nullopt;
+    return static_cast<Number>(number);
+  }
 
  private:
   const QVReadOnlyStore& store_;

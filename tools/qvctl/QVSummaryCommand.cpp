@@ -5,7 +5,6 @@
 #include "tools/qvctl/QVTable.h"
 #include "tools/qvctl/QVTimeText.h"
 
-#include <algorithm>
 #include <cerrno>
 #include <csignal>
 #include <string_view>
@@ -95,12 +94,10 @@ void QVSummaryCommand::show(const QVToolContext& context, const QVSummaryFile& f
   bool isLineOver = true;
   file.read([&](std::string_view part) {
     isLineOver = part.ends_with('\n');
-    while (!part.empty()) {
-      const std::size_t end = std::min(part.find('\n'), part.size());
-      output.raw(QVDisplayText(QVDisplayJSON(part.substr(0, end))));
-      if (end < part.size()) output.line("");
-      part.remove_prefix(std::min(end + 1, part.size()));
-    }
+    std::string text = QVDisplayJSON(part);
+    // Of what may stand between the words of JSON text, what overwrites a terminal's line.
+    std::erase(text, '\r');
+    output.raw(text);
   });
   if (!isLineOver) output.line("");
 }

@@ -277,6 +277,22 @@ TEST_F(QVToolEventsTest, MayHaveTheLargestNumbers) {
               ElementsAre("message", "start", "stop"));
 }
 
+TEST_F(QVToolEventsTest, HaveNoCategoryOrTypeThatNoneCanBe) {
+  fillStore();
+  endService();
+  execute(
+      "INSERT INTO beacon_message(sent_at, session_id, service_name, category, type, payload) "
+      "VALUES(1, 9, 'telephony', 99999999999, -1, '{}'), (2, 9, 'telephony', NULL, NULL, '{}'), "
+      "(3, 9, 'telephony', 3, 1, '{}')");
+  const auto events = jsonLines({"events", "--session", "9"});
+  ASSERT_EQ(events.size(), 3U);
+  for (const char* const key : {"category", "categoryName", "type", "typeName"}) {
+    for (std::size_t i = 0; i < events.size(); ++i) {
+      EXPECT_EQ(events[i].dictionary().contains(key), i == 2) << key << " of event " << i;
+    }
+  }
+}
+
 TEST_F(QVToolEventsTest, ThatWereLostMayBeMoreThanANumberHolds) {
   fillStore();
   endService();

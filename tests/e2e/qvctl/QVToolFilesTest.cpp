@@ -155,6 +155,12 @@ TEST_F(QVToolFilesTest, TakesLittleMemoryForALargeSummary) {
   EXPECT_THAT(drawn.out, HasSubstr("frames  400000 of 400000 messages, last 400000"));
 }
 
+TEST_F(QVToolFilesTest, ShowsASummaryAsItStandsButWhatOverwritesALine) {
+  const auto file = root_.path() / "file.json";
+  std::ofstream(file) << "[\r\n\t{\"name\":\t\"a\\tb\"}\r]\n";
+  EXPECT_EQ(run({"summary", "show", file}), "[\n\t{\"name\":\t\"a\\tb\"}]\n");
+}
+
 TEST_F(QVToolFilesTest, SaysThatASummaryIsBroken) {
   const auto file = root_.path() / "file.json";
   std::ofstream(file) << "[{},\n{]";
