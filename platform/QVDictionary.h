@@ -49,9 +49,9 @@ class QVDictionary {
   const QVValue* find(std::string_view key) const noexcept;
   bool contains(std::string_view key) const noexcept { return find(key) != nullptr; }
 
-  // A dictionary with these entries and, over them, those of `other`; charged as this one is, else
-  // as the other.
-  QVDictionary merging(const QVDictionary& other) const;
+  // A dictionary with these entries and, over them, those of `other`, charged as assemble() says
+  // and not as either of the two is.
+  QVDictionary merging(const QVDictionary& other, QVMemoryCharge* charge = nullptr) const;
 
   // What the memory of this dictionary is charged to; null where to nothing.
   QVMemoryCharge* charge() const noexcept;

@@ -382,7 +382,7 @@ const QVValue* QVDictionary::find(std::string_view key) const noexcept {
   return entry != end() && entry->key == key ? &entry->value : nullptr;
 }
 
-QVDictionary QVDictionary::merging(const QVDictionary& other) const {
+QVDictionary QVDictionary::merging(const QVDictionary& other, QVMemoryCharge* charge) const {
   std::vector<QVDictionaryEntry> entries;
   entries.reserve(size() + other.size());
   const auto borrow = [&entries](const QVDictionaryEntry& entry) {
@@ -391,7 +391,7 @@ QVDictionary QVDictionary::merging(const QVDictionary& other) const {
   };
   std::for_each(begin(), end(), borrow);
   std::for_each(other.begin(), other.end(), borrow);
-  return assemble(entries, charge() != nullptr ? charge() : other.charge());
+  return assemble(entries, charge);
 }
 
 QVMemoryCharge* QVDictionary::charge() const noexcept {

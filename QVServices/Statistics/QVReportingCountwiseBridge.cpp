@@ -13,6 +13,7 @@ void QVReportingCountwiseBridge::handleEvent(const QVDictionary& message, uint32
              QVReportingMessageTypeName(type)),
       [message, userInfo = session.userInfo()] {
         return message.merging(
-            {{kQVReportingHostApplicationKey, QVReportingHostApplicationID(userInfo)}});
+            {{kQVReportingHostApplicationKey, QVReportingHostApplicationID(userInfo)}},
+            message.charge());
       });
 }

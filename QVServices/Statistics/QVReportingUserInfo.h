@@ -1,8 +1,10 @@
 #pragma once
 
+#include "QVServices/Statistics/QVReportingUserInfoAccount.h"
 #include "platform/QVValue.h"
 
 #include <cstddef>
+#include <cstdint>
 #include <mutex>
 #include <utility>
 
@@ -14,6 +16,13 @@
 // whole, so a reader keeps what it got.
 class QVReportingUserInfo {
  public:
+  enum class Addition : uint8_t { done, tooLargeForOne, tooLargeForAll };
+
+  // The account outlives it and everybody who has the contents.
+  explicit QVReportingUserInfo(
+      QVReportingUserInfoAccount& account = QVReportingUserInfoAccount::shared())
+      : account_(account) {}
+
   QVDictionary contents() const {
     const std::lock_guard lock(mutex_);
     return contents_;
@@ -23,19 +32,22 @@ class QVReportingUserInfo {
   // into each start's row, so it must not be what fills the memory.
   static constexpr std::size_t kMaximumBytes = std::size_t{64} << 10;
 
-  // Adds all entries; those of keys that are there already are replaced. False, with nothing
-  // added, where the contents would become larger than kMaximumBytes.
-  [[nodiscard]] bool addEntries(const QVDictionary& entries) {
-    if (entries.empty()) return true;
-    if (entries.footprint() > kMaximumBytes) return false;
+  // Adds all entries; those of keys that are there already are replaced. Nothing is added where
+  // the contents would become larger than kMaximumBytes, or those of all sessions than the
+  // account's maximum. The entries themselves are not kept.
+  [[nodiscard]] Addition addEntries(const QVDictionary& entries) {
+    if (entries.empty()) return Addition::done;
+    if (entries.footprint() > kMaximumBytes) return Addition::tooLargeForOne;
     const std::lock_guard lock(mutex_);
-    QVDictionary merged = contents_.merging(entries);
-    if (merged.footprint() > kMaximumBytes) return false;
+    QVDictionary merged = contents_.merging(entries, &account_);
+    if (merged.footprint() > kMaximumBytes) return Addition::tooLargeForOne;
+    if (account_.isOverdrawn()) return Addition::tooLargeForAll;
     contents_ = std::move(merged);
-    return true;
+    return Addition::done;
   }
 
  private:
+  QVReportingUserInfoAccount& account_;
   mutable std::mutex mutex_;
   QVDictionary contents_;  // guarded by mutex_
 };

@@ -64,6 +64,19 @@ TEST_F(QVPeerPressureTest, APeerThatReadsNoRepliesIsNotReadEither) {
   EXPECT_TRUE(peer.awaitReply(calls).isReturn());
 }
 
+TEST_F(QVPeerPressureTest, AClientIsHeardHoweverMuchItsSessionsKeep) {
+  // Together more than the service takes in before it has got rid of some.
+  constexpr int64_t kSessions = 1'200;
+  const QVDictionary configuration{{"text", std::string(60'000, 'x')}};
+  for (int64_t reporterID = 1; reporterID <= kSessions; ++reporterID) {
+    witness_.create(reporterID);
+    witness_.configure(configuration, reporterID);
+  }
+  witness_.destroy(1);
+  EXPECT_FALSE(witness_.isValid(1));
+  EXPECT_TRUE(witness_.isValid(kSessions));
+}
+
 TEST_F(QVPeerPressureTest, APeerThatVanishesWithUnreadRepliesIsHeardToTheEnd) {
   witness_.create(7);
   witness_.start(7);

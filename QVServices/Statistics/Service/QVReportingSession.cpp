@@ -98,9 +98,20 @@ void QVReportingSession::updateDefaults(const QVDictionary& defaults) {
 }
 
 void QVReportingSession::addUserInformation(const QVDictionary& entries, const QVLogSite& site) {
-  if (userInfo_->addEntries(entries)) return;
-  log().error(scope(), site, "user information of ", reporterID_, " would be larger than ",
-              QVReportingUserInfo::kMaximumBytes, " bytes, nothing added");
+  using enum QVReportingUserInfo::Addition;
+  switch (userInfo_->addEntries(entries)) {
+    case done:
+      break;
+    case tooLargeForOne:
+      log().error(scope(), site, "user information of ", reporterID_, " would be larger than ",
+                  QVReportingUserInfo::kMaximumBytes, " bytes, nothing added");
+      break;
+    case tooLargeForAll:
+      log().error(scope(), site, "user information of all sessions would be larger than ",
+                  QVReportingUserInfoAccount::kMaximumBytes, " bytes, nothing added for ",
+                  reporterID_);
+      break;
+  }
 }
 
 void QVReportingSession::start() {

@@ -1,6 +1,8 @@
 // A session by itself: what it is made of, how it starts and stops.
 
+#include "QVServices/Statistics/QVReportingUserInfoAccount.h"
 #include "QVServices/Statistics/Service/QVReportingSession.h"
+#include "platform/fake/QVFakeMemoryCharge.h"
 #include "tests/support/QVServiceFixture.h"
 
 #include <chrono>
@@ -55,6 +57,35 @@ TEST_F(QVReportingSessionTest, TakesNoMoreUserInformationThanItsLimit) {
                               "added")));
   EXPECT_EQ(*session->userInfo().find("a"), QVValue(1));
   EXPECT_EQ(session->userInfo().size(), 2U);
+}
+
+TEST_F(QVReportingSessionTest, TakesNoUserInformationWhereAllSessionsHaveTooMuch) {
+  const auto session = makeSession();
+  QVReportingUserInfoAccount& account = QVReportingUserInfoAccount::shared();
+  account.add(QVReportingUserInfoAccount::kMaximumBytes);
+  session->setConfiguration({{"a", 1}});
+  account.remove(QVReportingUserInfoAccount::kMaximumBytes);
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(sessionLine(error, "setConfiguration:",
+                                      "user information of all sessions would be larger than "
+                                      "268435456 bytes, nothing added for 7")));
+  EXPECT_TRUE(session->userInfo().empty());
+  session->setConfiguration({{"a", 1}});
+  EXPECT_EQ(session->userInfo(), (QVDictionary{{"a", 1}}));
+}
+
+// A client is not read while too much of what it sent is on its way; what stays is not.
+TEST_F(QVReportingSessionTest, KeepsNothingOfAConfigurationThatIsCharged) {
+  const auto session = makeSession();
+  QVFakeMemoryCharge charge;
+  std::vector<QVDictionaryEntry> entries{
+      {"text", "value"}, {"array", QVArray{"a", 1}}, {"nested", QVDictionary{{"a", "b"}}}};
+  QVDictionary configuration = QVDictionary::assemble(entries, &charge);
+  entries.clear();
+  session->setConfiguration(configuration);
+  EXPECT_EQ(session->userInfo(), configuration);
+  configuration = {};
+  EXPECT_EQ(charge.held(), 0U);
 }
 
 // ---- creation and properties

@@ -158,18 +158,21 @@ TEST(QVDictionary, ChargesItsBytesUntilTheLastHandleGoes) {
   EXPECT_EQ(charge.held(), 0u);
 }
 
-TEST(QVDictionary, ChargesAMergeAsItsBaseElseAsWhatIsAdded) {
+TEST(QVDictionary, ChargesAMergeAsItIsToldAndNotAsItsParts) {
   QVFakeMemoryCharge charge;
+  QVFakeMemoryCharge other;
   {
     std::vector<QVDictionaryEntry> entries{{"a", "text"}};
     const QVDictionary base = QVDictionary::assemble(entries, &charge);
-    const QVDictionary merged = base.merging({{"b", "more"}});
-    EXPECT_EQ(merged.charge(), &charge);
-    EXPECT_EQ(charge.held(), base.footprint() + merged.footprint());
-    EXPECT_EQ((QVDictionary{{"b", 1}}).merging(base).charge(), &charge);
-    EXPECT_EQ((QVDictionary{{"b", 1}}).merging({{"c", 1}}).charge(), nullptr);
+    const QVDictionary merged = base.merging({{"b", "more"}}, &other);
+    EXPECT_EQ(merged.charge(), &other);
+    EXPECT_EQ(other.held(), merged.footprint());
+    EXPECT_EQ(charge.held(), base.footprint());
+    EXPECT_EQ(base.merging({}).charge(), nullptr);
+    EXPECT_EQ((QVDictionary{{"b", 1}}).merging(base).charge(), nullptr);
   }
   EXPECT_EQ(charge.held(), 0u);
+  EXPECT_EQ(other.held(), 0u);
 }
 
 TEST(QVDictionary, CountsItsContentsInItsFootprint) {
