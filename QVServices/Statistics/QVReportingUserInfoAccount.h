@@ -12,7 +12,8 @@
 // Threads: any. Outlives whatever is charged to it.
 class QVReportingUserInfoAccount final : public QVMemoryCharge {
  public:
-  // Bytes: of more sessions than a device has programs, each with a configuration of the usual size.
+  // Bytes: of more sessions than a device has programs, each with a configuration of the usual
+  // size.
   static constexpr std::size_t kMaximumBytes = std::size_t{256} << 20;
 
   explicit constexpr QVReportingUserInfoAccount(std::size_t maximumBytes = kMaximumBytes) noexcept

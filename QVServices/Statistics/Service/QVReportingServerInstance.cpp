@@ -27,6 +27,11 @@ const QVLogScope* scope() {
 void mark(uint32_t code) {
   QVPlatform::shared().tracePoints->mark(code);
 }
+// A step of an operation for that reporter. A client's call is answered whatever its steps throw.
+template <class Step>
+void run(const QVLogSite& site, std::string_view what, int64_t reporterID, Step&& step) noexcept {
+  QVReportingRunStep(scope(), site, what, reporterID, std::forward<Step>(step));
+}
 
 }  // namespace
 
@@ -91,16 +96,18 @@ void QVReportingServerInstance::createReportingSession(int64_t reporterID, Reply
 
 void QVReportingServerInstance::create(int64_t reporterID, Reply<bool>& reply) {
   constexpr const char* kFunction = "-[QVReportingServerInstance createReportingSession:reply:]";
-  if (clientReportingSessionMap_.size() >= kMaximumSessions &&
-      !clientReportingSessionMap_.contains(reporterID)) {
-    log().error(scope(), kFunction, "client ", processIdentifier_, " has ", kMaximumSessions,
-                " sessions, none created for reporter ", reporterID);
-  } else {
+  run(kFunction, "create the session of reporter", reporterID, [&] {
+    if (clientReportingSessionMap_.size() >= kMaximumSessions &&
+        !clientReportingSessionMap_.contains(reporterID)) {
+      log().error(scope(), kFunction, "client ", processIdentifier_, " has ", kMaximumSessions,
+                  " sessions, none created for reporter ", reporterID);
+      return;
+    }
     // A session that was there is let go, not stopped.
     clientReportingSessionMap_[reporterID] =
         QVReportingSession::initWithID(reporterID, {processIdentifier_});
     log().standard(scope(), kFunction, "session created for reporter ", reporterID);
-  }
+  });
   reply(true);
 }
 
@@ -113,11 +120,13 @@ void QVReportingServerInstance::setServiceType(uint16_t serviceType, int64_t rep
   QVReportingServer::queue().async([self = shared_from_this(), serviceType, reportingSession,
                                     reply = std::move(reply)]() mutable {
     if (reportingSession != 0) {
-      if (const auto session = self->findReportingSessionForID(reportingSession, false)) {
+      run(kFunction, "set the service type of reporter", reportingSession, [&] {
+        const auto session = self->findReportingSessionForID(reportingSession, false);
+        if (session == nullptr) return;
         session->setServiceType(serviceType);
         log().standard(scope(), kFunction, "service type ", serviceType, " set for reporter  ",
                        reportingSession);
-      }
+      });
     }
     reply(true);
   });
@@ -146,14 +155,16 @@ void QVReportingServerInstance::answerServiceType(int64_t reporterID,
 
 void QVReportingServerInstance::setConfiguration(QVDictionary configuration, int64_t forReporterID,
                                                  Reply<bool> reply) {
-  log().verbose(scope(), "-[QVReportingServerInstance setConfiguration:forReporterID:reply:]",
-                "setting configuration");
+  constexpr const char* kFunction =
+      "-[QVReportingServerInstance setConfiguration:forReporterID:reply:]";
+  log().verbose(scope(), kFunction, "setting configuration");
   QVReportingServer::queue().async([self = shared_from_this(),
                                     configuration = std::move(configuration), forReporterID,
                                     reply = std::move(reply)]() mutable {
-    if (const auto session = self->findReportingSessionForID(forReporterID, false)) {
-      session->setConfiguration(configuration);
-    }
+    run(kFunction, "configure the session of reporter", forReporterID, [&] {
+      const auto session = self->findReportingSessionForID(forReporterID, false);
+      if (session != nullptr) session->setConfiguration(configuration);
+    });
     reply(true);
   });
 }
@@ -169,14 +180,20 @@ void QVReportingServerInstance::startReportingSessionForID(int64_t reporterID, R
 }
 
 void QVReportingServerInstance::start(int64_t reporterID, Reply<bool> reply) {
+  constexpr const char* kFunction =
+      "-[QVReportingServerInstance startReportingSessionForID:reply:]";
   const auto session = reporterID == 0 ? nullptr : findReportingSessionForID(reporterID, true);
   if (session == nullptr || session->started()) {
     reply(true);
     return;
   }
-  session->start();
-  if (const auto delegate = delegate_.lock()) session->setDriverSnapShot(delegate->getSnapShot());
-  if (auto waiting = std::exchange(session->transactionCompleteBlock(), nullptr)) waiting(true);
+  run(kFunction, "start the session of reporter", reporterID, [&session] { session->start(); });
+  run(kFunction, "sample the drivers for reporter", reporterID, [this, &session] {
+    if (const auto delegate = delegate_.lock()) session->setDriverSnapShot(delegate->getSnapShot());
+  });
+  if (auto waiting = std::exchange(session->transactionCompleteBlock(), nullptr)) {
+    run(kFunction, "answer the start of reporter", reporterID, [&waiting] { waiting(true); });
+  }
   // Answered by the session's next stop, or by a later start that finds it waiting.
   session->setTransactionCompleteBlock(std::move(reply));
 }
@@ -197,18 +214,16 @@ void QVReportingServerInstance::stop(int64_t reporterID, Reply<bool>& reply) {
     reply(true);
     return;
   }
-  const auto run = [reporterID](std::string_view what, auto&& step) {
-    QVReportingRunStep(scope(), kFunction, what, reporterID, step);
-  };
   if (const auto session = findReportingSessionForID(reporterID, false)) {
-    run("send driver statistics of reporter", [&] { sendDriverStatistics(*session, kFunction); });
+    run(kFunction, "send driver statistics of reporter", reporterID,
+        [&] { sendDriverStatistics(*session, kFunction); });
     session->setDriverSnapShot(nullptr);
     session->stop();
     if (auto waiting = std::exchange(session->transactionCompleteBlock(), nullptr)) {
-      run("answer the start of reporter", [&waiting] { waiting(true); });
+      run(kFunction, "answer the start of reporter", reporterID, [&waiting] { waiting(true); });
     }
   }
-  run("log the stop of reporter",
+  run(kFunction, "log the stop of reporter", reporterID,
       [reporterID] { log().standard(scope(), kFunction, "stopping ", reporterID); });
   reply(true);
 }
@@ -248,9 +263,8 @@ void QVReportingServerInstance::destroy(int64_t reporterID, Reply<bool>& reply) 
     if (entry->second->started()) entry->second->stop();
     clientReportingSessionMap_.erase(entry);
   }
-  QVReportingRunStep(scope(), kFunction, "log the end of reporter", reporterID, [reporterID] {
-    log().standard(scope(), kFunction, "destroying ", reporterID);
-  });
+  run(kFunction, "log the end of reporter", reporterID,
+      [reporterID] { log().standard(scope(), kFunction, "destroying ", reporterID); });
   reply(true);
 }
 
@@ -265,9 +279,10 @@ void QVReportingServerInstance::reporterID(int64_t reporterID, Reply<QVDictionar
 
 void QVReportingServerInstance::answerValidity(int64_t reporterID,
                                                Reply<QVDictionary>& reply) const {
+  constexpr const char* kFunction = "-[QVReportingServerInstance reporterID:valid:]";
   const auto session = findReportingSessionForID(reporterID, true);
-  log().standard(scope(), "-[QVReportingServerInstance reporterID:valid:]", "validating reporter ",
-                 reporterID);
+  run(kFunction, "log the validation of reporter", reporterID,
+      [reporterID] { log().standard(scope(), kFunction, "validating reporter ", reporterID); });
   reply({{"reporterID", session ? reporterID : int64_t{0}},
          {"serviceType", session ? session->serviceType() : kQVReportingServiceTypeUnknown}});
 }

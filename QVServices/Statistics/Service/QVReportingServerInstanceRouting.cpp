@@ -4,6 +4,7 @@
 #include "QVServices/Statistics/QVReportingJoulewellUtility.h"
 #include "QVServices/Statistics/QVReportingVocabulary.h"
 #include "QVServices/Statistics/Service/QVReportingPayloads.h"
+#include "QVServices/Statistics/Service/QVReportingRunStep.h"
 #include "QVServices/Statistics/Service/QVReportingServer.h"
 #include "QVServices/Statistics/Service/QVReportingServerInstance.h"
 #include "platform/QVPlatform.h"
@@ -29,11 +30,12 @@ const QVLogScope* scope() {
   return QVReportingServer::logScope();
 }
 
-// "[1,2]", or "(null)" where the client listed none.
+// "[1,2]", or "(null)" where the client listed none; no longer than the log takes.
 std::string textOf(const QVReportingServiceProtocol::ReporterIDs& reporterIDs) {
   if (!reporterIDs) return "(null)";
   std::string text = "[";
   for (const int64_t reporterID : *reporterIDs) {
+    if (text.size() > QVLog::kMaximumTextBytes) break;
     if (text.size() > 1) text += ',';
     QVAppendText(text, reporterID);
   }
@@ -51,10 +53,24 @@ std::string textOf(const Sessions& sessions) {
   return text += ']';
 }
 
+// What one of the message's ways throws keeps it from none of the others.
+template <class Step>
+void run(std::string_view what, int64_t number, Step&& step) noexcept {
+  QVReportingRunStep(scope(), kFunction, what, number, std::forward<Step>(step));
+}
+
 void handToSinks(const QVDictionary& message, uint32_t category, uint16_t type,
                  const QVReportingSession& session) {
-  QVReportingCountwiseBridge::handleEvent(message, category, type, session);
-  QVReportingJoulewellUtility::handleEvent(message, category, type, session);
+  run("make an analytics event for reporter", session.reporterID(),
+      [&] { QVReportingCountwiseBridge::handleEvent(message, category, type, session); });
+  run("make a power-log event for reporter", session.reporterID(),
+      [&] { QVReportingJoulewellUtility::handleEvent(message, category, type, session); });
+}
+
+void sendTo(QVReportingSession& session, const QVDictionary& message, const QVDictionary& payload,
+            uint32_t category, uint16_t type) {
+  run("send a message of reporter", session.reporterID(),
+      [&] { session.sendMessage(message, payload, category, type); });
 }
 
 }  // namespace
@@ -81,11 +97,13 @@ void QVReportingServerInstance::route(const QVDictionary& message, uint32_t cate
     reply(QVError{kErrorDomain, kErrorSwitchedOff, {}});
     return;
   }
-  if (reporterIDs) {
-    routeToListed(message, category, type, *reporterIDs);
-  } else {
-    routeToAllStarted(message, category, type, *delegate);
-  }
+  run("route a message of client", processIdentifier_, [&] {
+    if (reporterIDs) {
+      routeToListed(message, category, type, *reporterIDs);
+    } else {
+      routeToAllStarted(message, category, type, *delegate);
+    }
+  });
   reply(std::nullopt);
 }
 
@@ -95,12 +113,14 @@ void QVReportingServerInstance::routeToListed(const QVDictionary& message, uint3
   const QVDictionary payload = QVReportingNormalisedPayload(message);
   for (const int64_t reporterID : reporterIDs) {
     if (reporterID == 0) continue;
-    const auto session = findReportingSessionForID(reporterID, true);
-    if (session == nullptr) continue;
-    // Here the sinks come first, on the broadcast path the session does; readers of the event
-    // stores rely on both orders.
-    handToSinks(message, category, type, *session);
-    session->sendMessage(message, payload, category, type);
+    run("find the session of reporter", reporterID, [&] {
+      const auto session = findReportingSessionForID(reporterID, true);
+      if (session == nullptr) return;
+      // Here the sinks come first, on the broadcast path the session does; readers of the event
+      // stores rely on both orders.
+      handToSinks(message, category, type, *session);
+      sendTo(*session, message, payload, category, type);
+    });
   }
 }
 
@@ -114,20 +134,27 @@ void QVReportingServerInstance::routeToAllStarted(
       all.push_back(session);
       if (session->started()) active.push_back(session);
     }
-    log().standard(scope(), kFunction, "sessions for client ", client->processIdentifier(), " : ",
-                   textOf(all));
+    run("log the sessions of client", client->processIdentifier(), [&] {
+      log().standard(scope(), kFunction, "sessions for client ", client->processIdentifier(), " : ",
+                     textOf(all));
+    });
   }
-  log().standard(scope(), kFunction, "active reporting sessions ", active.size(), " : ",
-                 textOf(active));
+  run("log the active sessions for client", processIdentifier_, [&active] {
+    log().standard(scope(), kFunction, "active reporting sessions ", active.size(), " : ",
+                   textOf(active));
+  });
   if (active.empty()) {
-    log().standard(scope(), kFunction, "no active reporting sessions found, sending as standalone");
+    run("log a message of no session of client", processIdentifier_, [] {
+      log().standard(scope(), kFunction,
+                     "no active reporting sessions found, sending as standalone");
+    });
     QVReportingSession::sendSingleMessage(
         message, category, type, kQVReportingServiceTypeStandalone, delegate.getDefaults(), {});
     return;
   }
   const QVDictionary payload = QVReportingNormalisedPayload(message);
   for (const auto& session : active) {
-    session->sendMessage(message, payload, category, type);
+    sendTo(*session, message, payload, category, type);
     handToSinks(message, category, type, *session);
   }
 }
