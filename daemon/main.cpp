@@ -1,5 +1,6 @@
 // The composition root: makes the adapters, gives them to the core, and runs the service.
 
+#include "QVServices/Statistics/Service/QVReportingServer.h"
 #include "QVServices/Statistics/Service/QVReportingServiceMain.h"
 #include "platform/QVPlatform.h"
 #include "platform/linux/bus/QVBusListener.h"
@@ -34,7 +35,9 @@
 #include <mutex>
 #include <stop_token>
 #include <string>
+#include <system_error>
 #include <thread>
+#include <utility>
 
 #include <malloc.h>
 #include <sys/stat.h>
@@ -53,13 +56,19 @@ constexpr std::chrono::seconds kLastBackendWait{3};
 
 void runDry(QVStdConditions& conditions, QVAsioWorkQueues& queues, QVSQLiteEventStore& store) {
   {
-    const std::jthread cutter([&conditions](const std::stop_token& drained) {
-      std::mutex mutex;
-      std::condition_variable_any condition;
-      std::unique_lock lock(mutex);
-      condition.wait_for(lock, drained, kLastBackendWait, [] { return false; });
-      if (!drained.stop_requested()) conditions.cutWaitsShort();
-    });
+    std::jthread cutter;
+    try {
+      cutter = std::jthread([&conditions](const std::stop_token& drained) {
+        std::mutex mutex;
+        std::condition_variable_any condition;
+        std::unique_lock lock(mutex);
+        condition.wait_for(lock, drained, kLastBackendWait, [] { return false; });
+        if (!drained.stop_requested()) conditions.cutWaitsShort();
+      });
+    } catch (const std::system_error&) {
+      // No thread is to be had: better they wait less than the end for ever.
+      conditions.cutWaitsShort();
+    }
     queues.drain();
   }
   store.close();
@@ -139,6 +148,8 @@ int runService() {
   std::string error;
   platform.listener = QVBusListener::create(
       {.socketPath = directories.socket().string(),
+       .afterCalls =
+           [](QVFunction<void()> work) { QVReportingServer::queue().async(std::move(work)); },
        .drain = [&conditions, &queues, &store] { runDry(conditions, queues, *store); }},
       error);
   if (platform.listener == nullptr) return giveUp(log, error);

@@ -88,8 +88,9 @@ def adapter(name, others=(), libraries=(), shared=_SHARED):
 # The first folder that a file lies in, or the file itself, decides.
 LAYERS = [
     Layer("platform/fake", [_PLATFORM, r"platform/fake/\w+\.h"]),
-    # These two go into the client without the rest of the adapters.
-    adapter("bus", libraries=["Asio", "libsystemd"], shared=_SHARED_WITHOUT_SOURCE),
+    # Their code goes into the client without the rest of the adapters, but for the sockets.
+    adapter("bus", libraries=["Asio", "libsystemd"],
+            shared=r"platform/linux/(QVDescriptor|QVLogException|QVThreadAnnotations|QVWakeUpBatch)\.h"),
     adapter("files", libraries=["RapidJSON"], shared=_SHARED_WITHOUT_SOURCE),
     adapter("log", ["bus"], libraries=["libsystemd"]),
     adapter("orientation", ["files", "watch"], libraries=["libsystemd"]),

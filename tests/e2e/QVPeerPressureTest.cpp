@@ -5,6 +5,7 @@
 
 #include <deque>
 #include <filesystem>
+#include <fstream>
 
 #include <gmock/gmock.h>
 #include <sys/resource.h>
@@ -15,14 +16,15 @@ using ::testing::ElementsAre;
 
 class QVPeerPressureTest : public QVEndToEndTest {
  protected:
-  // From now on the service gets no descriptor but those it has.
+  // From now on clients get no descriptors of the service's but those it has: a quarter of those
+  // that it may have it keeps for itself.
   void useUpDescriptors() {
     const std::string folder = "/proc/" + std::to_string(service().pid()) + "/fd/";
     rlim_t lowestFree = 0;
     while (std::filesystem::is_symlink(folder + std::to_string(lowestFree))) ++lowestFree;
     rlimit limits{};
     ASSERT_EQ(::prlimit(service().pid(), RLIMIT_NOFILE, nullptr, &limits), 0);
-    limits.rlim_cur = lowestFree;
+    limits.rlim_cur = lowestFree + lowestFree / 3;
     ASSERT_EQ(::prlimit(service().pid(), RLIMIT_NOFILE, &limits, nullptr), 0);
   }
 
@@ -161,6 +163,17 @@ TEST_F(QVPeerPressureTest, ClientsWaitWhileDescriptorsAreUsedUp) {
   EXPECT_TRUE(waiting.receiveLine().starts_with("OK "));
   EXPECT_TRUE(waiting.awaitReply(1).boolean());
   EXPECT_EQ(log().count("cannot accept a connection"), 1U);
+}
+
+TEST_F(QVPeerPressureTest, ReportingStaysSwitchedOffHoweverManyClientsConnect) {
+  root_.configure("preferences/net.quillon.quietvox.json", R"({"disable_reporting": true})");
+  useUpDescriptors();
+  const QVRawPeer waiting(root_.socket(), QVRawPeer::Opening::silent);
+  expectLogged("cannot accept a connection");
+  std::ofstream(root_.runtime() / "notify/net.quillon.quietvox.reporting").flush();
+  expectLogged("defaults {\"disable_reporting\":true}");
+  EXPECT_EQ(witness_.call(sendToAllCall({{"a", 1}}, kSessionPlayback, kStart)).errorName,
+            "net.quillon.audio.reporting.Code1");
 }
 
 // More than the service holds of what it took in: it stops reading until the store has caught up.

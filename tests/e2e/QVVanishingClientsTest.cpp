@@ -38,6 +38,22 @@ class QVVanishingClientsTest : public QVEndToEndTest {
   }
 };
 
+// Each has told how long it was there, although it was gone before it was looked at.
+TEST_F(QVVanishingClientsTest, TellTheirUptime) {
+  constexpr std::size_t kClients = 50;
+  startService({});
+  for (std::size_t i = 0; i < kClients; ++i) startAndVanish();
+  expectLogged("dealloc ", kClients);
+  EXPECT_EQ(log().count("clientStartDate is nil"), 0U);
+  EXPECT_EQ(log().count("clientProcessName is nil"), 0U);
+  endService();
+  EXPECT_EQ(store()
+                .rows("SELECT id FROM countwise_event "
+                      "WHERE name = 'net.quillon.quietvox.qvreportingclientuptime'")
+                .size(),
+            kClients);
+}
+
 TEST_F(QVVanishingClientsTest, LeaveNothing) {
   auto witness = connectClient();
   vanishInRounds(0, kFirstRounds);

@@ -38,7 +38,7 @@ void run(const QVLogSite& site, std::string_view what, int64_t reporterID, Step&
 std::shared_ptr<QVReportingServerInstance> QVReportingServerInstance::initWithPID(
     int32_t pid, std::weak_ptr<QVReportingServiceDelegateProtocol> delegate) {
   log().standard(scope(), "-[QVReportingServerInstance initWithPID:delegate:]",
-                 "new client with pid ", pid);
+                 "new client with pid ", static_cast<uint64_t>(int64_t{pid}));
   return std::shared_ptr<QVReportingServerInstance>(
       new QVReportingServerInstance(pid, std::move(delegate)));
 }
@@ -306,6 +306,8 @@ void QVReportingServerInstance::answerAllReporters(Reply<std::vector<int64_t>>& 
 }
 
 void QVReportingServerInstance::killService([[maybe_unused]] Reply<bool> reply) {
+  // The log drops lines while it is full: this one finds room.
+  log().flush();
   log().standard(scope(), "-[QVReportingServerInstance killService:]", "DESTROYING SERVICE");
   log().flush();
   QVPlatform::shared().process->exitImmediately(kKilledStatus);

@@ -106,10 +106,11 @@ QVDictionary QVReportingServiceDelegate::QVReportingDefaults() {
   std::vector<QVDictionaryEntry> defaults;
   const auto deviceName = QVPreferences::stringReading(values.find(kDeviceName));
   if (deviceName) defaults.push_back({kDeviceName, *deviceName});
+  // Anything that is there is a value, a null included; what is no truth is false.
   const QVValue* disabled = values.find(kDisableReporting);
-  const bool hasValue = disabled != nullptr && !disabled->isAbsent();
-  defaults.push_back({kDisableReporting,
-                      hasValue ? QVValue(QVPreferences::booleanReading(disabled)) : QVValue(0)});
+  defaults.push_back({kDisableReporting, disabled != nullptr
+                                             ? QVValue(QVPreferences::booleanReading(disabled))
+                                             : QVValue(0)});
   return QVDictionary::assemble(defaults);
 }
 

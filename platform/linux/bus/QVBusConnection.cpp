@@ -1,6 +1,7 @@
 #include "platform/linux/bus/QVBusConnection.h"
 
 #include "platform/QVPlatform.h"
+#include "platform/linux/QVLogException.h"
 #include "platform/linux/QVWakeUpBatch.h"
 #include "platform/linux/bus/QVBusLoop.h"
 #include "platform/linux/bus/QVBusServer.h"
@@ -60,11 +61,33 @@ void QVBusConnection::resume() {
   state_ = State::authenticating;
   authentication_ = std::make_unique<QVBusAuthServer>(peer_.userID, server_.identifier());
   outbox_ = std::make_shared<QVBusOutbox>([&loop = server_.loop(), weak = weak_from_this()] {
-    loop.post([weak] {
-      if (const auto self = weak.lock()) self->onWake();
-    });
+    loop.post([weak] { take(weak, &QVBusConnection::onWake); });
   });
   continueReading();
+}
+
+// Whatever the work throws is one line in the log.
+template <class Work>
+void QVBusConnection::attempt(const QVLogSite& site, Work&& work) const noexcept {
+  try {
+    work();
+  } catch (...) {
+    QVLogException(*QVPlatform::shared().log, site, "the connection of process",
+                   std::to_string(peer_.processIdentifier));
+  }
+}
+
+void QVBusConnection::take(const std::weak_ptr<QVBusConnection>& connection, Step step) noexcept {
+  const auto self = connection.lock();
+  if (self == nullptr) return;
+  self->attempt("-[QVBusConnection take:]", [&self, step] {
+    try {
+      (*self.*step)();
+    } catch (...) {
+      self->invalidate();
+      throw;
+    }
+  });
 }
 
 // ---- Reading
@@ -75,9 +98,7 @@ void QVBusConnection::continueReading() {
   if (unwritten() > kMostUnwritten) return;
   if (!isAdmitted()) return;
   waitsToRead_ = true;
-  socket_.waitReadable([weak = weak_from_this()] {
-    if (const auto self = weak.lock()) self->onReadable();
-  });
+  socket_.waitReadable([weak = weak_from_this()] { take(weak, &QVBusConnection::onReadable); });
 }
 
 // If the intake budget does not admit the connection, sees to it that it goes on later.
@@ -88,15 +109,16 @@ bool QVBusConnection::isAdmitted() {
   server_.resumeWhenAdmitted(*this);
   if (!waitsForHangUp_) {
     waitsForHangUp_ = true;
-    socket_.waitHangUp([weak = weak_from_this()] {
-      const auto self = weak.lock();
-      // The wait ends on urgent data, too, which a peer that is there can send at will.
-      if (self == nullptr || !self->socket_.hasHungUp()) return;
-      self->hungUp_ = true;
-      self->continueReading();
-    });
+    socket_.waitHangUp([weak = weak_from_this()] { take(weak, &QVBusConnection::onError); });
   }
   return false;
+}
+
+void QVBusConnection::onError() {
+  // The wait ends on urgent data, too, which a peer that is there can send at will.
+  if (!socket_.hasHungUp()) return;
+  hungUp_ = true;
+  continueReading();
 }
 
 void QVBusConnection::onReadable() {
@@ -213,6 +235,11 @@ void QVBusConnection::onWake() {
   continueReading();
 }
 
+void QVBusConnection::onWritable() {
+  waitsToWrite_ = false;
+  onWake();
+}
+
 void QVBusConnection::writeAnswers() {
   if (state_ != State::closed && outbox_->hasOverflowed()) {
     violated("more than 16 MiB of answers wait for a peer that does not read them");
@@ -231,12 +258,8 @@ void QVBusConnection::flush() {
     switch (written.status) {
       case QVBusSocket::Status::wouldBlock:
         waitsToWrite_ = true;
-        socket_.waitWritable([weak = weak_from_this()] {
-          if (const auto self = weak.lock()) {
-            self->waitsToWrite_ = false;
-            self->onWake();
-          }
-        });
+        socket_.waitWritable(
+            [weak = weak_from_this()] { take(weak, &QVBusConnection::onWritable); });
         return;
       case QVBusSocket::Status::failed:
         // The peer is gone; what it sent before may still be there to be read, and then the end.
@@ -264,7 +287,9 @@ void QVBusConnection::violated(const char* reason) {
                                   "protocol violation, closing the connection of process ",
                                   peer_.processIdentifier, ": ", reason);
   close();
-  if (interruptionHandler_) interruptionHandler_();
+  attempt("-[QVBusConnection violated:]", [this] {
+    if (interruptionHandler_) interruptionHandler_();
+  });
   end();
 }
 
@@ -287,9 +312,16 @@ void QVBusConnection::close() {
   server_.forget(*this);
 }
 
+// Behind what the peer asked for, its registration first of all.
 void QVBusConnection::end() {
-  if (invalidationHandler_) invalidationHandler_();
+  server_.runAfterCalls([self = shared_from_this()] { self->tellTheEnd(); });
+}
+
+void QVBusConnection::tellTheEnd() {
+  attempt("-[QVBusConnection invalidate]", [this] {
+    if (invalidationHandler_) invalidationHandler_();
+  });
   interruptionHandler_ = nullptr;
   invalidationHandler_ = nullptr;
-  exportedObject_.reset();
+  server_.letGoAfterCalls(std::move(exportedObject_));
 }

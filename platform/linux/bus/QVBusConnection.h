@@ -1,6 +1,7 @@
 #pragma once
 
 #include "platform/QVIPC.h"
+#include "platform/QVLog.h"
 #include "platform/linux/bus/QVBusAuthServer.h"
 #include "platform/linux/bus/QVBusFrameDecoder.h"
 #include "platform/linux/bus/QVBusMessage.h"
@@ -24,10 +25,12 @@ class QVBusServer;
 //
 // It closes when the stream ends, when the peer breaks a rule of the protocol (one line in the log
 // says which) and when the service ends. What came in whole before the stream's end is delivered
-// first.
+// and carried out first; then the invalidation handler runs. Whatever a step throws, want of memory
+// above all, is one line in the log and the end of this connection alone.
 //
 // Threads: the loop's thread only; replies come from any thread, through the outbox.
-// Ownership: the server holds it until it is closed; waits and wakes hold it weakly.
+// Ownership: the server holds it until it is closed, then what is left to be carried out does;
+// waits and wakes hold it weakly.
 // Limits: not read while more than 1 MiB waits to be written to its peer, nor while the intake
 // budget does not admit it, unless the peer has gone and only the rest is left. An idle connection
 // holds no buffer of more than 4 KiB.
@@ -50,7 +53,8 @@ class QVBusConnection final : public QVIPCConnection,
 
   // Takes in what the peer has sent so far, before the service ends.
   void readToTheEnd();
-  // Closes, runs the invalidation handler, lets go of the exported object. May be called again.
+  // Closes; behind the calls that came before, runs the invalidation handler and lets go of the
+  // exported object. May be called again.
   void invalidate();
   // Reads on where nothing is in the way; called again whenever something no longer is.
   void continueReading();
@@ -59,8 +63,16 @@ class QVBusConnection final : public QVIPCConnection,
  private:
   enum class State { accepted, authenticating, open, closed };
 
+  // What waits and wakes call: the step, as long as the connection is there.
+  using Step = void (QVBusConnection::*)();
+  static void take(const std::weak_ptr<QVBusConnection>& connection, Step step) noexcept;
+  template <class Work>
+  void attempt(const QVLogSite& site, Work&& work) const noexcept;
+
   bool isAdmitted();
   void onReadable();
+  void onWritable();
+  void onError();
   void onWake();
   // Answer how many whole messages the bytes completed.
   std::size_t takeBytesSafely(std::string_view bytes);
@@ -70,6 +82,7 @@ class QVBusConnection final : public QVIPCConnection,
   void violated(const char* reason);
   void close();
   void end();
+  void tellTheEnd();
   void writeAnswers();
   void flush();
   void chargeHeldBytes();

@@ -1,6 +1,7 @@
 #include "platform/linux/bus/QVBusListener.h"
 
 #include "platform/QVPlatform.h"
+#include "platform/linux/QVLogException.h"
 #include "platform/linux/bus/QVBusConnection.h"
 #include "platform/linux/bus/QVBusListeningSocket.h"
 #include "platform/linux/bus/QVBusLoop.h"
@@ -76,6 +77,7 @@ void QVBusListener::resume() {
     if (!error) inside_->loop.stop();
   });
   inside_->server.setClosedHandler([this] { acceptWhenReadable(); });
+  inside_->server.setAfterCalls(std::move(inside_->options.afterCalls));
   // From here on they end the service in good order; before, the composition root holds them back.
   sigset_t ends;
   ::sigemptyset(&ends);
@@ -95,6 +97,7 @@ void QVBusListener::endService() {
   ::sd_notify(0, "STOPPING=1");
   inside_->server.readToTheEnd();
   inside_->server.invalidateAll();
+  inside_->server.awaitCalls();
   if (inside_->options.drain) inside_->options.drain();
 }
 
@@ -123,11 +126,22 @@ void QVBusListener::acceptAll() {
       break;
     }
     inside_->outOfDescriptors = false;
-    const auto connection = inside_->server.adopt(descriptor);
-    const auto delegate = inside_->delegate.lock();
-    if (delegate == nullptr || !delegate->listener(*this, connection)) connection->invalidate();
+    serve(descriptor);
   }
   acceptWhenReadable();
+}
+
+// What the set-up throws, want of memory above all, is the end of this connection alone.
+void QVBusListener::serve(int descriptor) noexcept {
+  std::shared_ptr<QVBusConnection> connection;
+  try {
+    connection = inside_->server.adopt(descriptor);
+    const auto delegate = inside_->delegate.lock();
+    if (delegate != nullptr && delegate->listener(*this, connection)) return;
+  } catch (...) {
+    QVLogException(*QVPlatform::shared().log, "-[QVBusListener serve:]", "a new connection");
+  }
+  if (connection != nullptr) connection->invalidate();
 }
 
 // The client that waits would be announced again and again: so nothing is accepted until a

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "platform/QVFunction.h"
 #include "platform/QVIPC.h"
 
 #include <functional>
@@ -10,23 +11,28 @@
 struct QVBusListenerOptions {
   // Of the listening socket, where the service manager hands none over.
   std::string socketPath;
+  // Has something run behind all that exported objects have been asked to do so far, where they do
+  // it: on any thread. A connection's invalidation handler waits for that. Absent: they have done
+  // it when they return.
+  QVFunction<void(QVFunction<void()>)> afterCalls{};
   // Runs in resume() after the last connection has been invalidated: waits until all work of the
   // service is done and stored.
-  std::function<void()> drain;
+  std::function<void()> drain{};
 };
 
 // The listener of the on-demand service, over a unix socket: accepts, serves, and ends in good
 // order on SIGTERM and SIGINT.
 //
 // The end: accept no more, tell the service manager, take in what clients have sent so far,
-// invalidate every connection, drain; then resume() returns.
+// invalidate every connection, drain; then resume() returns. No exception of what it calls ends it.
 //
 // Threads: create(), setDelegate() and resume() on one thread, which resume() makes the IPC thread.
 // Process-wide effects of resume(): SIGPIPE is ignored, SIGTERM and SIGINT are caught
 // and, where they were blocked, unblocked; readiness
 // and end are told to the service manager.
-// Limits: as many connections as the process may have descriptors; when they run out, one line is
-// logged and the next clients wait until a connection closes.
+// Limits: as many connections as the process may have descriptors, less a few that stay for files
+// (QVBusSocket::kReservedDescriptors); when they run out, one line is logged and the next clients
+// wait until a connection closes.
 class QVBusListener final : public QVIPCListener {
  public:
   // Opens the socket; clients may connect from here on and are answered once resume() runs. Null
@@ -43,6 +49,7 @@ class QVBusListener final : public QVIPCListener {
 
   void acceptWhenReadable();
   void acceptAll();
+  void serve(int descriptor) noexcept;
   void acceptLater(int error);
   void endService();
 

@@ -6,6 +6,7 @@
 #include "platform/linux/bus/QVBusLoop.h"
 
 #include <array>
+#include <chrono>
 #include <random>
 #include <utility>
 
@@ -31,6 +32,8 @@ QVBusServer::QVBusServer(QVBusLoop& loop, std::size_t intakeBound)
 QVBusServer::~QVBusServer() {
   budget_->setWake(nullptr);
   closedHandler_ = nullptr;
+  // Nobody runs the loop any more.
+  afterCalls_ = nullptr;
   invalidateAll();
 }
 
@@ -59,6 +62,28 @@ void QVBusServer::invalidateAll() {
 void QVBusServer::forget(const QVBusConnection& connection) {
   connections_.erase(connection.number());
   if (closedHandler_) closedHandler_();
+}
+
+void QVBusServer::runAfterCalls(QVFunction<void()> work) {
+  if (!afterCalls_) {
+    work();
+    return;
+  }
+  ++waitingForCalls_;
+  afterCalls_([this, work = std::move(work)]() mutable {
+    loop_.post([this, work = std::move(work)]() mutable {
+      --waitingForCalls_;
+      work();
+    });
+  });
+}
+
+void QVBusServer::letGoAfterCalls(std::shared_ptr<QVReportingServiceProtocol> object) {
+  if (afterCalls_ && object != nullptr) afterCalls_([object = std::move(object)] {});
+}
+
+void QVBusServer::awaitCalls() {
+  while (waitingForCalls_ > 0) loop_.runOne(std::chrono::hours(1));
 }
 
 void QVBusServer::resumeWhenAdmitted(const QVBusConnection& connection) {

@@ -37,6 +37,12 @@ class QVBusServer {
   std::size_t connections() const noexcept { return connections_.size(); }
   // Is called after each close of a connection; its descriptor is free by then.
   void setClosedHandler(QVFunction<void()> handler) { closedHandler_ = std::move(handler); }
+  // Says how to have something run behind all that exported objects have been asked to do so far.
+  // Without it, they have always done it when they return.
+  using AfterCalls = QVFunction<void(QVFunction<void()>)>;
+  void setAfterCalls(AfterCalls afterCalls) { afterCalls_ = std::move(afterCalls); }
+  // Runs the loop until no work waits for calls any more.
+  void awaitCalls();
 
   // The rest is for connections.
   QVBusLoop& loop() noexcept { return loop_; }
@@ -49,6 +55,11 @@ class QVBusServer {
   void forget(const QVBusConnection& connection);
   // Calls continueReading() again when the budget admits more.
   void resumeWhenAdmitted(const QVBusConnection& connection);
+  // Runs the work here, behind what exported objects have been asked to do so far.
+  void runAfterCalls(QVFunction<void()> work);
+  // Lets go of an exported object where its calls are carried out, and behind them: with it goes
+  // what belongs to that thread.
+  void letGoAfterCalls(std::shared_ptr<QVReportingServiceProtocol> object);
 
  private:
   // Bytes of one read: some hundred messages of usual size, and the kernel's buffer holds little
@@ -66,4 +77,6 @@ class QVBusServer {
   std::unordered_set<uint64_t> notAdmitted_;
   uint64_t lastNumber_ = 0;
   QVFunction<void()> closedHandler_;
+  AfterCalls afterCalls_;
+  std::size_t waitingForCalls_ = 0;  // pieces of work
 };

@@ -2,12 +2,15 @@
 
 #include "platform/linux/bus/QVBusLoop.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <utility>
 
 #include <asio/io_context.hpp>
 #include <asio/posix/stream_descriptor.hpp>
+#include <fcntl.h>
 #include <poll.h>
+#include <sys/resource.h>
 #include <sys/socket.h>
 #include <unistd.h>
 
@@ -23,6 +26,18 @@ QVBusSocket::Result resultOf(ssize_t bytes, QVBusSocket::Status onZero) {
   if (bytes == 0) return {onZero, 0};
   const bool later = errno == EAGAIN || errno == EWOULDBLOCK || errno == EINTR;
   return {later ? Status::wouldBlock : Status::failed, 0};
+}
+
+// Is one left besides the reserved ones? `descriptor` is any open one.
+bool hasDescriptorForClient(int descriptor) {
+  rlimit limit{};
+  if (::getrlimit(RLIMIT_NOFILE, &limit) != 0) return true;
+  // The kernel gives the lowest that is free: the rest of those that are lie above it.
+  const int lowest = ::fcntl(descriptor, F_DUPFD_CLOEXEC, 0);
+  if (lowest < 0) return false;
+  ::close(lowest);
+  const auto reserved = std::min<rlim_t>(QVBusSocket::kReservedDescriptors, limit.rlim_cur / 4);
+  return static_cast<rlim_t>(lowest) < limit.rlim_cur - reserved;
 }
 
 }  // namespace
@@ -54,11 +69,14 @@ QVBusSocket::Result QVBusSocket::send(std::string_view bytes) {
 }
 
 int QVBusSocket::accept() {
-  const int accepted = ::accept4(descriptor(), nullptr, nullptr, SOCK_NONBLOCK | SOCK_CLOEXEC);
-  if (accepted >= 0) return accepted;
-  const int error = errno;
-  // The kernel looks for a free descriptor before it looks for a client, so without one it
-  // complains where nobody waits, too.
+  int error = EMFILE;
+  if (hasDescriptorForClient(descriptor())) {
+    const int accepted = ::accept4(descriptor(), nullptr, nullptr, SOCK_NONBLOCK | SOCK_CLOEXEC);
+    if (accepted >= 0) return accepted;
+    error = errno;
+  }
+  // Both look for a free descriptor before they look for a client, and so complain where nobody
+  // waits, too.
   pollfd waiting{descriptor(), POLLIN, 0};
   const bool outOfDescriptors = error == EMFILE || error == ENFILE;
   return outOfDescriptors && ::poll(&waiting, 1, 0) == 0 ? -EAGAIN : -error;

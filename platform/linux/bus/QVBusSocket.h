@@ -32,8 +32,12 @@ class QVBusSocket {
   Result receive(std::span<char> buffer);
   // One write of what goes out. Raises no signal.
   Result send(std::string_view bytes);
-  // A new connection of a listening socket: its descriptor, or minus the error's number.
+  // A new connection of a listening socket: its descriptor, or minus the error's number; EMFILE
+  // where a client waits and only the reserved descriptors are left.
   int accept();
+  // Descriptors that clients cannot use up: without one, preferences could not be read, nor the
+  // store opened, nor a session's file written. A quarter of a limit that is small.
+  static constexpr unsigned kReservedDescriptors = 32;
 
   // Calls the handler once, on the loop, when there is something to read (to write), an error
   // included; never after close(). One wait of each kind at a time.

@@ -6,6 +6,7 @@
 #include "platform/linux/queues/QVConcurrentQueue.h"
 
 #include <algorithm>
+#include <chrono>
 #include <string>
 #include <thread>
 
@@ -17,6 +18,9 @@ namespace {
 constexpr std::size_t kKeptItems = 256;
 
 constexpr std::string_view kBackgroundLabel = "background";
+
+// At the end, between looks for work that has no worker.
+constexpr std::chrono::milliseconds kLookForWorkers{50};
 
 // One runs, one more goes on where that one waits for something that is not a condition.
 QVElasticWorkerPool::Limits defaultLimits() {
@@ -76,7 +80,12 @@ std::shared_ptr<QVWorkQueue> QVAsioWorkQueues::backgroundQueue() {
 
 void QVAsioWorkQueues::drain() {
   timers_.hurry();
-  ledger_.waitUntilEmpty();
+  // Nobody submits any more who would have workers made that could not be made before.
+  while (!ledger_.waitUntilEmpty(kLookForWorkers)) {
+    for (QVElasticWorkerPool* const pool : {&standardPool_, &utilityPool_, &backgroundPool_}) {
+      pool->runUnattended();
+    }
+  }
   std::vector<QVWorkExecutor*> executors{&standardPool_, &utilityPool_, &backgroundPool_};
   {
     const QVMutexLock lock(mutex_);

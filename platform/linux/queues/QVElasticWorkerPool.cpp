@@ -35,6 +35,15 @@ bool QVElasticWorkerPool::submit(QVWorkItem& task) {
   return true;
 }
 
+void QVElasticWorkerPool::runUnattended() {
+  QVMutexLock lock(mutex_);
+  while (!ready_.empty()) {
+    sendForWorker();
+    if (workerCount_ > 0) return;
+    runFirst(lock);
+  }
+}
+
 void QVElasticWorkerPool::willBlock() {
   const QVMutexLock lock(mutex_);
   ++blockedCount_;
@@ -89,19 +98,22 @@ void QVElasticWorkerPool::work() {
   QVMutexLock lock(mutex_);
   workerIsComing_ = false;
   do {
-    while (!ready_.empty()) {
-      QVWorkItem task = std::move(ready_.front());
-      ready_.pop_front();
-      if (!ready_.empty()) sendForWorker();
-      lock.unlock();
-      QVRunWorkItem(task, name_, log_);
-      ledger_.leave();
-      lock.lock();
-    }
+    while (!ready_.empty()) runFirst(lock);
   } while (rest(lock));
   std::thread previous = retire();
   lock.unlock();
   if (previous.joinable()) previous.join();
+}
+
+// Runs the task that has waited longest, without the lock.
+void QVElasticWorkerPool::runFirst(QVMutexLock& lock) {
+  QVWorkItem task = std::move(ready_.front());
+  ready_.pop_front();
+  if (!ready_.empty()) sendForWorker();
+  lock.unlock();
+  QVRunWorkItem(task, name_, log_);
+  ledger_.leave();
+  lock.lock();
 }
 
 // Waits to be wanted; false where the worker is not needed any more.

@@ -24,8 +24,8 @@
 // and those that may retire once a second.)
 //
 // Used by QVAsioWorkQueues, one pool per quality of service. Threads: as QVWorkExecutor.
-// Failures: where no thread can be had, tasks wait for the next submission or a free worker; one
-// error line says so for as long as it lasts.
+// Failures: where no thread can be had, tasks wait for the next submission or a free worker, or for
+// runUnattended(); one error line says so for as long as it lasts.
 class QVElasticWorkerPool final : public QVWorkExecutor {
  public:
   struct Limits {
@@ -48,6 +48,8 @@ class QVElasticWorkerPool final : public QVWorkExecutor {
 
   [[nodiscard]] bool submit(QVWorkItem& task) override;
   void close() override;
+  // Runs tasks on the calling thread for as long as there is no worker at all and none to be had.
+  void runUnattended();
 
   // The pool whose worker the calling thread is; null for other threads.
   static QVElasticWorkerPool* current() noexcept;
@@ -67,6 +69,7 @@ class QVElasticWorkerPool final : public QVWorkExecutor {
   void addWorker() QV_REQUIRES(mutex_);
   bool sayWhyThereIsNoThread(std::string_view reason) const noexcept;
   void work();
+  void runFirst(QVMutexLock& lock) QV_REQUIRES(mutex_);
   bool rest(QVMutexLock& lock) QV_REQUIRES(mutex_);
   std::thread retire() QV_REQUIRES(mutex_);
 

@@ -3,6 +3,7 @@
 #include "platform/linux/QVThreadAnnotations.h"
 
 #include <atomic>
+#include <chrono>
 #include <condition_variable>
 #include <cstdint>
 
@@ -20,8 +21,17 @@ class QVWorkLedger {
     empty_.notify_all();
   }
   void waitUntilEmpty() {
+    while (!waitUntilEmpty(std::chrono::hours(24))) {
+    }
+  }
+  // False where it was not empty for so long.
+  bool waitUntilEmpty(std::chrono::steady_clock::duration longest) {
+    const auto deadline = std::chrono::steady_clock::now() + longest;
     QVMutexLock lock(mutex_);
-    while (count_.load(std::memory_order_acquire) != 0) lock.wait(empty_);
+    while (count_.load(std::memory_order_acquire) != 0) {
+      if (lock.waitUntil(empty_, deadline) == std::cv_status::timeout) return false;
+    }
+    return true;
   }
 
  private:

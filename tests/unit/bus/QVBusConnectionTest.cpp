@@ -1,8 +1,10 @@
 #include "platform/linux/bus/QVBusConnection.h"
 #include "tests/unit/bus/QVBusFixture.h"
 
+#include <stdexcept>
 #include <string>
 #include <thread>
+#include <utility>
 #include <vector>
 
 #include <unistd.h>
@@ -307,6 +309,97 @@ TEST_F(QVBusConnectionTest, KeepsTheObjectThroughTheHandlers) {
   EXPECT_EQ(seen, "there there ");
   EXPECT_TRUE(weak.expired());
   EXPECT_EQ(connection->exportedObject(), nullptr);
+}
+
+// A queue that carries out what a test runs.
+class QVBusCallsTest : public QVBusConnectionTest {
+ protected:
+  QVBusCallsTest() {
+    server_->setAfterCalls(
+        [this](QVFunction<void()> work) { waiting_.push_back(std::move(work)); });
+  }
+  void carryOut() {
+    for (QVFunction<void()>& work : std::exchange(waiting_, {})) work();
+    run();
+  }
+
+  std::vector<QVFunction<void()>> waiting_;
+};
+
+TEST_F(QVBusCallsTest, AreCarriedOutBeforeTheInvalidation) {
+  connect();
+  peer().send(create(1, 1));
+  peer().hangUp();
+  run();
+  EXPECT_EQ(journal_, Journal{"1 create 1"});
+  EXPECT_EQ(server_->connections(), 0U) << "its descriptor is free";
+  carryOut();
+  EXPECT_EQ(journal_, (Journal{"1 create 1", "1 invalidation"}));
+}
+
+TEST_F(QVBusCallsTest, AreCarriedOutBeforeTheInvalidationThatFollowsAnInterruption) {
+  connect();
+  peer().send(std::string(16, '\0'));
+  run();
+  EXPECT_EQ(journal_, Journal{"1 interruption"});
+  carryOut();
+  EXPECT_EQ(journal_, (Journal{"1 interruption", "1 invalidation"}));
+}
+
+TEST_F(QVBusCallsTest, AreWhereTheObjectIsLetGoOf) {
+  connect();
+  const std::weak_ptr<QVRecordingService> weak = services_[0];
+  services_.clear();
+  peer().hangUp();
+  run();
+  carryOut();
+  EXPECT_EQ(journal_, Journal{"1 invalidation"});
+  EXPECT_FALSE(weak.expired());
+  carryOut();
+  EXPECT_TRUE(weak.expired());
+}
+
+TEST_F(QVBusCallsTest, AreAwaitedWhenTheServiceEnds) {
+  connect();
+  connect();
+  server_->invalidateAll();
+  EXPECT_EQ(journal_, Journal{});
+  std::thread queue([this, waiting = std::exchange(waiting_, {})]() mutable {
+    for (QVFunction<void()>& work : waiting) work();
+  });
+  server_->awaitCalls();
+  queue.join();
+  EXPECT_EQ(journal_.size(), 2U);
+}
+
+// ---- What goes wrong here is the end of one connection
+
+TEST_F(QVBusConnectionTest, GoesOnWhereAHandlerThrows) {
+  const auto connection = accept();
+  connection->setInterruptionHandler([] { throw std::runtime_error("no thread"); });
+  connection->setInvalidationHandler([] { throw std::runtime_error("no memory"); });
+  connection->resume();
+  connect();
+  peer(1).send("garbage");
+  run();
+  EXPECT_TRUE(peer(1).isClosed());
+  const std::string pid = std::to_string(::getpid());
+  EXPECT_EQ(logged().back(), "exception in the connection of process " + pid + ": no memory");
+  EXPECT_EQ(logged()[1], "exception in the connection of process " + pid + ": no thread");
+  EXPECT_TRUE(exchange(create(1, 1), 2).at(0).boolean());
+}
+
+TEST_F(QVBusConnectionTest, EndsAloneWhereACallThrows) {
+  connect();
+  connect();
+  service(1).onCall = [](const std::string&) { throw std::runtime_error("no thread"); };
+  peer(1).send(create(1, 1));
+  run();
+  EXPECT_EQ(journal_, Journal{"1 invalidation"});
+  EXPECT_TRUE(peer(1).isClosed());
+  EXPECT_EQ(logged(), (Journal{"exception in the connection of process " +
+                               std::to_string(::getpid()) + ": no thread"}));
+  EXPECT_TRUE(exchange(create(1, 1), 2).at(0).boolean());
 }
 
 TEST_F(QVBusConnectionTest, DeliversNothingBeforeItIsResumed) {

@@ -98,6 +98,19 @@ TEST_F(QVAsioWorkQueuesTest, KeepsTheServerQueueOnOneThread) {
   EXPECT_NE(threads.front(), std::this_thread::get_id());
 }
 
+TEST_F(QVAsioWorkQueuesTest, RunsEverythingAtTheEndWithoutThreads) {
+  std::vector<std::string> ran;
+  {
+    QVAsioWorkQueues queues(log_, {.workers = 0});
+    queues.makeSerialQueue("a", QVQualityOfService::utility, 0)->async([&] {
+      ran.emplace_back("utility");
+      queues.backgroundQueue()->async([&ran] { ran.emplace_back("background"); });
+    });
+    queues.drain();
+  }
+  EXPECT_THAT(ran, ElementsAre("utility", "background"));
+}
+
 TEST_F(QVAsioWorkQueuesTest, RunsDelayedItemsAtOnceAtTheEnd) {
   const auto queue = queues_.makeSerialQueue("a", QVQualityOfService::utility, 0);
   std::vector<std::string> ran;

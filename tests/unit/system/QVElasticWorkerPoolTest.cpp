@@ -122,6 +122,19 @@ TEST_F(QVElasticWorkerPoolTest, RetiresAllRestingWorkersButOne) {
   EXPECT_EQ(ends.endedCount, ends.madeCount) << "closing ends the last one, too";
 }
 
+TEST_F(QVElasticWorkerPoolTest, RunsWhatHasNoWorkerWhereItIsAskedTo) {
+  makePool({.workers = 0});
+  std::vector<std::thread::id> threads;
+  for (int i = 0; i < 3; ++i) {
+    submit([&threads] { threads.push_back(std::this_thread::get_id()); });
+  }
+  EXPECT_THAT(threads, testing::IsEmpty());
+  EXPECT_FALSE(ledger_.waitUntilEmpty(0s));
+  pool_->runUnattended();
+  EXPECT_EQ(threads, std::vector(3, std::this_thread::get_id()));
+  EXPECT_TRUE(ledger_.waitUntilEmpty(0s));
+}
+
 TEST_F(QVElasticWorkerPoolTest, HasNoMoreWorkersThanItsLimit) {
   constexpr int kTasks = 12;
   makePool({.concurrency = 2, .workers = 3, .rest = 5s});
