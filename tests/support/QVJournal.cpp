@@ -82,6 +82,33 @@ class JournalledJoulewell final : public QVJoulewell {
   QVJournal& journal_;
 };
 
+class JournalledOrientation final : public QVOrientation {
+ public:
+  JournalledOrientation(std::unique_ptr<QVOrientation> orientation, QVJournal& journal)
+      : orientation_(std::move(orientation)), journal_(journal) {}
+
+  void QVRegisterDeviceOrientation(std::string_view callbackID, Callback callback) override {
+    journal_.note(QVText("register device ", callbackID));
+    orientation_->QVRegisterDeviceOrientation(callbackID, std::move(callback));
+  }
+  void QVRegisterUIOrientation(std::string_view callbackID, Callback callback) override {
+    journal_.note(QVText("register ui ", callbackID));
+    orientation_->QVRegisterUIOrientation(callbackID, std::move(callback));
+  }
+  void QVUnregisterDeviceOrientation(std::string_view callbackID) override {
+    journal_.note(QVText("unregister device ", callbackID));
+    orientation_->QVUnregisterDeviceOrientation(callbackID);
+  }
+  void QVUnregisterUIOrientation(std::string_view callbackID) override {
+    journal_.note(QVText("unregister ui ", callbackID));
+    orientation_->QVUnregisterUIOrientation(callbackID);
+  }
+
+ private:
+  const std::unique_ptr<QVOrientation> orientation_;
+  QVJournal& journal_;
+};
+
 template <class Journalled, class Interface>
 void insert(std::unique_ptr<Interface>& member, QVJournal& journal) {
   member = std::make_unique<Journalled>(std::move(member), journal);
@@ -94,6 +121,7 @@ void QVJournal::listenTo(QVPlatform& platform) {
   insert<JournalledTracePoints>(platform.tracePoints, *this);
   insert<JournalledCountwise>(platform.countwise, *this);
   insert<JournalledJoulewell>(platform.joulewell, *this);
+  insert<JournalledOrientation>(platform.orientation, *this);
 }
 
 std::vector<std::string> QVJournal::entries(std::string_view prefix) const {

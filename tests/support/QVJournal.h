@@ -7,19 +7,21 @@
 #include <string_view>
 #include <vector>
 
-// One list, in order, of what the core does to its platform: log lines, trace points and events
-// that are handed to the event services, with the replies that tests note in between. The fakes
-// each keep their own list; only here does it show that a reply came before a line.
+// One list, in order, of what the core does to its platform: log lines, trace points, events that
+// are handed to the event services and calls of the orientation service, with the replies that
+// tests note in between. The fakes each keep their own list; only here does it show that a reply
+// came before a line.
 //
 // Entries: "5[qvrs] -[QVReportingServerInstance killService:]: DESTROYING SERVICE", "trace
-// 21042814", "countwise NAME", "joulewell NAME", "reply ..." as the test words it.
+// 21042814", "countwise NAME", "joulewell NAME", "register device ID", "unregister ui ID",
+// "reply ..." as the test words it.
 //
 // Threads: the one that runs the fake queues' items.
 // Ownership: outlives the platform that it listens to.
 class QVJournal {
  public:
-  // Puts itself between the core and the platform's log, trace points and event services, which
-  // go on to receive everything.
+  // Puts itself between the core and the platform's log, trace points, event services and
+  // orientation service, which go on to receive everything.
   void listenTo(QVPlatform& platform);
 
   void note(std::string entry) { entries_.push_back(std::move(entry)); }

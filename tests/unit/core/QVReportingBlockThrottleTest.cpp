@@ -1,4 +1,5 @@
 #include "QVServices/Statistics/Service/QVReportingBlockThrottle.h"
+#include "platform/QVText.h"
 #include "platform/fake/QVFakePlatform.h"
 
 #include <chrono>
@@ -113,7 +114,20 @@ TEST_F(QVReportingBlockThrottleTest, FoldsMessagesWhoseTimerIsNotYetAttached) {
   EXPECT_THAT(throttle_->timersInFlight(), IsEmpty());
 }
 
-TEST_F(QVReportingBlockThrottleTest, FoldsMessagesThatDifferInIgnoredValues) {
+TEST_F(QVReportingBlockThrottleTest, FoldsMessagesThatDifferInOneIgnoredValue) {
+  const QVArray blacklist{"level"};
+  for (int i = 0; i < 3; ++i) {
+    addNote(QVText("system uptime ", i), {{"systemuptime_sec", i}});
+    addNote(QVText("process uptime ", i), {{"processuptime_ms", i}});
+    addNote(QVText("timestamp ", i), {{"qvreporting_timestamp", i}});
+    addNote(QVText("named ", i), {{"_comparison_field_blacklist", blacklist}, {"level", i}});
+  }
+  advance(10s);
+  EXPECT_THAT(notes_, ElementsAre("500 system uptime 2", "500 process uptime 2", "500 timestamp 2",
+                                  "500 named 2"));
+}
+
+TEST_F(QVReportingBlockThrottleTest, FoldsMessagesThatDifferInAllIgnoredValuesAtOnce) {
   const QVArray blacklist{"level"};
   for (int i = 0; i < 3; ++i) {
     addNote(std::to_string(i), {{"systemuptime_sec", i},

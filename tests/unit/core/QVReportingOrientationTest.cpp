@@ -10,10 +10,8 @@ namespace {
 
 using namespace std::chrono_literals;
 using enum QVLogLevel;
-using testing::Contains;
 using testing::ElementsAre;
 using testing::IsEmpty;
-using testing::Not;
 using testing::SizeIs;
 
 constexpr uint16_t kTelephony = 2;
@@ -63,14 +61,33 @@ TEST_F(QVReportingOrientationTest, IsReportedByTwoServiceTypesOnInternalBuilds) 
   EXPECT_FALSE(makeSession(7, 65535)->shouldReportOrientation());
 }
 
-TEST_F(QVReportingOrientationTest, IsNotReportedOnOneDeviceClass) {
+TEST_F(QVReportingOrientationTest, IsReportedOnEveryDeviceClassButSix) {
+  const auto session = makeSession();
+  for (const int deviceClass : {0, 1, 5, 6, 7, -6}) {
+    platform_.deviceInformation().setAnswer("DeviceClassNumber", deviceClass);
+    EXPECT_EQ(session->shouldReportOrientation(), deviceClass != 6) << "asked anew each time";
+  }
+}
+
+TEST_F(QVReportingOrientationTest, IsFollowedOnOtherDeviceClasses) {
   const auto session = makeSession();
   for (const int deviceClass : {0, 1, 5, 7, -6}) {
     platform_.deviceInformation().setAnswer("DeviceClassNumber", deviceClass);
-    EXPECT_TRUE(session->shouldReportOrientation()) << deviceClass;
+    journal_.forget();
+    session->start();
+    session->stop();
+    EXPECT_THAT(
+        takeJournal(),
+        ElementsAre(traceEntry(kTraceSessionStarted), "register device QVReportingService 7",
+                    "register ui QVReportingService 7", "unregister device QVReportingService 7",
+                    "unregister ui QVReportingService 7", traceEntry(kTraceSessionStopped)))
+        << deviceClass;
   }
+}
+
+TEST_F(QVReportingOrientationTest, IsNotFollowedOnDeviceClassSix) {
+  const auto session = makeSession();
   platform_.deviceInformation().setAnswer("DeviceClassNumber", 6);
-  EXPECT_FALSE(session->shouldReportOrientation()) << "asked anew each time";
   session->start();
   session->stop();
   EXPECT_THAT(orientation().calls(), IsEmpty());
@@ -100,24 +117,40 @@ TEST_F(QVReportingOrientationTest, IsNotReportedByAGenericSession) {
 // ---- registration
 
 TEST_F(QVReportingOrientationTest, RegistersUnderItsReporterIDFromStartToStop) {
+  makeSessionsVerbose();
   const auto session = makeSession(-42, kLongFormAudio);
+  journal_.forget();
+  const auto starting = sessionLine(debug, "start", "starting session owned by -42");
+  const auto ending = sessionLine(debug, "stop", "ending session -42");
   advance(5s);
   session->start();
+  EXPECT_THAT(takeJournal(), ElementsAre(starting, traceEntry(kTraceSessionStarted),
+                                         "register device QVReportingService -42",
+                                         "register ui QVReportingService -42"));
   EXPECT_EQ(session->orientationCallbackID(), "QVReportingService -42");
   EXPECT_EQ(session->startDate(), QVFakeClock::kStart + 5s);
-  EXPECT_THAT(orientation().calls(), ElementsAre("register device QVReportingService -42",
-                                                 "register ui QVReportingService -42"));
   session->start();
-  EXPECT_THAT(orientation().calls(), SizeIs(2)) << "a second start changes nothing";
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(starting, sessionLine(info, "start", "-42 is already started")));
   session->stop();
-  EXPECT_THAT(orientation().calls(), ElementsAre("register device QVReportingService -42",
-                                                 "register ui QVReportingService -42",
-                                                 "unregister device QVReportingService -42",
-                                                 "unregister ui QVReportingService -42"));
+  EXPECT_THAT(takeJournal(), ElementsAre(ending, "unregister device QVReportingService -42",
+                                         "unregister ui QVReportingService -42", ending,
+                                         traceEntry(kTraceSessionStopped)));
   EXPECT_EQ(session->orientationCallbackID(), std::nullopt);
   EXPECT_EQ(session->startDate(), QVFakeClock::kStart + 5s) << "stays until the next start";
   session->stop();
-  EXPECT_THAT(orientation().calls(), SizeIs(4)) << "there is nothing left to end";
+  EXPECT_THAT(takeJournal(), ElementsAre(ending)) << "there is nothing left to end";
+}
+
+TEST_F(QVReportingOrientationTest, UnregistersNothingOfASessionThatWasNeverStarted) {
+  makeSessionsVerbose();
+  const auto session = makeSession();
+  ASSERT_TRUE(session->shouldReportOrientation());
+  journal_.forget();
+  session->stop();
+  runUntilIdle();
+  EXPECT_THAT(takeJournal(), ElementsAre(sessionLine(debug, "stop", "ending session 7")));
+  EXPECT_EQ(session->orientationCallbackID(), std::nullopt);
 }
 
 TEST_F(QVReportingOrientationTest, RegistersAnewWithEachStart) {
@@ -136,12 +169,20 @@ TEST_F(QVReportingOrientationTest, StaysRegisteredWhereTheTypeChangedBeforeTheSt
   const auto session = makeStartedSession();
   session->setServiceType(1);
   session->stop();
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(sessionLine(info, "setServiceType:", "setting service type voxa"),
+                          traceEntry(kTraceSessionStopped)));
   EXPECT_EQ(session->orientationCallbackID(), "QVReportingService 7");
   EXPECT_THAT(orientation().deviceCallbackIDs(), ElementsAre("QVReportingService 7"));
   EXPECT_THAT(orientation().uiCallbackIDs(), ElementsAre("QVReportingService 7"));
   session->setServiceType(kTelephony);
   session->stop();
-  EXPECT_EQ(session->orientationCallbackID(), std::nullopt) << "also when it is not started";
+  EXPECT_THAT(
+      takeJournal(),
+      ElementsAre(sessionLine(info, "setServiceType:", "setting service type telephony"),
+                  "unregister device QVReportingService 7", "unregister ui QVReportingService 7"))
+      << "also when it is not started";
+  EXPECT_EQ(session->orientationCallbackID(), std::nullopt);
   EXPECT_THAT(orientation().deviceCallbackIDs(), IsEmpty());
   EXPECT_THAT(orientation().uiCallbackIDs(), IsEmpty());
 }
@@ -272,22 +313,48 @@ TEST_F(QVReportingOrientationTest, MakesColumnsOfTheSummaryEvent) {
   orientation().setDeviceOrientation(QVOrientation::kLeftUp);
   orientation().setUIOrientation(QVOrientation::kRightUp);
   session->sendMessage({{"a", 1}}, kSessionPlayback, kStart, {});
-  journal_.forget();
   session->stop();
   runUntilIdle();
-  EXPECT_THAT(takeBeaconStory(),
-              Contains(R"(message 1: 65535/65535 {"QV_Session_Summary_Event":"2","a":"1",)"
-                       R"("device_orientation":"normal,left-up","device_orientation_time":"0,2",)"
-                       R"("ui_orientation":"right-up","ui_orientation_time":"2"})"));
+  EXPECT_THAT(
+      takeBeaconStory(),
+      ElementsAre(R"(message 1: 3/1 {"a":1})",
+                  R"(message 1: 65535/65535 {"QV_Session_Summary_Event":"2","a":"1",)"
+                  R"("device_orientation":"normal,left-up","device_orientation_time":"0,2",)"
+                  R"("ui_orientation":"right-up","ui_orientation_time":"2"})",
+                  "flush 1", "end 1"));
 }
 
 TEST_F(QVReportingOrientationTest, MakesASummaryEventWithoutAnyMessage) {
   const auto session = makeStartedSession();
-  orientation().setUIOrientation(QVOrientation::kNormal);
+  orientation().setDeviceOrientation(QVOrientation::kNormal);
+  advance(1500ms);
+  orientation().setDeviceOrientation(QVOrientation::kLeftUp);
+  orientation().setUIOrientation(QVOrientation::kRightUp);
   session->stop();
   runUntilIdle();
   EXPECT_THAT(takeJournal(),
-              Contains(sessionLine(standard, "stop", "sending summary event for reporter 7")));
+              ElementsAre("unregister device QVReportingService 7",
+                          "unregister ui QVReportingService 7", traceEntry(kTraceSessionStopped),
+                          sessionLine(standard, "stop", "sending summary event for reporter 7"),
+                          traceEntry(kTraceMessageSent)));
+  EXPECT_THAT(
+      takeBeaconStory(),
+      ElementsAre(R"(message 1: 65535/65535 {"QV_Session_Summary_Event":"2",)"
+                  R"("device_orientation":"normal,left-up","device_orientation_time":"0,1.5",)"
+                  R"("ui_orientation":"right-up","ui_orientation_time":"1.5"})",
+                  "flush 1", "end 1"));
+}
+
+TEST_F(QVReportingOrientationTest, MakesColumnsOfWhatTurnedAlone) {
+  const auto session = makeStartedSession();
+  advance(250ms);
+  orientation().setDeviceOrientation(QVOrientation::kBottomUp);
+  session->stop();
+  runUntilIdle();
+  EXPECT_THAT(takeBeaconStory(),
+              ElementsAre(R"(message 1: 65535/65535 {"QV_Session_Summary_Event":"2",)"
+                          R"("device_orientation":"bottom-up","device_orientation_time":"0.25"})",
+                          "flush 1", "end 1"));
 }
 
 TEST_F(QVReportingOrientationTest, IsNotRecordedOnceTheSessionHasStopped) {

@@ -38,6 +38,29 @@ class QVReportingSessionMessagesTest : public QVServiceFixture {
       journal_.note(error ? "reply " + error->description() : "reply nil");
     };
   }
+  // Sends {"a b": 1} in a session of service type 3 that is not started, where sessions are
+  // verbose.
+  void expectSentAsASingleMessage(QVReportingSession& session) {
+    session.sendMessage({{"a b", 1}}, kSessionPlayback, kStart, reply());
+    EXPECT_THAT(takeBeaconStory(), IsEmpty()) << "asynchronous all the same";
+    runUntilIdle();
+    EXPECT_THAT(
+        takeJournal(),
+        ElementsAre(sessionLine(debug, kSend, "sending message for session owned by 7"),
+                    traceEntry(kTraceMessageSent), "reply nil",
+                    sessionLine(debug, kSend, "session not started, will send as a single message"),
+                    singleLine(debug, "sending single message after delta 0 for service 3"),
+                    traceEntry(kTraceMessageSent), singleLine(debug, "sending single message"),
+                    singleLine(debug, R"(message {"a_b":1} : category 134217731 : type 1)")))
+        << "two marks: one in the session, one for the single message; no second reply";
+    const auto message = latestBeaconEvent(QVFakeBeaconEvent::Kind::singleMessage);
+    EXPECT_EQ(message.sessionInfo, (QVDictionary{{"kBeaconSessionInfoClientType", 19},
+                                                 {"kBeaconSessionInfoClientVersion", 2.0},
+                                                 {"kBeaconSessionInfoSessionID", -1}}));
+    EXPECT_EQ(message.userInfo, (QVDictionary{{"kBeaconUserInfoClientName", "net.quillon.quietvox"},
+                                              {"kBeaconUserInfoServiceName", "haptics"}}));
+    EXPECT_THAT(takeBeaconStory(), ElementsAre(R"(single: 3/1 {"a_b":1})"));
+  }
   static std::vector<std::string> recorded(const QVReportingPayloadArray& array) {
     std::vector<std::string> texts;
     for (const auto& [identifier, payload] : entriesOf(array)) {
@@ -100,13 +123,11 @@ TEST_F(QVReportingSessionMessagesTest, RecordsNormalisedPayloadsUnderTheirIdenti
 TEST_F(QVReportingSessionMessagesTest, CountsButDoesNotCollectAfterAStop) {
   const auto session = makeStartedSession();
   session->stop();
-  runUntilIdle();
-  takeBeaconStory();
   session->sendMessage({{"a", 1}}, kSessionPlayback, kStart, {});
   runUntilIdle();
   EXPECT_EQ(session->aggregatedPayloadData(), nullptr);
+  EXPECT_EQ(session->nestedAggregatedPayloadData(), nullptr);
   EXPECT_THAT(session->messageTypeCounts(), ElementsAre(Pair("Session_Playback_Start", 1)));
-  EXPECT_THAT(takeBeaconStory(), ElementsAre(R"(single: 3/1 {"a":1})"));
 }
 
 TEST_F(QVReportingSessionMessagesTest, LeavesTheMessageAsItIs) {
@@ -134,9 +155,10 @@ TEST_F(QVReportingSessionMessagesTest, AnswersOnceWithNoErrorAlsoWhenTheFramewor
   const auto session = makeStartedSession();
   platform_.beacon().refuseMessages(QVError{"beacon", 5, {}});
   session->sendMessage({{"a", 1}}, kSessionPlayback, kStart, reply());
+  EXPECT_THAT(takeJournal(), ElementsAre(traceEntry(kTraceMessageSent), "reply nil"));
+  EXPECT_THAT(takeBeaconStory(), IsEmpty()) << "not yet refused";
   runUntilIdle();
-  EXPECT_THAT(takeJournal(), ElementsAre(traceEntry(kTraceMessageSent), "reply nil"))
-      << "a refusal writes nothing";
+  EXPECT_THAT(takeJournal(), IsEmpty()) << "a refusal writes nothing";
   EXPECT_THAT(takeBeaconStory(), ElementsAre(R"(refused 1: 3/1 {"a":1})")) << "and is not retried";
 }
 
@@ -200,26 +222,23 @@ TEST_F(QVReportingSessionMessagesTest, WritesItsDebugLinesOnlyWhenVerbose) {
                           traceEntry(kTraceMessageSent)));
 }
 
-TEST_F(QVReportingSessionMessagesTest, SendsAStoppedSessionsMessageAsASingleOne) {
+TEST_F(QVReportingSessionMessagesTest, SendsAMessageBeforeTheStartAsASingleOne) {
   makeSessionsVerbose();
   const auto session = makeSession(3);
   session->setConfiguration({{"HostApplicationDisplayID", "player"}});
-  session->sendMessage({{"a b", 1}}, kSessionPlayback, kStart, reply());
+  expectSentAsASingleMessage(*session);
+}
+
+TEST_F(QVReportingSessionMessagesTest, SendsAStoppedSessionsMessageAsASingleOne) {
+  makeSessionsVerbose();
+  const auto session = makeStartedSession(3);
+  session->setConfiguration({{"HostApplicationDisplayID", "player"}});
+  session->sendMessage({{"a", 1}}, kSessionPlayback, kStart, {});
+  session->stop();
   runUntilIdle();
-  EXPECT_THAT(
-      takeJournal(),
-      ElementsAre(sessionLine(debug, kSend, "sending message for session owned by 7"),
-                  traceEntry(kTraceMessageSent), "reply nil",
-                  sessionLine(debug, kSend, "session not started, will send as a single message"),
-                  singleLine(debug, "sending single message after delta 0 for service 3"),
-                  traceEntry(kTraceMessageSent), singleLine(debug, "sending single message"),
-                  singleLine(debug, R"(message {"a_b":1} : category 134217731 : type 1)")))
-      << "two marks: one in the session, one for the single message; no second reply";
-  const auto message = latestBeaconEvent(QVFakeBeaconEvent::Kind::singleMessage);
-  EXPECT_EQ(message.payload, (QVDictionary{{"a_b", 1}}));
-  EXPECT_EQ(message.userInfo, (QVDictionary{{"kBeaconUserInfoClientName", "net.quillon.quietvox"},
-                                            {"kBeaconUserInfoServiceName", "haptics"}}));
-  EXPECT_EQ(*message.sessionInfo.find("kBeaconSessionInfoSessionID"), QVValue(-1));
+  journal_.forget();
+  takeBeaconStory();
+  expectSentAsASingleMessage(*session);
 }
 
 TEST_F(QVReportingSessionMessagesTest, DecidesAtTheTimeOfTheSend) {

@@ -4,8 +4,10 @@
 #include "QVServices/Statistics/Service/QVReportingSession.h"
 #include "platform/fake/QVFakeMemoryCharge.h"
 #include "tests/support/QVServiceFixture.h"
+#include "tests/unit/core/QVPayloadReading.h"
 
 #include <chrono>
+#include <numeric>
 
 namespace {
 
@@ -18,6 +20,11 @@ using testing::Not;
 using testing::Pair;
 using testing::SizeIs;
 using Kind = QVFakeBeaconEvent::Kind;
+
+constexpr uint16_t kTest = 11;
+
+const std::string kNotAllowed = sessionLine(
+    info, "sendMessage:category:type:sync:reply:", "transactions aren't allowed on this platform");
 
 class QVReportingSessionTest : public QVServiceFixture {
  protected:
@@ -198,15 +205,23 @@ TEST_F(QVReportingSessionTest, SetsItsFrameworkSessionUpOnItsQueue) {
 }
 
 TEST_F(QVReportingSessionTest, ReportsInRealTimeForTheUseOfInterfacesOnly) {
-  for (const uint16_t type : std::initializer_list<uint16_t>{0, 1, 10, 12, 13, 65535}) {
-    const auto session = makeSession(type, type);
-    session->start();
+  std::vector<uint16_t> types(14);
+  std::iota(types.begin(), types.end(), uint16_t{0});
+  std::erase(types, kTest);  // is given no framework session
+  types.push_back(65535);
+  for (const uint16_t type : types) {
+    makeSession(type, type)->start();
     runUntilIdle();
-    const auto made = latestBeaconEvent(Kind::session);
-    EXPECT_EQ(*made.sessionInfo.find("kBeaconSessionInfoBatchEvent"), QVValue(type != 12)) << type;
-    EXPECT_EQ(*made.sessionInfo.find("kBeaconSessionInfoContainsRealtimeEvents"),
-              QVValue(type == 12))
-        << type;
+  }
+  const auto made = platform_.beacon().events(Kind::session);
+  ASSERT_THAT(made, SizeIs(types.size()));
+  for (std::size_t i = 0; i < types.size(); ++i) {
+    const bool realtime = types[i] == 12;
+    EXPECT_EQ(*made[i].sessionInfo.find("kBeaconSessionInfoBatchEvent"), QVValue(!realtime))
+        << types[i];
+    EXPECT_EQ(*made[i].sessionInfo.find("kBeaconSessionInfoContainsRealtimeEvents"),
+              QVValue(realtime))
+        << types[i];
   }
 }
 
@@ -227,14 +242,24 @@ TEST_F(QVReportingSessionTest, NamesTheServiceUnknownUntilItIsSet) {
 }
 
 TEST_F(QVReportingSessionTest, LetsTheConfigurationReplaceTheFrameworksNames) {
-  const auto session = makeSession(7, 1);
-  session->setConfiguration({{"kBeaconUserInfoClientName", "mine"}, {"rate", 48000}});
-  session->start();
-  runUntilIdle();
-  EXPECT_EQ(latestBeaconEvent(Kind::session).userInfo,
+  const auto userInfoWith = [this](const QVDictionary& configuration) {
+    const auto session = makeSession(7, 1);
+    session->setConfiguration(configuration);
+    session->start();
+    runUntilIdle();
+    return latestBeaconEvent(Kind::session).userInfo;
+  };
+  EXPECT_EQ(userInfoWith({{"kBeaconUserInfoClientName", "mine"}, {"rate", 48000}}),
             (QVDictionary{{"kBeaconUserInfoClientName", "mine"},
                           {"kBeaconUserInfoServiceName", "voxa_session"},
                           {"rate", 48000}}));
+  EXPECT_EQ(userInfoWith({{"kBeaconUserInfoServiceName", "my service"}, {"rate", 48000}}),
+            (QVDictionary{{"kBeaconUserInfoClientName", "net.quillon.quietvox"},
+                          {"kBeaconUserInfoServiceName", "my service"},
+                          {"rate", 48000}}));
+  const QVDictionary both{{"kBeaconUserInfoClientName", "mine"},
+                          {"kBeaconUserInfoServiceName", "my service"}};
+  EXPECT_EQ(userInfoWith(both), both);
 }
 
 TEST_F(QVReportingSessionTest, TakesNameAndTypeAtTheStartAndTheUserInformationAtTheSetUp) {
@@ -256,18 +281,22 @@ TEST_F(QVReportingSessionTest, RefusesASecondStart) {
   const auto session = makeStartedSession();
   send(*session, {{"a", 1}});
   const auto aggregated = session->aggregatedPayloadData();
+  const auto nested = session->nestedAggregatedPayloadData();
   journal_.forget();
   session->start();
   runUntilIdle();
   EXPECT_THAT(takeJournal(), ElementsAre(sessionLine(info, "start", "7 is already started")));
   EXPECT_EQ(session->aggregatedPayloadData(), aggregated);
-  EXPECT_EQ(aggregated->size(), 1u);
+  EXPECT_EQ(session->nestedAggregatedPayloadData(), nested);
+  EXPECT_THAT(entriesOf(*aggregated), ElementsAre(Pair("", QVDictionary{{"a", 1}})));
+  EXPECT_THAT(entriesOf(*nested),
+              ElementsAre(Pair("Session_Playback_Start_1", QVDictionary{{"a", 1}})));
   EXPECT_THAT(takeBeaconStory(), ElementsAre(R"(message 1: 3/1 {"a":1})"));
 }
 
 TEST_F(QVReportingSessionTest, WritesItsStartOnlyWhenVerbose) {
   makeSessionsVerbose();
-  const auto session = makeSession(7, 11);
+  const auto session = makeSession(7, kTest);
   session->start();
   session->start();
   EXPECT_THAT(takeJournal(), ElementsAre(sessionLine(debug, "start", "starting session owned by 7"),
@@ -280,6 +309,7 @@ TEST_F(QVReportingSessionTest, ThrowsAwayWhatWasCollectedBeforeTheStart) {
   const auto session = makeSession(7, 1);
   send(*session, {{"early", 1}});
   EXPECT_EQ(session->aggregatedPayloadData()->size(), 1u);
+  EXPECT_EQ(session->nestedAggregatedPayloadData()->size(), 1u);
   session->start();
   EXPECT_EQ(session->aggregatedPayloadData()->size(), 0u);
   EXPECT_EQ(session->nestedAggregatedPayloadData()->size(), 0u);
@@ -322,7 +352,7 @@ TEST_F(QVReportingSessionTest, SendsNoSummaryOfASessionWithoutMessages) {
   EXPECT_THAT(takeBeaconStory(), ElementsAre("flush 1", "end 1"));
 }
 
-TEST_F(QVReportingSessionTest, WritesItsEndTwiceWhenStartedAndOnceWhenNot) {
+TEST_F(QVReportingSessionTest, WritesItsEndTwiceWhenStartedAndOnceWhenStoppedBefore) {
   makeSessionsVerbose();
   const auto session = makeStartedSession();
   session->stop();
@@ -335,17 +365,24 @@ TEST_F(QVReportingSessionTest, WritesItsEndTwiceWhenStartedAndOnceWhenNot) {
   EXPECT_THAT(takeJournal(), ElementsAre(sessionLine(debug, "stop", "ending session 7")));
 }
 
-TEST_F(QVReportingSessionTest, ChangesNothingWhenItIsStoppedWithoutAStart) {
+TEST_F(QVReportingSessionTest, WritesItsEndOnceAndChangesNothingWhenItWasNeverStarted) {
+  makeSessionsVerbose();
   const auto session = makeSession();
   send(*session, {{"a", 1}});
   runUntilIdle();
   journal_.forget();
   takeBeaconStory();
+  const auto aggregated = session->aggregatedPayloadData();
+  const auto nested = session->nestedAggregatedPayloadData();
   session->stop();
   runUntilIdle();
-  EXPECT_THAT(takeJournal(), IsEmpty());
+  EXPECT_THAT(takeJournal(), ElementsAre(sessionLine(debug, "stop", "ending session 7")));
   EXPECT_THAT(takeBeaconStory(), IsEmpty());
-  EXPECT_NE(session->aggregatedPayloadData(), nullptr);
+  EXPECT_EQ(session->aggregatedPayloadData(), aggregated);
+  EXPECT_EQ(session->nestedAggregatedPayloadData(), nested);
+  EXPECT_THAT(entriesOf(*aggregated), ElementsAre(Pair("", QVDictionary{{"a", 1}})));
+  EXPECT_THAT(entriesOf(*nested),
+              ElementsAre(Pair("Session_Playback_Start_1", QVDictionary{{"a", 1}})));
 }
 
 TEST_F(QVReportingSessionTest, WritesAFlushThatFailed) {
@@ -405,48 +442,80 @@ TEST_F(QVReportingSessionTest, NeitherStopsNorSummarisesWhenItIsDropped) {
 
 // ---- test sessions
 
-TEST_F(QVReportingSessionTest, GivesATestSessionNoFrameworkSession) {
+TEST_F(QVReportingSessionTest, GivesATestSessionNoFrameworkSessionAndWaitsForNothing) {
   platform_.beacon().setBackends(QVFakeBeacon::Backends::never);
-  const auto session = makeSession(7, 11);
+  const auto session = makeSession(7, kTest);
   session->start();
   runUntilIdle();
-  EXPECT_EQ(platform_.clock().steadyTime(), 0s) << "nothing to wait for";
+  EXPECT_EQ(platform_.clock().steadyTime(), 0s);
+  EXPECT_THAT(takeJournal(), ElementsAre(traceEntry(kTraceSessionStarted)))
+      << "neither a line about waiting nor one about backends";
+  EXPECT_THAT(takeBeaconStory(), IsEmpty());
   EXPECT_EQ(platform_.beacon().liveTokens(), 0);
-  journal_.forget();
   session->stop();
   runUntilIdle();
-  EXPECT_THAT(takeBeaconStory(), IsEmpty());
   EXPECT_THAT(takeJournal(), ElementsAre(traceEntry(kTraceSessionStopped)));
+  EXPECT_THAT(takeBeaconStory(), IsEmpty());
 }
 
-TEST_F(QVReportingSessionTest, DropsTheMessagesOfATestSessionButCountsAndRecordsThem) {
-  const auto session = makeStartedSession(11);
-  send(*session, {{"a", 1}});
-  EXPECT_EQ(session->aggregatedPayloadData()->size(), 1u);
-  EXPECT_THAT(session->messageTypeCounts(), ElementsAre(Pair("Session_Playback_Start", 1)));
+TEST_F(QVReportingSessionTest, DropsEveryMessageOfATestSessionButCountsAndRecordsIt) {
+  const auto session = makeStartedSession(kTest);
+  const auto aggregated = session->aggregatedPayloadData();
+  const auto nested = session->nestedAggregatedPayloadData();
+  send(*session, {{"a b", 1}});
+  session->sendMessage({{"frames", 480}}, 9, 0, {});
+  send(*session, {});
   runUntilIdle();
   EXPECT_THAT(takeJournal(),
-              ElementsAre(traceEntry(kTraceMessageSent),
-                          sessionLine(info, "sendMessage:category:type:sync:reply:",
-                                      "transactions aren't allowed on this platform")));
+              ElementsAre(traceEntry(kTraceMessageSent), traceEntry(kTraceMessageSent),
+                          traceEntry(kTraceMessageSent), kNotAllowed, kNotAllowed, kNotAllowed));
   session->stop();
   runUntilIdle();
   EXPECT_THAT(takeJournal(),
               ElementsAre(traceEntry(kTraceSessionStopped),
                           sessionLine(standard, "stop", "sending summary event for reporter 7"),
-                          traceEntry(kTraceMessageSent),
-                          sessionLine(info, "sendMessage:category:type:sync:reply:",
-                                      "transactions aren't allowed on this platform")));
+                          traceEntry(kTraceMessageSent), kNotAllowed));
   EXPECT_THAT(takeBeaconStory(), IsEmpty());
+  EXPECT_THAT(session->messageTypeCounts(),
+              ElementsAre(Pair("Session_Playback_Start", 2), Pair("Tallying_Generic", 1),
+                          Pair("Undefined_Unknown", 1)));
+  const QVDictionary summary{{"QV_Session_Summary_Event", "11"}, {"a_b", "1"}, {"frames", "480"}};
+  EXPECT_THAT(entriesOf(*aggregated), ElementsAre(Pair("", QVDictionary{{"a_b", 1}}),
+                                                  Pair("", QVDictionary{{"frames", 480}}),
+                                                  Pair("", QVDictionary{}), Pair("", summary)));
+  EXPECT_THAT(entriesOf(*nested),
+              ElementsAre(Pair("Session_Playback_Start_1", QVDictionary{{"a_b", 1}}),
+                          Pair("Tallying_Generic_1", QVDictionary{{"frames", 480}}),
+                          Pair("Session_Playback_Start_2", QVDictionary{}),
+                          Pair("Undefined_Unknown_1", summary)));
 }
 
-TEST_F(QVReportingSessionTest, GoesByTheTypeOfTheMomentForSendsAndFlush) {
+TEST_F(QVReportingSessionTest, GoesByTheTypeOfTheMomentForSends) {
   const auto session = makeStartedSession(1);
-  session->setServiceType(11);
+  session->setServiceType(kTest);
   send(*session, {{"dropped", 1}});
+  runUntilIdle();
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(sessionLine(info, "setServiceType:", "setting service type test"),
+                          traceEntry(kTraceMessageSent), kNotAllowed));
+  session->setServiceType(1);
+  send(*session, {{"sent", 2}});
+  runUntilIdle();
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(sessionLine(info, "setServiceType:", "setting service type voxa"),
+                          traceEntry(kTraceMessageSent)));
+  EXPECT_THAT(takeBeaconStory(), ElementsAre(R"(message 1: 3/1 {"sent":2})"));
+}
+
+TEST_F(QVReportingSessionTest, GoesByTheTypeOfTheMomentForTheFlush) {
+  const auto session = makeStartedSession(1);
+  session->setServiceType(kTest);
   session->stop();
   runUntilIdle();
-  EXPECT_THAT(takeBeaconStory(), IsEmpty()) << "neither sent nor flushed";
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(sessionLine(info, "setServiceType:", "setting service type test"),
+                          traceEntry(kTraceSessionStopped)));
+  EXPECT_THAT(takeBeaconStory(), IsEmpty()) << "there is a framework session, it is not flushed";
   session->setServiceType(1);
   session->start();
   runUntilIdle();
@@ -455,7 +524,7 @@ TEST_F(QVReportingSessionTest, GoesByTheTypeOfTheMomentForSendsAndFlush) {
 }
 
 TEST_F(QVReportingSessionTest, GoesByTheTypeOfTheStartForTheSetUp) {
-  const auto session = makeSession(7, 11);
+  const auto session = makeSession(7, kTest);
   session->start();
   session->setServiceType(1);
   runUntilIdle();

@@ -57,12 +57,13 @@ class QVReportingSummaryFileTest : public QVServiceFixture {
     send(*session, {{"a", 1}});
     session->stop();
   }
-  // A stop with one message before it, whose file fails with these lines.
+  // A stop of a telephony session with one message before it, whose file fails with these lines.
   void expectStopWithFailures(const std::shared_ptr<QVReportingSession>& session,
                               const std::vector<std::string>& failures) {
     journal_.forget();
     session->stop();
     std::vector<std::string> expected{
+        "unregister device QVReportingService 7", "unregister ui QVReportingService 7",
         traceEntry(kTraceSessionStopped),
         sessionLine(standard, "stop", "sending summary event for reporter 7"),
         traceEntry(kTraceMessageSent)};
@@ -220,7 +221,9 @@ TEST_F(QVReportingSummaryFileTest, IsWrittenForTestSessionsToo) {
 TEST_F(QVReportingSummaryFileTest, IsNotWrittenForASessionWithoutMessages) {
   const auto session = makeStartedSession();
   session->stop();
-  EXPECT_THAT(takeJournal(), ElementsAre(traceEntry(kTraceSessionStopped)));
+  EXPECT_THAT(takeJournal(),
+              ElementsAre("unregister device QVReportingService 7",
+                          "unregister ui QVReportingService 7", traceEntry(kTraceSessionStopped)));
   EXPECT_THAT(files().files(), IsEmpty());
   EXPECT_EQ(files().permissions(kDirectory), std::nullopt);
 }
