@@ -147,7 +147,7 @@ TEST_F(QVReportingPreferencesTest, ReadsTheSwitchAsABooleanWhereItHasAValue) {
       {true, true},  {false, false}, {1, true},           {0, false},
       {0.5, true},   {"YES", true},  {"true", true},      {"1", true},
       {"no", false}, {"off", false}, {QVArray{1}, false}, {QVDictionary{{"a", 1}}, false},
-      {QVValue(), 0}};
+      {QVValue(), false}};
   service();
   for (const auto& [value, reading] : readings) {
     setPreference("disable_reporting", value);

@@ -182,8 +182,9 @@ TEST_F(QVReportingServerInstanceTest, WritesItsDestructionBeforeThatOfItsSession
 TEST_F(QVReportingServerInstanceTest, EndsTheProcessOnTheCallersThread) {
   QVTestClient& client = clientWithStartedSession(42, 7);
   client.killService();
-  EXPECT_THAT(takeJournal(), ElementsAre(clientLine(standard, "killService:", "DESTROYING SERVICE"),
-                                         "log flushed"));
+  EXPECT_THAT(takeJournal(),
+              ElementsAre("log flushed", clientLine(standard, "killService:", "DESTROYING SERVICE"),
+                          "log flushed"));
   EXPECT_THAT(platform_.process().exitStatuses(), ElementsAre(2));
   EXPECT_EQ(platform_.queues().pendingCount(), 0u) << "nothing is handed to the server queue";
   runUntilIdle();
