@@ -1,11 +1,15 @@
 #pragma once
 
 #include "platform/QVCondition.h"
+#include "platform/QVDate.h"
 #include "platform/QVLog.h"
 
 #include <string_view>
 
-// Two functions that sessions need.
+// Functions that sessions and the throttle need.
+
+// Seconds as a duration: at most a year either way, and none where they are no number.
+QVDuration QVReportingDurationFromSeconds(double seconds);
 
 // Waits until `flag` is set: true once it is, false when a wait period of `timeout` seconds passes
 // without a signal. Each signal that comes without the flag starts a fresh period, so the total may

@@ -1,5 +1,6 @@
 #include "QVServices/Statistics/Service/QVReportingBlockThrottle.h"
 
+#include "QVServices/Statistics/QVReportingUtility.h"
 #include "QVServices/Statistics/Service/QVReportingRunStep.h"
 #include "platform/QVPlatform.h"
 
@@ -114,7 +115,7 @@ void QVReportingBlockThrottle::addMessageBlock(Block block, int64_t reporterID,
     const auto wrapper = std::make_shared<Wrapper>(std::move(block));
     // The timer can fire nowhere but on the thread, which holds the throttle.
     wrapper->setTimer(
-        threads_.makeTimer(Wrapper::durationFromSeconds(delay), [this, key] { fire(key); }));
+        threads_.makeTimer(QVReportingDurationFromSeconds(delay), [this, key] { fire(key); }));
     timersInFlight_.emplace(key, wrapper);
   }
   try {

@@ -27,9 +27,6 @@ class QVReportingBlockThrottleTimerWrapper {
   // Moves the timer to fire that many seconds from now.
   void sleepFor(double seconds);
 
-  // Saturates where a timer's delays end; NaN is 0.
-  static QVDuration durationFromSeconds(double seconds);
-
  private:
   Block block_;
   std::shared_ptr<QVRunLoopTimer> timer_;

@@ -426,15 +426,6 @@ TEST_F(QVReportingBlockThrottleTest, IsFreedWithItsPendingBlocks) {
   EXPECT_EQ(unscheduled.use_count(), 1);
 }
 
-TEST(QVReportingBlockThrottleTimerWrapperTest, TurnsSecondsIntoDurations) {
-  using Wrapper = QVReportingBlockThrottleTimerWrapper;
-  EXPECT_EQ(Wrapper::durationFromSeconds(0.25), 250ms);
-  EXPECT_EQ(Wrapper::durationFromSeconds(-3.0), -3s);
-  EXPECT_EQ(Wrapper::durationFromSeconds(1e300), QVRunLoopTimer::kLongestDelay);
-  EXPECT_EQ(Wrapper::durationFromSeconds(-1e300), -QVRunLoopTimer::kLongestDelay);
-  EXPECT_EQ(Wrapper::durationFromSeconds(std::nan("")), 0s);
-}
-
 TEST_F(QVReportingBlockThrottleTest, MovesTheTimerOfAWrapper) {
   auto& threads = platform_.runLoopThreads();
   QVReportingBlockThrottleTimerWrapper wrapper(noteBlock("unused"));

@@ -3,6 +3,7 @@
 
 #include <atomic>
 #include <chrono>
+#include <cmath>
 #include <thread>
 #include <vector>
 
@@ -13,6 +14,15 @@ namespace {
 using namespace std::chrono_literals;
 using testing::ElementsAre;
 using testing::IsEmpty;
+
+TEST(QVReportingDurationFromSecondsTest, SaturatesAtAYear) {
+  constexpr auto kYear = 24h * 365;
+  EXPECT_EQ(QVReportingDurationFromSeconds(0.25), 250ms);
+  EXPECT_EQ(QVReportingDurationFromSeconds(-3.0), -3s);
+  EXPECT_EQ(QVReportingDurationFromSeconds(1e300), kYear);
+  EXPECT_EQ(QVReportingDurationFromSeconds(-1e300), -kYear);
+  EXPECT_EQ(QVReportingDurationFromSeconds(std::nan("")), 0s);
+}
 
 class QVReportingUtilityWaitTest : public testing::Test {
  protected:
