@@ -28,9 +28,9 @@ class QVReportingUserInfo {
     return contents_;
   }
 
-  // Bytes: a configuration is names and numbers. It goes into every analytics event's making and
-  // into each start's row, so it must not be what fills the memory.
-  static constexpr std::size_t kMaximumBytes = std::size_t{64} << 10;
+  // Bytes: a configuration is names and numbers, far smaller than this. It goes into each start's
+  // row, and a session's share of what all have must not be the whole.
+  static constexpr std::size_t kMaximumBytes = std::size_t{1} << 20;
 
   // Adds all entries; those of keys that are there already are replaced. Nothing is added where
   // the contents would become larger than kMaximumBytes, or those of all sessions than the

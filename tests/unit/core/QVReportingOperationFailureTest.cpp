@@ -60,8 +60,8 @@ TEST_F(QVReportingOperationFailureTest, AnswersASetServiceTypeThatFails) {
 
 TEST_F(QVReportingOperationFailureTest, AnswersAConfigurationThatFails) {
   QVTestClient& client = clientWithSession(42, 7);
-  failLines({"user information of 7 would be larger than 65536 bytes, nothing added"});
-  client.setConfiguration({{"text", std::string(70'000, 'x')}}, 7);
+  failLines({"user information of 7 would be larger than 1048576 bytes, nothing added"});
+  client.setConfiguration({{"text", std::string(1'100'000, 'x')}}, 7);
   runServerQueue();
   EXPECT_THAT(errors(), ElementsAre(clientLine(error, "setConfiguration:forReporterID:reply:",
                                                "failed to configure the session of reporter 7: "

@@ -144,9 +144,9 @@ TEST_F(QVReportingPreferencesTest, ReadsTheDeviceNameAsAString) {
 
 TEST_F(QVReportingPreferencesTest, ReadsTheSwitchAsABooleanWhereItHasAValue) {
   const std::vector<std::pair<QVValue, QVValue>> readings{
-      {true, true},  {false, false}, {1, true},           {0, false},
-      {0.5, true},   {"YES", true},  {"true", true},      {"1", true},
-      {"no", false}, {"off", false}, {QVArray{1}, false}, {QVDictionary{{"a", 1}}, false},
+      {true, true},      {false, false}, {1, true},           {0, false},
+      {0.5, true},       {"YES", true},  {"true", true},      {"1", true},
+      {"no", false},     {"off", false}, {QVArray{1}, false}, {QVDictionary{{"a", 1}}, false},
       {QVValue(), false}};
   service();
   for (const auto& [value, reading] : readings) {
@@ -189,7 +189,7 @@ TEST_F(QVReportingPreferencesTest, GivesTheDefaultsToEverySessionStartedOrNot) {
 
 TEST_F(QVReportingPreferencesTest, HandsTheDefaultsOutInTheOrderOfClientsAndSessions) {
   // Sessions that cannot take them say so, and so tell the order.
-  const QVDictionary full{{"text", std::string(65'000, 'x')}};
+  const QVDictionary full{{"text", std::string(1'048'000, 'x')}};
   for (const int32_t pid : {43, 42}) {
     QVTestClient& client = connectClient(pid);
     for (const int64_t reporterID : {int64_t{pid} * 10 + 2, int64_t{pid} * 10 + 1}) {
@@ -204,7 +204,7 @@ TEST_F(QVReportingPreferencesTest, HandsTheDefaultsOutInTheOrderOfClientsAndSess
   const auto complaint = [](int reporterID) {
     return sessionLine(error, "updateDefaults:",
                        QVText("user information of ", reporterID,
-                              " would be larger than 65536 bytes, nothing added"));
+                              " would be larger than 1048576 bytes, nothing added"));
   };
   auto journal = takeJournal();
   ASSERT_EQ(journal.size(), 6U);

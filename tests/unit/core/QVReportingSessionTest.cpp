@@ -50,17 +50,17 @@ class QVReportingSessionTest : public QVServiceFixture {
 
 TEST_F(QVReportingSessionTest, TakesNoMoreUserInformationThanItsLimit) {
   const auto session = makeSession();
-  session->setConfiguration({{"a", 1}, {"text", std::string(40'000, 'x')}});
+  session->setConfiguration({{"a", 1}, {"text", std::string(600'000, 'x')}});
   EXPECT_THAT(takeJournal(), IsEmpty());
-  session->setConfiguration({{"a", 2}, {"more", std::string(40'000, 'x')}});
-  session->updateDefaults({{"all at once", std::string(70'000, 'x')}});
+  session->setConfiguration({{"a", 2}, {"more", std::string(600'000, 'x')}});
+  session->updateDefaults({{"all at once", std::string(1'100'000, 'x')}});
   EXPECT_THAT(
       takeJournal(),
       ElementsAre(sessionLine(error, "setConfiguration:",
-                              "user information of 7 would be larger than 65536 bytes, nothing "
+                              "user information of 7 would be larger than 1048576 bytes, nothing "
                               "added"),
                   sessionLine(error, "updateDefaults:",
-                              "user information of 7 would be larger than 65536 bytes, nothing "
+                              "user information of 7 would be larger than 1048576 bytes, nothing "
                               "added")));
   EXPECT_EQ(*session->userInfo().find("a"), QVValue(1));
   EXPECT_EQ(session->userInfo().size(), 2U);
