@@ -10,7 +10,8 @@
 // call, so that a change shows at the next reading.
 //
 // Threads: any, at once. May read a file, so not for a hot path. A domain that is missing or
-// cannot be read counts as empty; the adapter logs why.
+// cannot be read counts as empty, but for want of descriptors or memory as what was last read of
+// it; the adapter logs why.
 class QVPreferences {
  public:
   virtual ~QVPreferences() = default;

@@ -8,7 +8,8 @@
 #include <string>
 
 // Device information in a file: one JSON object, read afresh at each question. A file that is not
-// there, or cannot be read, answers nothing.
+// there, or cannot be read, answers nothing; where descriptors or memory are short, it answers what
+// was last read of it.
 //
 // Threads: any. The log outlives it.
 class QVJSONDeviceInformation : public QVDeviceInformation {

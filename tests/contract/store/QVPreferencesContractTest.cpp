@@ -2,6 +2,7 @@
 #include "platform/fake/QVFakePreferences.h"
 #include "platform/linux/files/QVJSONFile.h"
 #include "platform/linux/settings/QVJSONPreferences.h"
+#include "tests/support/QVDescriptorLimit.h"
 #include "tests/support/QVTemporaryRoot.h"
 
 #include <filesystem>
@@ -115,6 +116,11 @@ class QVJSONPreferencesTest : public testing::Test {
   QVDictionary values(std::string_view domain) {
     return harness_.preferences().valuesInDomain(domain);
   }
+  // While this process gets no descriptor.
+  QVDictionary valuesForWantOfDescriptors(std::string_view domain) {
+    const QVDescriptorLimit noMore;
+    return values(domain);
+  }
   JSONPreferencesHarness harness_;
 };
 
@@ -156,6 +162,36 @@ TEST_F(QVJSONPreferencesTest, SaysThatADomainIsADirectory) {
   std::filesystem::create_directories(harness_.path(kDomain));
   EXPECT_TRUE(values(kDomain).empty());
   EXPECT_THAT(harness_.lines(), ElementsAre(testing::EndsWith(": not a regular file")));
+}
+
+TEST_F(QVJSONPreferencesTest, KeepsToWhatItReadWhileDescriptorsAreShort) {
+  harness_.setDomain(kDomain, R"({"disable_reporting": true})");
+  harness_.setDomain("other", R"({"a": 1})");
+  values(kDomain);
+  EXPECT_EQ(values("other"), (QVDictionary{{"a", 1}}));
+  EXPECT_EQ(valuesForWantOfDescriptors(kDomain), (QVDictionary{{"disable_reporting", true}}));
+  EXPECT_EQ(valuesForWantOfDescriptors(kDomain), (QVDictionary{{"disable_reporting", true}}));
+  EXPECT_THAT(
+      harness_.lines(),
+      ElementsAre("3[default] -[QVJSONPreferences valuesInDomain:]: cannot read preferences " +
+                  harness_.path(kDomain) + ": Too many open files"));
+  harness_.setDomain(kDomain, R"({"disable_reporting": false})");
+  EXPECT_EQ(values(kDomain), (QVDictionary{{"disable_reporting", false}}));
+  EXPECT_EQ(valuesForWantOfDescriptors(kDomain), (QVDictionary{{"disable_reporting", false}}));
+}
+
+TEST_F(QVJSONPreferencesTest, KeepsToNothingOfAFileThatIsNotReadYetOrGoneOrBroken) {
+  harness_.setDomain(kDomain, R"({"a": 1})");
+  EXPECT_EQ(valuesForWantOfDescriptors(kDomain), QVDictionary::assemble({}));
+  EXPECT_EQ(values(kDomain), (QVDictionary{{"a", 1}}));
+  harness_.removeDomain(kDomain);
+  EXPECT_TRUE(values(kDomain).isAbsent());
+  EXPECT_EQ(valuesForWantOfDescriptors(kDomain), QVDictionary::assemble({}));
+  harness_.setDomain(kDomain, R"({"a": 1})");
+  EXPECT_EQ(values(kDomain), (QVDictionary{{"a", 1}}));
+  harness_.setDomain(kDomain, R"({"a": )");
+  values(kDomain);
+  EXPECT_EQ(valuesForWantOfDescriptors(kDomain), QVDictionary::assemble({}));
 }
 
 }  // namespace
