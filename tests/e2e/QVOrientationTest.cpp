@@ -149,9 +149,9 @@ TEST_F(QVOrientationTest, IsNotRecordedOfOtherSessions) {
   client.create(8, kTelephony);
   client.start(8);
   ASSERT_TRUE(readings.await());
-  EXPECT_TRUE(followsOrientation());
   turnUI("left-up");
   expectLogged("mode=ui orientation=\"left-up\"");
+  EXPECT_TRUE(followsOrientation());
   // With the next change the last one has been told to all.
   turnUI("right-up");
   expectLogged("mode=ui orientation=\"right-up\"");

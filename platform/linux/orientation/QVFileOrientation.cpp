@@ -2,6 +2,7 @@
 
 #include "platform/linux/files/QVRegularFile.h"
 
+#include <optional>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -14,6 +15,18 @@ std::string_view withoutBlanks(std::string_view text) {
   const auto begin = text.find_first_not_of(kBlanks);
   if (begin == std::string_view::npos) return {};
   return text.substr(begin, text.find_last_not_of(kBlanks) + 1 - begin);
+}
+
+// Nothing where the file is empty.
+std::optional<int32_t> read(const std::filesystem::path& path) {
+  const QVRegularFile file(path, QVRegularFile::Links::refuse);
+  std::string text;
+  if (file.error() != 0 || file.read(QVFileOrientation::kMaximumBytes, text) != 0) {
+    return QVOrientation::kUndefined;
+  }
+  const std::string_view word = withoutBlanks(text);
+  if (word.empty()) return std::nullopt;
+  return QVOrientation::orientationNamed(word);
 }
 
 }  // namespace
@@ -41,14 +54,16 @@ void QVFileOrientation::work() {
     } else {
       // First, so that no change goes unseen between the reading and the watch.
       beginWatch();
-      value_ = QVOrientation::kUndefined;
       changes_->isPending = true;
     }
   }
   if (period != QVOrientationRegistrations::kNoDemand && changes_->isPending.exchange(false)) {
-    read();
-    registrations_.report(period, value_);
+    if (const auto value = read(file_)) registrations_.report(period, *value);
   }
+}
+
+int32_t QVFileOrientation::valueIn(const std::filesystem::path& file) {
+  return read(file).value_or(QVOrientation::kUndefined);
 }
 
 void QVFileOrientation::beginWatch() {
@@ -70,15 +85,4 @@ void QVFileOrientation::beginWatch() {
 void QVFileOrientation::endWatch() {
   if (watch_ == QVDirectoryWatcher::kNoToken) return;
   watcher_->unwatch(std::exchange(watch_, QVDirectoryWatcher::kNoToken));
-}
-
-void QVFileOrientation::read() {
-  const QVRegularFile file(file_, QVRegularFile::Links::refuse);
-  std::string text;
-  if (file.error() != 0 || file.read(kMaximumBytes, text) != 0) {
-    value_ = QVOrientation::kUndefined;
-    return;
-  }
-  const std::string_view word = withoutBlanks(text);
-  if (!word.empty()) value_ = QVOrientation::orientationNamed(word);
 }

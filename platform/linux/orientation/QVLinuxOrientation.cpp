@@ -27,7 +27,7 @@ QVLinuxOrientation::QVLinuxOrientation(QVLog& log, std::shared_ptr<QVDirectoryWa
     : log_(log),
       bell_(std::make_shared<const QVBell>()),
       device_(log),
-      ui_(log),
+      ui_(log, [uiFile] { return QVFileOrientation::valueIn(uiFile); }),
       sensor_(log, std::move(sensorOptions), device_),
       file_(log, std::move(watcher), std::move(uiFile), bell_, ui_) {}
 

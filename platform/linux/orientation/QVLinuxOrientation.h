@@ -19,8 +19,9 @@
 // used only while somebody is registered for it.
 //
 // The last known value, from which a change is told, is what the source says when the first
-// registration begins to use it; while a source has not answered, nothing is known. Later
-// registrations share it.
+// registration begins to use it. The user interface's file is read by that registration itself,
+// which waits for nothing: every change after its return is told. The sensor daemon is asked; while
+// it has not answered, nothing is known. Later registrations share it.
 //
 // Threads: as QVOrientation. One thread of its own works both sources and calls the callbacks; it
 // begins with the first registration and sleeps without a time limit while there is none.

@@ -23,10 +23,11 @@ void QVOrientationRegistrations::add(std::string_view callbackID,
   {
     const QVMutexLock lock(mutex_);
     if (registrations_.size() < kMaximumRegistrations) {
+      if (registrations_.empty()) {
+        known_ = baseline_ ? std::optional(baseline_()) : std::nullopt;
+        ++lastPeriod_;
+      }
       registrations_.push_back(std::move(registration));
-      if (registrations_.size() > 1) return;
-      ++lastPeriod_;
-      known_.reset();
       return;
     }
     isFirstDropped = !std::exchange(hasDropped_, true);

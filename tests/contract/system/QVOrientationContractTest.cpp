@@ -1,7 +1,6 @@
 #include "platform/fake/QVFakeLog.h"
 #include "platform/fake/QVFakeOrientation.h"
 #include "platform/linux/orientation/QVLinuxOrientation.h"
-#include "tests/support/QVFileReadings.h"
 #include "tests/support/QVTemporaryRoot.h"
 #include "tests/support/QVTestBus.h"
 #include "tests/support/QVTestSensor.h"
@@ -42,7 +41,7 @@ struct UISide {
 };
 
 // A harness's source says "normal" to begin with. settle() returns when what the source says is
-// known to whoever is registered.
+// known to whoever is registered, which with all but the sensor daemon it is at once.
 
 class FakeDeviceHarness {
  public:
@@ -99,22 +98,14 @@ class FileHarness {
   FileHarness() { turn(QVOrientation::kNormal); }
   QVOrientation& orientation() { return orientation_; }
   QVFakeLog& log() { return log_; }
-  void settle() { EXPECT_TRUE(readings_.await()); }
+  void settle() {}
   void turn(int32_t value) const {
     std::ofstream(root_.runtime() / "ui-orientation") << QVOrientation::textOfOrientation(value);
   }
 
  private:
-  // Made before it is watched.
-  std::filesystem::path file() const {
-    const auto path = root_.runtime() / "ui-orientation";
-    std::ofstream(path).flush();
-    return path;
-  }
-
   QVTemporaryRoot root_;
   QVFakeLog log_;
-  QVFileReadings readings_{file()};
   QVLinuxOrientation orientation_{
       log_, std::make_shared<QVDirectoryWatcher>(log_), root_.runtime() / "ui-orientation",
       QVSensorProxyOptions{.busAddress = QVTestBus::address(root_.path())}};

@@ -22,9 +22,12 @@ constexpr int kLimit = 60'000;  // milliseconds; only ends a test that has faile
 // The test's thread is the orientation's: it works when the bell rings.
 class QVFileOrientationTest : public testing::Test {
  protected:
-  // Registered, and what the file says first is known.
-  void add() {
+  // Registered; the thread has not come to it yet.
+  void enroll() {
     registrations_.add("id", [this](int32_t orientation) { told_.push_back(orientation); });
+  }
+  void add() {
+    enroll();
     orientation_->work();
   }
   void remove() {
@@ -62,7 +65,8 @@ class QVFileOrientationTest : public testing::Test {
   QVFakeLog log_;
   const std::shared_ptr<const QVBell> bell_ = std::make_shared<const QVBell>();
   const std::shared_ptr<QVDirectoryWatcher> watcher_ = std::make_shared<QVDirectoryWatcher>(log_);
-  QVOrientationRegistrations registrations_{log_};
+  QVOrientationRegistrations registrations_{log_,
+                                            [this] { return QVFileOrientation::valueIn(file_); }};
   std::unique_ptr<QVFileOrientation> orientation_ =
       std::make_unique<QVFileOrientation>(log_, watcher_, file_, bell_, registrations_);
   std::vector<int32_t> told_;
@@ -85,6 +89,26 @@ TEST_F(QVFileOrientationTest, TellsEachChangeOfTheWord) {
   EXPECT_THAT(takeTold(), ElementsAre(QVOrientation::kUndefined));
   say("normal");
   EXPECT_THAT(takeTold(), ElementsAre(QVOrientation::kNormal));
+}
+
+TEST_F(QVFileOrientationTest, TellsWhatChangedBeforeItsThreadCameToIt) {
+  say("normal");
+  enroll();
+  say("left-up");
+  EXPECT_THAT(takeTold(), ElementsAre(QVOrientation::kLeftUp));
+  // Those that come while others are registered share what is known.
+  say("right-up");
+  enroll();
+  EXPECT_THAT(takeTold(), ElementsAre(QVOrientation::kRightUp, QVOrientation::kRightUp));
+}
+
+TEST_F(QVFileOrientationTest, TellsNothingOfAFileThatIsBeingWrittenAsItsThreadComesToIt) {
+  say("normal");
+  enroll();
+  write("");
+  EXPECT_THAT(takeTold(), IsEmpty());
+  say("normal");
+  EXPECT_THAT(takeTold(), IsEmpty());
 }
 
 TEST_F(QVFileOrientationTest, TakesAMissingFileForUndefined) {

@@ -54,6 +54,36 @@ TEST_F(QVOrientationRegistrationsTest, SharesTheLastKnownValueWithLaterRegistrat
   EXPECT_THAT(takeTold(), ElementsAre("a 2", "b 2"));
 }
 
+TEST_F(QVOrientationRegistrationsTest, KnowsTheBaselineFromThePeriodsFirstRegistrationOn) {
+  std::vector<int32_t> said{1, 4};
+  QVOrientationRegistrations registrations(log_, [&said] {
+    const int32_t value = said.front();
+    said.erase(said.begin());
+    return value;
+  });
+  const auto enroll = [&](const std::string& name) {
+    registrations.add(name, [this, name](int32_t orientation) {
+      told_.push_back(name + ' ' + std::to_string(orientation));
+    });
+  };
+  enroll("a");
+  EXPECT_THAT(said, ElementsAre(4)) << "the first asks at once";
+  enroll("b");
+  EXPECT_THAT(said, ElementsAre(4)) << "others share it";
+  registrations.report(registrations.period(), 1);
+  EXPECT_THAT(takeTold(), IsEmpty());
+  registrations.report(registrations.period(), 3);
+  EXPECT_THAT(takeTold(), ElementsAre("a 3", "b 3"));
+  registrations.remove("a");
+  registrations.remove("b");
+  enroll("a");
+  EXPECT_THAT(said, IsEmpty());
+  registrations.report(registrations.period(), 4);
+  EXPECT_THAT(takeTold(), IsEmpty());
+  registrations.report(registrations.period(), 1);
+  EXPECT_THAT(takeTold(), ElementsAre("a 1"));
+}
+
 TEST_F(QVOrientationRegistrationsTest, EndsTheOldestOfAnID) {
   add("a", "first");
   add("a", "second");
