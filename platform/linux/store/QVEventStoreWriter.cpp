@@ -126,12 +126,7 @@ void QVEventStoreWriter::giveMemoryBack() {
 
 void QVEventStoreWriter::answer(std::vector<QVEventStoreQueue::Search> searches) {
   if (searches.empty()) return;
-  if (tables_.isOpen() && tables_.hasMoved()) {
-    log_.error(nullptr, "-[QVEventStoreWriter answer]", "the event store ", options_.path,
-               " was moved or removed; opening it anew");
-    tables_.close();
-  }
-  if (tables_.isOpen()) {
+  if (hasFile()) {
     readPreferences();
   } else {
     openStore();
@@ -141,6 +136,16 @@ void QVEventStoreWriter::answer(std::vector<QVEventStoreQueue::Search> searches)
     if (tables_.isOpen()) backends = QVArray{QVValue(kBackend)};
     guarded([&] { search.completion(std::move(backends)); });
   }
+}
+
+// Is the store open, and its file the one at its path? One that is not is let go.
+bool QVEventStoreWriter::hasFile() {
+  if (!tables_.isOpen()) return false;
+  if (!tables_.hasMoved()) return true;
+  log_.error(nullptr, "-[QVEventStoreWriter hasFile]", "the event store ", options_.path,
+             " was moved or removed; opening it anew");
+  tables_.close();
+  return false;
 }
 
 bool QVEventStoreWriter::openStore() {
@@ -228,6 +233,11 @@ void QVEventStoreWriter::store() {
     return;
   }
   while (!pending_.empty() || !losses_.empty()) {
+    // What is written to a file that is gone, nobody finds.
+    if (!hasFile() && !openStore()) {
+      giveUpAll(kLossUnavailable);
+      return;
+    }
     std::size_t batches = 0;
     const int result = writeTransaction(batches);
     if (result == SQLITE_OK) {

@@ -26,7 +26,8 @@
 //   out of order  a transaction failed. Rows are held and tried again at the retry interval; above
 //                 the limit of held bytes the oldest are given up and counted.
 // closed -> open; open <-> out of order; open, out of order -> closed where the file is damaged (it
-// is set aside and a new one begun) or no longer at its path.
+// is set aside and a new one begun) or no longer at its path, which is looked at before each
+// transaction and each search.
 // The first failure of an outage is one error line, its end one line.
 //
 // The preferences (limit of the file, unwanted Countwise events) are read when the store is opened,
@@ -53,6 +54,7 @@ class QVEventStoreWriter {
 
   // Looks for the store once for all of them.
   void answer(std::vector<QVEventStoreQueue::Search> searches);
+  bool hasFile();
   bool openStore();
   QVEventTables::Opening openFile(std::string& reason);
   bool setAside(const std::string& reason);

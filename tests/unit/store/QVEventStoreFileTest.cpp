@@ -38,6 +38,9 @@ class QVEventStoreFileTest : public QVStoreFixture {
     }
     return names;
   }
+  void removeFiles() {
+    for (const std::string& name : filesOfState()) std::filesystem::remove(root_.state() / name);
+  }
   // The superuser may write anywhere, so somebody else is who asks.
   std::optional<QVArray> findBackendsAsNobody() {
     constexpr uid_t kNobody = 65534;
@@ -159,9 +162,7 @@ TEST_F(QVEventStoreFileTest, GivesALiveSessionARowInAFileThatReplacesItsOwn) {
   const auto session = openSession({.sessionID = 7});
   send(*session, {{"n", 1}});
   EXPECT_EQ(flush(*session), std::nullopt);
-  for (const auto& entry : std::filesystem::directory_iterator(root_.state())) {
-    std::filesystem::remove(entry.path());
-  }
+  removeFiles();
   EXPECT_EQ(findBackends(), QVArray{"store"});
   send(*session, {{"n", 2}});
   EXPECT_EQ(flush(*session), std::nullopt);
@@ -171,6 +172,47 @@ TEST_F(QVEventStoreFileTest, GivesALiveSessionARowInAFileThatReplacesItsOwn) {
                           R"("kBeaconUserInfoServiceName":"media_session"}|0|{"n":2})"));
   EXPECT_THAT(lines(QVLogLevel::error),
               ElementsAre("the event store " + path() + " was moved or removed; opening it anew"));
+}
+
+TEST_F(QVEventStoreFileTest, GoesOnInANewFileWhereNoSessionStarts) {
+  sendSingle({{"n", 1}});
+  flushAll();
+  removeFiles();
+  sendSingle({{"n", 2}});
+  flushAll();
+  EXPECT_THAT(rows("SELECT payload FROM beacon_message"), ElementsAre(R"({"n":2})"));
+
+  // The database alone: what is in its log goes with it.
+  std::filesystem::rename(path(), path() + ".old");
+  sendSingle({{"n", 3}});
+  sendCountwise("event", {});
+  flushAll();
+  EXPECT_THAT(rows("SELECT payload FROM beacon_message"), ElementsAre(R"({"n":3})"));
+  EXPECT_EQ(count("countwise_event"), 1);
+  const std::string line = "the event store " + path() + " was moved or removed; opening it anew";
+  EXPECT_THAT(lines(QVLogLevel::error), ElementsAre(line, line));
+  EXPECT_THAT(losses(), IsEmpty());
+}
+
+TEST_F(QVEventStoreFileTest, CountsWhatComesOnceItsDirectoryIsGone) {
+  sendSingle({{"n", 1}});
+  flushAll();
+  std::filesystem::remove_all(root_.state());
+  const auto session = openSession();
+  send(*session, {{"n", 2}});
+  const std::optional<QVError> error = flush(*session);
+  ASSERT_NE(error, std::nullopt);
+  EXPECT_EQ(error->code, static_cast<int64_t>(QVEventStoreErrorCode::unavailable));
+  std::filesystem::create_directory(root_.state());
+  EXPECT_EQ(findBackends(), QVArray{"store"});
+  send(*session, {{"n", 3}});
+  EXPECT_EQ(flush(*session), std::nullopt);
+  EXPECT_THAT(rows("SELECT payload FROM beacon_message"), ElementsAre(R"({"n":3})"));
+  EXPECT_THAT(losses(), ElementsAre("store_unavailable|1"));
+  EXPECT_THAT(lines(QVLogLevel::error),
+              ElementsAre("the event store " + path() + " was moved or removed; opening it anew",
+                          "the event store " + path() +
+                              " cannot be opened: its directory: No such file or directory"));
 }
 
 TEST_F(QVEventStoreFileTest, CountsWhatComesWhileItsDirectoryIsMissing) {

@@ -4,6 +4,8 @@
 #include "tests/unit/store/QVFaultyFileSystem.h"
 #include "tests/unit/store/QVStoreFixture.h"
 
+#include <filesystem>
+
 #include <gmock/gmock.h>
 #include <sqlite3.h>
 
@@ -172,6 +174,19 @@ TEST_F(QVEventStoreOutageTest, WritesASessionOnceThatAFailedTransactionBegan) {
   EXPECT_THAT(rows("SELECT s.session_id, m.payload FROM beacon_session s"
                    " LEFT JOIN beacon_message m ON s.id = m.session ORDER BY s.id"),
               ElementsAre("1|NULL", R"(2|{"n":1})"));
+}
+
+TEST_F(QVEventStoreOutageTest, StoresWhatItHeldInANewFileWhereTheOldOneIsGone) {
+  const auto session = openSession();
+  ASSERT_EQ(flush(*session), std::nullopt);
+  fileSystem_.fail(Fault::diskFull);
+  send(*session, {{"n", 1}});
+  expectOutage(*session);
+  // As somebody might make room.
+  std::filesystem::rename(path(), path() + ".old");
+  fileSystem_.fail(Fault::none);
+  close();
+  EXPECT_THAT(rows("SELECT payload FROM beacon_message"), ElementsAre(R"({"n":1})"));
 }
 
 TEST_F(QVEventStoreOutageTest, SaysWhatIsLostWhenTheDiskNeverComesBack) {
