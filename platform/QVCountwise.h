@@ -14,6 +14,7 @@ class QVCountwise {
 
   virtual ~QVCountwise() = default;
   // Sends an event, lazily: the callback is called at most once, only if the service wants the
-  // event, later, on a thread of the service. It owns what it captures.
+  // event, later, on a thread of the service, or before this returns where the service has none. It
+  // owns what it captures.
   virtual void sendEventLazily(std::string name, PayloadCallback payload) = 0;
 };

@@ -10,7 +10,7 @@ using QVEventLosses = std::map<std::string, int64_t, std::less<>>;
 // The store could not be opened when the event came.
 inline constexpr const char* kLossUnavailable = "store_unavailable";
 // The disk was full, or failed, or another program held the database, for longer than events could
-// be kept in memory; the last is any other failure of the database.
+// be kept in memory; the last is any other failure of the database, or the want of a thread.
 inline constexpr const char* kLossFull = "store_full";
 inline constexpr const char* kLossInputOutput = "store_io_error";
 inline constexpr const char* kLossBusy = "store_busy";

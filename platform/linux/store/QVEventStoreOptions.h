@@ -3,7 +3,10 @@
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <string>
+#include <thread>
+#include <utility>
 
 // How an event store works. The defaults are what the service runs with.
 struct QVEventStoreOptions {
@@ -20,4 +23,8 @@ struct QVEventStoreOptions {
   std::size_t heldBytes = std::size_t{48} * 1024 * 1024;
   // Bytes of the file where the preference "store_limit_mib" does not say otherwise.
   int64_t fileBytes = int64_t{256} * 1024 * 1024;
+  // Begins the writer's thread; throws where none can be had.
+  std::function<std::thread(std::function<void()>)> makeThread = [](std::function<void()> body) {
+    return std::thread(std::move(body));
+  };
 };

@@ -104,8 +104,8 @@ QVEventStoreWriter::QVEventStoreWriter(Services services, QVEventStoreOptions op
 void QVEventStoreWriter::run() {
   bool stop = false;
   while (!stop) {
-    QVEventStoreQueue::Work work =
-        queue_.take(outageCause_.empty() ? std::nullopt : std::optional(retryAt_));
+    const bool retries = !outageCause_.empty() && hasSomethingToStore();
+    QVEventStoreQueue::Work work = queue_.take(retries ? std::optional(retryAt_) : std::nullopt);
     stop = work.stop;
     answer(std::move(work.searches));
     for (QVEventRows& batch : work.batches) pending_.push_back(std::move(batch));
@@ -114,6 +114,18 @@ void QVEventStoreWriter::run() {
     giveMemoryBack();
   }
   closeStore();
+}
+
+void QVEventStoreWriter::hold(const char* reason) {
+  const SteadyTime moment = std::chrono::steady_clock::now();
+  if (outageCause_.empty() || moment - preferencesReadAt_ >= options_.retryInterval) {
+    readPreferences();
+  }
+  static_cast<void>(queue_.takeWaiting(pending_));
+  failure_ = QVText("no thread for its writer: ", reason);
+  beginOutage(kLossFailed);
+  // By the thread, as soon as there is one.
+  retryAt_ = {};
 }
 
 void QVEventStoreWriter::giveMemoryBack() {
@@ -218,7 +230,7 @@ void QVEventStoreWriter::readPreferences() {
 }
 
 void QVEventStoreWriter::store() {
-  if (pending_.empty() && losses_.empty()) return;
+  if (!hasSomethingToStore()) return;
   const SteadyTime moment = std::chrono::steady_clock::now();
   if (!tables_.isOpen()) {
     if (moment < retryAt_ || !openStore()) {
@@ -232,7 +244,7 @@ void QVEventStoreWriter::store() {
     holdWithinLimit();
     return;
   }
-  while (!pending_.empty() || !losses_.empty()) {
+  while (hasSomethingToStore()) {
     // What is written to a file that is gone, nobody finds.
     if (!hasFile() && !openStore()) {
       giveUpAll(kLossUnavailable);
@@ -248,7 +260,7 @@ void QVEventStoreWriter::store() {
     } else if (QVSQLiteDatabase::isDamage(result) && setAside(failure_) && openStore()) {
       continue;
     } else if (tables_.isOpen()) {
-      beginOutage(result);
+      beginOutage(causeOf(result));
       return;
     } else {
       giveUpAll(kLossUnavailable);
@@ -332,14 +344,14 @@ void QVEventStoreWriter::finishBatches(std::size_t count) {
   countedBatches_ = 0;
 }
 
-void QVEventStoreWriter::beginOutage(int result) {
+void QVEventStoreWriter::beginOutage(const char* cause) {
   retryAt_ = std::chrono::steady_clock::now() + options_.retryInterval;
   if (outageCause_.empty()) {
     lostInOutage_ = 0;
     log_.error(nullptr, "-[QVEventStoreWriter store]", "the event store ", options_.path,
                " cannot be written: ", failure_);
   }
-  outageCause_ = causeOf(result);
+  outageCause_ = cause;
   holdWithinLimit();
 }
 
@@ -354,6 +366,7 @@ void QVEventStoreWriter::holdWithinLimit() {
   const QVError error = QVMakeEventStoreError(QVEventStoreErrorCode::outOfOrder, failure_);
   for (; countedBatches_ < pending_.size(); ++countedBatches_) {
     QVEventRows& batch = pending_[countedBatches_];
+    heldBytes_ += sizeof batch;
     for (QVCountwiseRow& row : batch.countwise.rows) askForPayload(row);
     batch.forEachLane([this](const auto& lane) {
       for (std::size_t i = lane.head; i < lane.rows.size(); ++i) {
@@ -383,6 +396,7 @@ void QVEventStoreWriter::giveUpOldest() {
     done = true;
   });
   if (batch.size() > 0) return;
+  heldBytes_ -= sizeof batch;
   pending_.pop_front();
   --countedBatches_;
 }

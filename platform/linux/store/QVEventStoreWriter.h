@@ -28,14 +28,15 @@
 // closed -> open; open <-> out of order; open, out of order -> closed where the file is damaged (it
 // is set aside and a new one begun) or no longer at its path, which is looked at before each
 // transaction and each search.
-// The first failure of an outage is one error line, its end one line.
+// The first failure of an outage is one error line, its end one line. While there is no thread to
+// write, which hold() is told, the store is out of order whatever state its file is in.
 //
 // The preferences (limit of the file, unwanted Countwise events) are read when the store is opened,
 // at each search for backends, and before rows are stored when the last reading is a retry interval
 // old.
 //
-// Threads: run() is the writer's thread and everything else in here happens on it: payload
-// callbacks and completions, too, with no lock held.
+// Threads: one at a time, its own as soon as that can be had. Everything in here happens on the
+// thread of run() or hold(): payload callbacks and completions, too, with no lock held.
 class QVEventStoreWriter {
  public:
   // What the writer works with; all of it outlives the writer.
@@ -48,6 +49,9 @@ class QVEventStoreWriter {
   QVEventStoreWriter(Services services, QVEventStoreOptions options, QVEventStoreQueue& queue);
 
   void run();
+  // Takes what waits and holds it, instead of run() for as long as there is no thread for that,
+  // because of `reason`. Does not wait for the disk, but may read the preferences.
+  void hold(const char* reason);
 
  private:
   using SteadyTime = QVEventStoreQueue::SteadyTime;
@@ -67,7 +71,8 @@ class QVEventStoreWriter {
   int insertLane(Lane& lane);
   void finishBatches(std::size_t count);
 
-  void beginOutage(int result);
+  bool hasSomethingToStore() const { return !pending_.empty() || !losses_.empty(); }
+  void beginOutage(const char* cause);
   void endOutage();
   void holdWithinLimit();
   void giveUpOldest();

@@ -1,9 +1,11 @@
 #include "platform/linux/store/QVSQLiteEventStore.h"
 
+#include "platform/linux/QVLogException.h"
 #include "platform/linux/QVThreads.h"
 #include "platform/linux/store/QVEventStoreError.h"
 #include "platform/linux/store/QVEventStoreWriter.h"
 
+#include <exception>
 #include <optional>
 #include <utility>
 
@@ -11,9 +13,10 @@ QVSQLiteEventStore::QVSQLiteEventStore(QVLog& log, QVClock& clock, QVPreferences
                                        QVEventStoreOptions options)
     : log_(log),
       clock_(clock),
-      preferences_(preferences),
       options_(std::move(options)),
-      queue_(options_.commitInterval) {}
+      queue_(options_.commitInterval),
+      writer_(std::make_unique<QVEventStoreWriter>(
+          QVEventStoreWriter::Services{log, clock, preferences}, options_, queue_)) {}
 
 QVSQLiteEventStore::~QVSQLiteEventStore() {
   close();
@@ -44,9 +47,8 @@ bool QVSQLiteEventStore::addJoulewellEvent(int32_t agent, std::string name,
 
 void QVSQLiteEventStore::findBackends(std::shared_ptr<QVEventSession> session,
                                       QVBeaconSession::BackendsCompletion completion) {
-  startWriter();
   QVEventStoreQueue::Search search{std::move(session), std::move(completion)};
-  if (!queue_.search(search)) search.completion(std::nullopt);
+  if (!startWriter() || !queue_.search(search)) search.completion(std::nullopt);
 }
 
 void QVSQLiteEventStore::flush(std::shared_ptr<QVEventSession> session,
@@ -58,24 +60,57 @@ void QVSQLiteEventStore::flush(std::shared_ptr<QVEventSession> session,
 
 void QVSQLiteEventStore::close() {
   queue_.stop();
-  const QVMutexLock lock(mutex_);
-  started_.store(true);
-  if (writer_.joinable()) writer_.join();
+  QVMutexLock lock(mutex_);
+  while (hasStandIn_) lock.wait(standInGone_);
+  if (!started_.exchange(true)) {
+    // Nothing was handed over, or it was and there is still no thread.
+    hasStandIn_ = true;
+    lock.unlock();
+    standIn([this] { writer_->run(); });
+    lock.lock();
+  }
+  if (thread_.joinable()) thread_.join();
 }
 
-void QVSQLiteEventStore::startWriter() {
-  if (started_.load(std::memory_order_acquire)) return;
-  const QVMutexLock lock(mutex_);
-  if (started_.load()) return;
-  writer_ = std::thread([this] {
-    QVPrepareThread("qv-store", 0);
-    QVEventStoreWriter({log_, clock_, preferences_}, options_, queue_).run();
-  });
+// Is the writer at work, or will it never be again?
+bool QVSQLiteEventStore::startWriter() {
+  if (started_.load(std::memory_order_acquire)) return true;
+  QVMutexLock lock(mutex_);
+  if (started_.load()) return true;
+  if (hasStandIn_) return false;
+  try {
+    thread_ = options_.makeThread([this] {
+      QVPrepareThread("qv-store", 0);
+      writer_->run();
+    });
+  } catch (const std::exception& failure) {
+    hasStandIn_ = true;
+    lock.unlock();
+    standIn([&] { writer_->hold(failure.what()); });
+    return false;
+  }
   started_.store(true, std::memory_order_release);
+  return true;
+}
+
+// By whoever has set `hasStandIn_`.
+template <class Work>
+void QVSQLiteEventStore::standIn(Work work) {
+  try {
+    work();
+  } catch (...) {
+    // For want of memory.
+    QVLogException(log_, "-[QVSQLiteEventStore standIn]", "the event store", options_.path);
+  }
+  const QVMutexLock lock(mutex_);
+  hasStandIn_ = false;
+  // Under the lock: who waits for this may destroy the store.
+  standInGone_.notify_all();
 }
 
 template <class Row>
 bool QVSQLiteEventStore::add(Row& row, bool urgent) {
+  if (!queue_.add(row, urgent)) return false;
   startWriter();
-  return queue_.add(row, urgent);
+  return true;
 }

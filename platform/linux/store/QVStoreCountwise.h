@@ -9,7 +9,8 @@
 
 // Countwise on the event store: an event is a row of countwise_event. Every event is wanted but
 // those whose name the preferences domain "net.quillon.countwise" lists under "unwanted". The
-// payload callback is called on the store's thread, when the row is stored.
+// payload callback is called on the store's thread, when the row is stored, or while the store is
+// out of order; where it has no thread, on the sender's.
 //
 // Threads: any. Events that come after the store was closed are dropped.
 class QVStoreCountwise : public QVCountwise {

@@ -35,6 +35,7 @@ class QVStoreFixture : public ::testing::Test {
   ~QVStoreFixture() override;
 
   QVSQLiteEventStore& store();
+  std::shared_ptr<QVSQLiteEventStore> shared();
   QVStoreBeacon beacon() { return QVStoreBeacon(shared()); }
   // Ends the store and begins a new one on the same file.
   void restart();
@@ -73,7 +74,5 @@ class QVStoreFixture : public ::testing::Test {
   QVEventStoreOptions options_;
 
  private:
-  std::shared_ptr<QVSQLiteEventStore> shared();
-
   std::shared_ptr<QVSQLiteEventStore> store_;
 };
