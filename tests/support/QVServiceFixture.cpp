@@ -28,6 +28,13 @@ QVTestClient& QVServiceFixture::connectClient(int32_t pid) {
   return clients_.emplace_back(platform_.listener().connect(pid), journal_);
 }
 
+QVTestClient& QVServiceFixture::registeredClient(int32_t pid) {
+  QVTestClient& client = connectClient(pid);
+  runUntilIdle();
+  journal_.forget();
+  return client;
+}
+
 QVTestClient& QVServiceFixture::clientWithSession(int32_t pid, int64_t reporterID,
                                                   uint16_t serviceType) {
   QVTestClient& client = connectClient(pid);
@@ -98,6 +105,16 @@ std::string sessionLine(QVLogLevel level, std::string_view operation, std::strin
 
 std::string driverLine(QVLogLevel level, std::string_view operation, std::string_view text) {
   return logEntry(level, "qvrd", QVText("-[QVReportingDriverUtility ", operation, ']'), text);
+}
+
+std::string lookupHit(int64_t reporterID, int32_t pid) {
+  return hostLine(QVLogLevel::info, "findReportingSessionForID:",
+                  QVText("found reporting session ", reporterID, " for client ", pid));
+}
+
+std::string lookupFailure(int64_t reporterID) {
+  return hostLine(QVLogLevel::error, "findReportingSessionForID:",
+                  QVText("failed to find reporting session ", reporterID));
 }
 
 std::string singleLine(QVLogLevel level, std::string_view text, std::string_view scope) {

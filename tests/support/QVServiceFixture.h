@@ -56,7 +56,9 @@ class QVServiceFixture : public testing::Test {
 
   // Connects; the registration waits on the server queue.
   QVTestClient& connectClient(int32_t pid);
-  // Connected, registered, with one session of the type; the journal starts empty behind it.
+  // Connected and registered; the journal starts empty behind it.
+  QVTestClient& registeredClient(int32_t pid);
+  // The same with one session of the type.
   QVTestClient& clientWithSession(int32_t pid, int64_t reporterID, uint16_t serviceType = 1);
   // The same with the session started and its backends found.
   QVTestClient& clientWithStartedSession(int32_t pid, int64_t reporterID, uint16_t serviceType = 1);
@@ -89,6 +91,9 @@ std::string hostLine(QVLogLevel level, std::string_view operation, std::string_v
 std::string clientLine(QVLogLevel level, std::string_view operation, std::string_view text);
 std::string sessionLine(QVLogLevel level, std::string_view operation, std::string_view text);
 std::string driverLine(QVLogLevel level, std::string_view operation, std::string_view text);
+// Of the look through all clients, with the client that has the session, or where none has it.
+std::string lookupHit(int64_t reporterID, int32_t pid);
+std::string lookupFailure(int64_t reporterID);
 // Of the session's class operation that sends single messages.
 std::string singleLine(QVLogLevel level, std::string_view text, std::string_view scope = "qvrr");
 // Of QVReportingUtilityWait, on the sessions' scope.

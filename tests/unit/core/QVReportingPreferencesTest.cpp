@@ -2,6 +2,7 @@
 
 #include "QVServices/Statistics/Service/QVReportingServer.h"
 #include "tests/support/QVServiceFixture.h"
+#include "tests/unit/core/QVLogDetour.h"
 
 #include <string>
 #include <utility>
@@ -26,6 +27,22 @@ class QVReportingPreferencesTest : public QVServiceFixture {
   void postAndRun() {
     postDefaultsNotification();
     runServerQueue();
+  }
+  // Leaves sessions too little room for the device name of the next notification: they say so, and
+  // so tell when they were given the defaults.
+  void fillUserInformation(QVTestClient& client, int64_t reporterID) {
+    client.setConfiguration({{"text", std::string(1'048'000, 'x')}}, reporterID);
+    setPreference("device_name", std::string(1000, 'n'));
+  }
+  static std::string complaint(int64_t reporterID) {
+    return sessionLine(error, "updateDefaults:",
+                       QVText("user information of ", reporterID,
+                              " would be larger than 1048576 bytes, nothing added"));
+  }
+  // What is written before the sessions are given them.
+  std::string readingLine() { return hostLine(standard, kListen, "re-reading quietvox defaults"); }
+  std::string defaultsLine() {
+    return hostLine(info, kListen, QVText("defaults ", service().getDefaults()));
   }
   std::string refusal(int32_t pid) {
     return QVText("reply ", pid, " send: net.quillon.audio.reporting 1 {}");
@@ -188,28 +205,18 @@ TEST_F(QVReportingPreferencesTest, GivesTheDefaultsToEverySessionStartedOrNot) {
 }
 
 TEST_F(QVReportingPreferencesTest, HandsTheDefaultsOutInTheOrderOfClientsAndSessions) {
-  // Sessions that cannot take them say so, and so tell the order.
-  const QVDictionary full{{"text", std::string(1'048'000, 'x')}};
   for (const int32_t pid : {43, 42}) {
     QVTestClient& client = connectClient(pid);
     for (const int64_t reporterID : {int64_t{pid} * 10 + 2, int64_t{pid} * 10 + 1}) {
       client.create(reporterID);
-      client.setConfiguration(full, reporterID);
+      fillUserInformation(client, reporterID);
     }
   }
   runUntilIdle();
   journal_.forget();
-  setPreference("device_name", std::string(1000, 'n'));
   postAndRun();
-  const auto complaint = [](int reporterID) {
-    return sessionLine(error, "updateDefaults:",
-                       QVText("user information of ", reporterID,
-                              " would be larger than 1048576 bytes, nothing added"));
-  };
-  auto journal = takeJournal();
-  ASSERT_EQ(journal.size(), 6U);
-  journal.erase(journal.begin(), journal.begin() + 2);
-  EXPECT_THAT(journal, ElementsAre(complaint(431), complaint(432), complaint(421), complaint(422)));
+  EXPECT_THAT(takeJournal(), ElementsAre(readingLine(), defaultsLine(), complaint(431),
+                                         complaint(432), complaint(421), complaint(422)));
 }
 
 TEST_F(QVReportingPreferencesTest, GivesNewSessionsNoDefaultsUntilTheNextNotification) {
@@ -241,6 +248,21 @@ TEST_F(QVReportingPreferencesTest, SwitchesReportingOffAndOnAgain) {
   runUntilIdle();
   EXPECT_THAT(replies(), ElementsAre("reply 42 send: nil", refusal(42), "reply 42 send: nil"));
   EXPECT_TRUE(service().isReportingEnabled());
+}
+
+TEST_F(QVReportingPreferencesTest, SwitchesReportingOffOnceTheSessionsHaveTheDefaults) {
+  fillUserInformation(clientWithSession(42, 7), 7);
+  runUntilIdle();
+  journal_.forget();
+  QVLogDetour::install([this](std::string_view text) {
+    if (!text.starts_with("user information")) return;
+    journal_.note(service().isReportingEnabled() ? "still enabled" : "switched off already");
+  });
+  setPreference("disable_reporting", true);
+  postAndRun();
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(readingLine(), defaultsLine(), "still enabled", complaint(7)));
+  EXPECT_FALSE(service().isReportingEnabled());
 }
 
 TEST_F(QVReportingPreferencesTest, FindsSessionsOfOtherClientsAgainOnceItIsSwitchedOn) {

@@ -20,25 +20,10 @@ std::string sendingLine(int64_t reporterID) {
   return sessionLine(debug, "sendMessage:category:type:sync:reply:",
                      QVText("sending message for session owned by ", reporterID));
 }
-std::string lookupHit(int64_t reporterID, int32_t pid) {
-  return hostLine(info, "findReportingSessionForID:",
-                  QVText("found reporting session ", reporterID, " for client ", pid));
-}
-std::string lookupFailure(int64_t reporterID) {
-  return hostLine(
-      error, "findReportingSessionForID:", QVText("failed to find reporting session ", reporterID));
-}
 
 class QVReportingRoutingTest : public QVServiceFixture {
  protected:
   QVReportingRoutingTest() { makeSessionsVerbose(); }
-
-  QVTestClient& registeredClient(int32_t pid) {
-    QVTestClient& client = connectClient(pid);
-    runUntilIdle();
-    journal_.forget();
-    return client;
-  }
 
   // Reaches both sinks without an error line of theirs.
   const QVDictionary haptics_{{"EngineOnTime", 12.5}, {"qvreporting_timestamp", 1000}};

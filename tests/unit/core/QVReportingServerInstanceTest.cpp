@@ -50,14 +50,11 @@ TEST_F(QVReportingServerInstanceTest, PrefersItsOwnSession) {
 
 TEST_F(QVReportingServerInstanceTest, FindsAnotherClientsSessionOnlyAcrossAllClients) {
   QVTestClient& first = clientWithSession(42, 7);
-  QVTestClient& second = connectClient(43);
-  runUntilIdle();
-  takeJournal();
+  QVTestClient& second = registeredClient(43);
   EXPECT_EQ(second.instance()->findReportingSessionForID(7, false), nullptr);
   EXPECT_THAT(takeJournal(), IsEmpty());
   EXPECT_EQ(second.instance()->findReportingSessionForID(7, true), first.session(7));
-  EXPECT_THAT(takeJournal(), ElementsAre(hostLine(info, "findReportingSessionForID:",
-                                                  "found reporting session 7 for client 42")));
+  EXPECT_THAT(takeJournal(), ElementsAre(lookupHit(7, 42)));
 }
 
 TEST_F(QVReportingServerInstanceTest, FindsItsOwnSessionZero) {
@@ -125,8 +122,7 @@ TEST_F(QVReportingServerInstanceTest, FetchesNoDriverStatisticsWhenTheConnection
 
 TEST_F(QVReportingServerInstanceTest, HidesTheSessionsOfARemovedClientFromOthers) {
   QVTestClient& dead = clientWithStartedSession(42, 7);
-  QVTestClient& other = connectClient(43);
-  runUntilIdle();
+  QVTestClient& other = registeredClient(43);
   dead.interrupt();
   runUntilIdle();
   takeJournal();
@@ -134,10 +130,11 @@ TEST_F(QVReportingServerInstanceTest, HidesTheSessionsOfARemovedClientFromOthers
   other.validate(7);
   other.listReporters();
   runUntilIdle();
-  EXPECT_THAT(replies(), ElementsAre(R"(reply 43 validate 7: {"reporterID":0,"serviceType":65535})",
-                                     "reply 43 reporters:"));
-  EXPECT_THAT(takeJournal(), Contains(hostLine(error, "findReportingSessionForID:",
-                                               "failed to find reporting session 7")));
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(lookupFailure(7),
+                          clientLine(standard, "reporterID:valid:", "validating reporter 7"),
+                          R"(reply 43 validate 7: {"reporterID":0,"serviceType":65535})",
+                          "reply 43 reporters:"));
 }
 
 TEST_F(QVReportingServerInstanceTest, LeavesAnUnlistedClientAlone) {

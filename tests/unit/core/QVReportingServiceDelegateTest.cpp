@@ -5,8 +5,11 @@
 
 #include <atomic>
 #include <chrono>
+#include <fstream>
 #include <optional>
 #include <thread>
+
+#include <unistd.h>
 
 namespace {
 
@@ -15,32 +18,39 @@ using enum QVLogLevel;
 using testing::ElementsAre;
 using testing::IsEmpty;
 
-constexpr std::string_view kNewConnection = "listener:shouldAcceptNewConnection:";
-constexpr std::string_view kLookup = "findReportingSessionForID:";
+std::string newConnectionLine(std::string_view connection) {
+  return hostLine(standard,
+                  "listener:shouldAcceptNewConnection:", QVText("newConnection: ", connection));
+}
+std::string newClientLine(int32_t pid) {
+  return clientLine(standard, "initWithPID:delegate:", QVText("new client with pid ", pid));
+}
 
 class QVReportingServiceDelegateTest : public QVServiceFixture {};
 
-// A connection that does something of the test's while it is being set up.
+// A connection that does something of the test's at each step of its being set up.
 class ConnectionWithSetUp final : public QVIPCConnection {
  public:
-  explicit ConnectionWithSetUp(QVFunction<void()> setUp) : setUp_(std::move(setUp)) {}
+  using SetUp = QVFunction<void(std::string_view step)>;
+
+  explicit ConnectionWithSetUp(SetUp setUp) : setUp_(std::move(setUp)) {}
 
   int32_t processIdentifier() const override { return 44; }
   std::string description() const override { return "connection with set-up"; }
-  void setExportedInterface(QVIPCInterface) override {}
+  void setExportedInterface(QVIPCInterface) override { setUp_("exported interface"); }
   void setExportedObject(std::shared_ptr<QVReportingServiceProtocol> object) override {
     exportedObject_ = std::move(object);
-    setUp_();
+    setUp_("exported object");
   }
   std::shared_ptr<QVReportingServiceProtocol> exportedObject() const override {
     return exportedObject_;
   }
-  void setInterruptionHandler(QVFunction<void()>) override {}
-  void setInvalidationHandler(QVFunction<void()>) override {}
-  void resume() override {}
+  void setInterruptionHandler(QVFunction<void()>) override { setUp_("interruption handler"); }
+  void setInvalidationHandler(QVFunction<void()>) override { setUp_("invalidation handler"); }
+  void resume() override { setUp_("resumed"); }
 
  private:
-  QVFunction<void()> setUp_;
+  SetUp setUp_;
   std::shared_ptr<QVReportingServiceProtocol> exportedObject_;
 };
 
@@ -54,16 +64,15 @@ class LookUpOfAnotherThread {
   LookUpOfAnotherThread(const LookUpOfAnotherThread&) = delete;
   LookUpOfAnotherThread& operator=(const LookUpOfAnotherThread&) = delete;
 
-  // Begins it, and leaves it far more turns than a look-up takes that does not have to wait.
+  // Begins it, and returns when it has ended or is found to wait.
   void begin() {
-    constexpr int kTurns = 10'000;
     thread_ = std::thread([this] {
-      hasBegun_ = true;
+      threadIdentifier_ = ::gettid();
       service_.findReportingSessionForID(0);
       hasEnded_ = true;
     });
-    while (!hasBegun_) std::this_thread::yield();
-    for (int turn = 0; turn < kTurns; ++turn) std::this_thread::yield();
+    while (threadIdentifier_ == 0) std::this_thread::yield();
+    while (!hasEnded_ && !isAsleep()) std::this_thread::yield();
     hadEndedMeanwhile_ = hasEnded_;
   }
   // Before begin() returned. Asked once, after it.
@@ -73,9 +82,20 @@ class LookUpOfAnotherThread {
   }
 
  private:
+  // Asks the kernel, which alone knows who waits for a lock. The state is the field behind the
+  // thread's name, which stands in parentheses.
+  bool isAsleep() const {
+    std::ifstream file(QVText("/proc/self/task/", threadIdentifier_.load(), "/stat"));
+    std::string line;
+    std::getline(file, line);
+    const auto name = line.rfind(") ");
+    EXPECT_NE(name, std::string::npos) << "cannot tell: " << line;
+    return name == std::string::npos || line[name + 2] == 'S';
+  }
+
   const QVReportingServiceDelegate& service_;
   std::thread thread_;
-  std::atomic<bool> hasBegun_ = false;
+  std::atomic<pid_t> threadIdentifier_ = 0;
   std::atomic<bool> hasEnded_ = false;
   bool hadEndedMeanwhile_ = false;
 };
@@ -141,10 +161,22 @@ TEST_F(QVReportingServiceDelegateTest, AcceptsAConnection) {
   EXPECT_EQ(client.connection().exportedInterface(), QVIPCInterface::reportingService);
   ASSERT_NE(client.instance(), nullptr);
   EXPECT_EQ(client.instance()->processIdentifier(), 42);
-  EXPECT_THAT(
-      takeJournal(),
-      ElementsAre(hostLine(standard, kNewConnection, "newConnection: connection 1 of process 42"),
-                  clientLine(standard, "initWithPID:delegate:", "new client with pid 42")));
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(newConnectionLine("connection 1 of process 42"), newClientLine(42)));
+}
+
+TEST_F(QVReportingServiceDelegateTest, ResumesAConnectionThatIsWhollySetUp) {
+  service();
+  const auto connection = std::make_shared<ConnectionWithSetUp>([&](std::string_view step) {
+    const auto waiting = platform_.queues().pendingCount(kServerQueue);
+    journal_.note(QVText(step, waiting == 0 ? "" : ", registration waiting"));
+  });
+  EXPECT_TRUE(service().listener(platform_.listener(), connection));
+  EXPECT_THAT(takeJournal(), ElementsAre(newConnectionLine("connection with set-up"),
+                                         "exported interface", newClientLine(44), "exported object",
+                                         "interruption handler, registration waiting",
+                                         "invalidation handler, registration waiting",
+                                         "resumed, registration waiting"));
 }
 
 TEST_F(QVReportingServiceDelegateTest, NamesTheSourceFileOfItsLines) {
@@ -165,9 +197,14 @@ TEST_F(QVReportingServiceDelegateTest, AcceptsWhoeverComes) {
   EXPECT_EQ(service().getAllClients().size(), 4u);
 }
 
-TEST_F(QVReportingServiceDelegateTest, ListsClientsInTheOrderOfTheirRegistration) {
-  const QVTestClient& first = connectClient(42);
-  const QVTestClient& second = connectClient(43);
+TEST_F(QVReportingServiceDelegateTest, AcceptsTwoProcessesAndListsThemInOrderOfRegistration) {
+  QVTestClient& first = connectClient(42);
+  QVTestClient& second = connectClient(43);
+  EXPECT_TRUE(first.connection().isResumed());
+  EXPECT_TRUE(second.connection().isResumed());
+  EXPECT_THAT(takeJournal(),
+              ElementsAre(newConnectionLine("connection 1 of process 42"), newClientLine(42),
+                          newConnectionLine("connection 2 of process 43"), newClientLine(43)));
   EXPECT_THAT(service().getAllClients(), IsEmpty()) << "registered on the server queue only";
   runUntilIdle();
   EXPECT_THAT(service().getAllClients(), ElementsAre(first.instance(), second.instance()));
@@ -250,24 +287,20 @@ TEST_F(QVReportingServiceDelegateTest, FindsTheFirstClientsSession) {
   QVTestClient& first = clientWithSession(42, 7);
   clientWithSession(43, 7);
   EXPECT_EQ(service().findReportingSessionForID(7), first.session(7));
-  EXPECT_THAT(takeJournal(),
-              ElementsAre(hostLine(info, kLookup, "found reporting session 7 for client 42")));
+  EXPECT_THAT(takeJournal(), ElementsAre(lookupHit(7, 42)));
 }
 
 TEST_F(QVReportingServiceDelegateTest, FindsALaterClientsSession) {
   clientWithSession(42, 7);
   QVTestClient& second = clientWithSession(43, -9);
   EXPECT_EQ(service().findReportingSessionForID(-9), second.session(-9));
-  EXPECT_THAT(takeJournal(),
-              ElementsAre(hostLine(info, kLookup, "found reporting session -9 for client 43")));
+  EXPECT_THAT(takeJournal(), ElementsAre(lookupHit(-9, 43)));
 }
 
 TEST_F(QVReportingServiceDelegateTest, ComplainsAboutASessionThatNobodyHas) {
   clientWithSession(42, 7);
   EXPECT_EQ(service().findReportingSessionForID(INT64_MIN), nullptr);
-  EXPECT_THAT(takeJournal(),
-              ElementsAre(hostLine(error, kLookup,
-                                   "failed to find reporting session -9223372036854775808")));
+  EXPECT_THAT(takeJournal(), ElementsAre(lookupFailure(INT64_MIN)));
 }
 
 TEST_F(QVReportingServiceDelegateTest, NeverFindsSessionZero) {
@@ -294,7 +327,7 @@ TEST_F(QVReportingServiceDelegateTest, FindsASessionWhileItSetsUpAConnection) {
   QVTestClient& client = clientWithSession(42, 7);
   std::shared_ptr<QVReportingSession> found;
   const auto connection = std::make_shared<ConnectionWithSetUp>(
-      [&] { found = service().findReportingSessionForID(7); });
+      [&](std::string_view) { found = service().findReportingSessionForID(7); });
   EXPECT_TRUE(service().listener(platform_.listener(), connection));
   EXPECT_EQ(found, client.session(7));
 }
@@ -309,16 +342,18 @@ TEST_F(QVReportingServiceDelegateTest, FindsASessionWhileItLooksForAnother) {
   });
   EXPECT_EQ(service().findReportingSessionForID(99), nullptr);
   EXPECT_EQ(found, client.session(7));
-  EXPECT_THAT(takeJournal(),
-              ElementsAre(hostLine(info, kLookup, "found reporting session 7 for client 42"),
-                          hostLine(error, kLookup, "failed to find reporting session 99")));
+  EXPECT_THAT(takeJournal(), ElementsAre(lookupHit(7, 42), lookupFailure(99)));
 }
 
 TEST_F(QVReportingServiceDelegateTest, KeepsOtherThreadsWaitingWhileItSetsUpAConnection) {
-  LookUpOfAnotherThread lookUp(service());
-  const auto connection = std::make_shared<ConnectionWithSetUp>([&] { lookUp.begin(); });
-  EXPECT_TRUE(service().listener(platform_.listener(), connection));
-  EXPECT_FALSE(lookUp.hadEndedMeanwhile());
+  for (const std::string_view locked : {"exported interface", "exported object"}) {
+    LookUpOfAnotherThread lookUp(service());
+    const auto connection = std::make_shared<ConnectionWithSetUp>([&](std::string_view step) {
+      if (step == locked) lookUp.begin();
+    });
+    EXPECT_TRUE(service().listener(platform_.listener(), connection));
+    EXPECT_FALSE(lookUp.hadEndedMeanwhile()) << locked;
+  }
 }
 
 TEST_F(QVReportingServiceDelegateTest, KeepsOtherThreadsWaitingWhileItLooksForASession) {

@@ -19,23 +19,8 @@ constexpr std::string_view kStop = "stopReportingSessionForID:reply:";
 constexpr std::string_view kDestroy = "destroyReportingSession:reply:";
 constexpr std::string_view kValid = "reporterID:valid:";
 
-std::string lookupFailure(int64_t reporterID) {
-  return hostLine(
-      error, "findReportingSessionForID:", QVText("failed to find reporting session ", reporterID));
-}
-std::string lookupHit(int64_t reporterID, int32_t pid) {
-  return hostLine(info, "findReportingSessionForID:",
-                  QVText("found reporting session ", reporterID, " for client ", pid));
-}
-
 class QVReportingSessionControlTest : public QVServiceFixture {
  protected:
-  QVTestClient& registeredClient(int32_t pid) {
-    QVTestClient& client = connectClient(pid);
-    runUntilIdle();
-    journal_.forget();
-    return client;
-  }
   std::vector<std::string> run() {
     runUntilIdle();
     return takeJournal();
@@ -190,11 +175,24 @@ TEST_F(QVReportingSessionControlTest, MergesConfigurationsIntoTheUserInformation
             (QVDictionary{{"HostApplicationDisplayID", "player"}, {"rate", 48000}}));
 }
 
+TEST_F(QVReportingSessionControlTest, AnswersAConfigurationOnceTheSessionHasIt) {
+  QVTestClient& client = clientWithSession(42, 7);
+  client.connection().call().setConfiguration({{"rate", 48000}}, 7, [&](bool) {
+    journal_.note(QVText("reply with ", client.session(7)->userInfo()));
+  });
+  EXPECT_THAT(run(), ElementsAre(R"(reply with {"rate":48000})"));
+}
+
 TEST_F(QVReportingSessionControlTest, ConfiguresSessionZero) {
   QVTestClient& client = registeredClient(42);
   client.create(0);
   client.setConfiguration({{"a", 1}}, 0);
-  runUntilIdle();
+  EXPECT_THAT(run(), ElementsAre(traceEntry(kTraceCreate),
+                                 sessionLine(info, "initWithID:processIdentifiers:",
+                                             "created reporting session for ID: 0"),
+                                 traceEntry(kTraceSessionCreated),
+                                 clientLine(standard, kCreate, "session created for reporter 0"),
+                                 "reply 42 create 0: YES", "reply 42 setConfiguration 0: YES"));
   EXPECT_EQ(client.session(0)->userInfo(), (QVDictionary{{"a", 1}}));
 }
 
@@ -259,13 +257,15 @@ TEST_F(QVReportingSessionControlTest, NeitherStartsNorStopsNorDestroysSessionZer
 // ---- destroy
 
 TEST_F(QVReportingSessionControlTest, DestroysASession) {
+  makeSessionsVerbose();
   QVTestClient& client = clientWithSession(42, 7);
   client.destroy(7);
-  EXPECT_THAT(run(), ElementsAre(traceEntry(kTraceDestroy),
-                                 sessionLine(info, "dealloc", "deallocing this session 7"),
-                                 traceEntry(kTraceSessionDestroyed),
-                                 clientLine(standard, kDestroy, "destroying 7"),
-                                 "reply 42 destroy 7: YES"));
+  EXPECT_THAT(
+      run(), ElementsAre(traceEntry(kTraceDestroy),
+                         sessionLine(info, "dealloc", "deallocing this session 7"),
+                         traceEntry(kTraceSessionDestroyed),
+                         clientLine(standard, kDestroy, "destroying 7"), "reply 42 destroy 7: YES"))
+      << "not stopped, since it was not started";
   EXPECT_EQ(client.session(7), nullptr);
 }
 
