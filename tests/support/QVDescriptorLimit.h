@@ -6,6 +6,13 @@
 #include <sys/resource.h>
 #include <unistd.h>
 
+// AddressSanitizer opens a pipe to look at an object, and calls it broken where it gets none.
+#if defined(__SANITIZE_ADDRESS__)
+inline constexpr bool kObjectsNeedDescriptors = true;
+#else
+inline constexpr bool kObjectsNeedDescriptors = false;
+#endif
+
 // While it lives this process gets no more descriptors than so many.
 //
 // Threads: one at a time; every thread is held to it.

@@ -30,6 +30,8 @@ namespace {
 // Connections that may wait for the keeper to take them, and of those it took, that may wait for
 // their own request. Scripts have one or two.
 constexpr int kBacklog = 16;
+// For a keeper at which so many wait that there is no place for one more.
+constexpr std::chrono::seconds kPlaceLimit{1};
 constexpr std::size_t kMostConnections = 16;
 // Bytes of an answer: a status and a text for people.
 constexpr std::size_t kAnswerBytes = 4096;
@@ -88,18 +90,20 @@ QVDescriptor makeSocket() {
   return made;
 }
 
-// At once or not at all: whoever has taken a keeper's name, and takes no connections, holds nobody
-// up. The socket is one that does not block.
+// At once or, where the socket blocks, within kPlaceLimit, or not at all: whoever has taken a
+// keeper's name, and takes no connections, holds nobody up.
 bool connectTo(int socket, const sockaddr_un& address) {
   return ::connect(socket, reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0;
 }
 
-// From now on the socket blocks, for that long.
+// From now on the socket blocks, for that long where it receives, and a moment where it connects.
 void waitFor(int socket, std::chrono::milliseconds patience) {
   const auto seconds = std::chrono::floor<std::chrono::seconds>(patience);
   const std::chrono::microseconds rest = patience - seconds;
   const timeval limit{.tv_sec = seconds.count(), .tv_usec = rest.count()};
   ::setsockopt(socket, SOL_SOCKET, SO_RCVTIMEO, &limit, sizeof limit);
+  const timeval place{.tv_sec = kPlaceLimit.count(), .tv_usec = 0};
+  ::setsockopt(socket, SOL_SOCKET, SO_SNDTIMEO, &place, sizeof place);
   ::fcntl(socket, F_SETFL, ::fcntl(socket, F_GETFL) & ~O_NONBLOCK);
 }
 
@@ -307,6 +311,7 @@ QVDescriptor QVSessionKeeper::listenFor(int64_t reporterID) const {
 
 void QVSessionKeeper::ask(int64_t reporterID, Request request) const {
   const QVDescriptor connection = makeSocket();
+  waitFor(connection.get(), patience_);
   if (!connectTo(connection.get(), address(reporterID))) {
     // Its own, or one of somebody who has taken the name.
     if (errno == EAGAIN) {
@@ -324,7 +329,6 @@ void QVSessionKeeper::ask(int64_t reporterID, Request request) const {
     throw QVToolFailure(QVToolStatus::notPermitted,
                         QVText("session ", reporterID, " is another user's"));
   }
-  waitFor(connection.get(), patience_);
   const char byte = static_cast<char>(request);
   if (::send(connection.get(), &byte, 1, MSG_NOSIGNAL) != 1) {
     throw QVToolFailure::ofSystem("the session's keeper", errno);

@@ -98,7 +98,7 @@ void QVBusConnection::continueReading() {
   if (unwritten() > kMostUnwritten) return;
   if (!isAdmitted()) return;
   waitsToRead_ = true;
-  socket_.waitReadable([weak = weak_from_this()] { take(weak, &QVBusConnection::onReadable); });
+  socket_.waitReadable([weak = weak_from_this()] { read(weak); });
 }
 
 // If the intake budget does not admit the connection, sees to it that it goes on later.
@@ -121,7 +121,16 @@ void QVBusConnection::onError() {
   continueReading();
 }
 
+void QVBusConnection::read(const std::weak_ptr<QVBusConnection>& connection) noexcept {
+  take(connection, &QVBusConnection::onReadable);
+}
+
 void QVBusConnection::onReadable() {
+  // Calls of one client come behind the end of another that was noticed before.
+  if (server_.readsNobody()) {
+    server_.readLater(*this);
+    return;
+  }
   waitsToRead_ = false;
   // Replies may have piled up since the wait began.
   if (unwritten() <= kMostUnwritten) {

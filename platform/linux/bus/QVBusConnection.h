@@ -58,6 +58,8 @@ class QVBusConnection final : public QVIPCConnection,
   void invalidate();
   // Reads on where nothing is in the way; called again whenever something no longer is.
   void continueReading();
+  // Reads what is there, at any time.
+  static void read(const std::weak_ptr<QVBusConnection>& connection) noexcept;
   uint64_t number() const noexcept { return number_; }
 
  private:

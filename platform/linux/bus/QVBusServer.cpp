@@ -74,8 +74,22 @@ void QVBusServer::runAfterCalls(QVFunction<void()> work) {
     loop_.post([this, work = std::move(work)]() mutable {
       --waitingForCalls_;
       work();
+      if (waitingForCalls_ == 0) readUnread();
     });
   });
+}
+
+void QVBusServer::readLater(const QVBusConnection& connection) {
+  unread_.push_back(connection.number());
+}
+
+// At once, each of them: whoever comes and goes all the time keeps nobody from being read.
+void QVBusServer::readUnread() {
+  for (const uint64_t number : std::exchange(unread_, {})) {
+    const auto found = connections_.find(number);
+    if (found == connections_.end()) continue;
+    QVBusConnection::read(found->second);
+  }
 }
 
 void QVBusServer::letGoAfterCalls(std::shared_ptr<QVReportingServiceProtocol> object) {

@@ -11,6 +11,7 @@
 #include <string>
 #include <unordered_map>
 #include <unordered_set>
+#include <vector>
 
 class QVBusConnection;
 class QVBusLoop;
@@ -55,8 +56,12 @@ class QVBusServer {
   void forget(const QVBusConnection& connection);
   // Calls continueReading() again when the budget admits more.
   void resumeWhenAdmitted(const QVBusConnection& connection);
-  // Runs the work here, behind what exported objects have been asked to do so far.
+  // Runs the work here, behind what exported objects have been asked to do so far and before what
+  // they are asked to do from now on: until then connections are not read.
   void runAfterCalls(QVFunction<void()> work);
+  bool readsNobody() const noexcept { return waitingForCalls_ > 0; }
+  // Calls onReadable() again when they are.
+  void readLater(const QVBusConnection& connection);
   // Lets go of an exported object where its calls are carried out, and behind them: with it goes
   // what belongs to that thread.
   void letGoAfterCalls(std::shared_ptr<QVReportingServiceProtocol> object);
@@ -67,6 +72,7 @@ class QVBusServer {
   static constexpr std::size_t kReadBuffer = std::size_t{64} << 10;
 
   void resumeAdmitted();
+  void readUnread();
 
   QVBusLoop& loop_;
   const std::string identifier_;
@@ -79,4 +85,5 @@ class QVBusServer {
   QVFunction<void()> closedHandler_;
   AfterCalls afterCalls_;
   std::size_t waitingForCalls_ = 0;  // pieces of work
+  std::vector<uint64_t> unread_;     // that are readable meanwhile
 };

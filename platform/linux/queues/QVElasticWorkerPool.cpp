@@ -40,7 +40,10 @@ void QVElasticWorkerPool::runUnattended() {
   while (!ready_.empty()) {
     sendForWorker();
     if (workerCount_ > 0) return;
-    runFirst(lock);
+    QVWorkItem task = takeFirst();
+    lock.unlock();
+    run(task);
+    lock.lock();
   }
 }
 
@@ -98,22 +101,29 @@ void QVElasticWorkerPool::work() {
   QVMutexLock lock(mutex_);
   workerIsComing_ = false;
   do {
-    while (!ready_.empty()) runFirst(lock);
+    while (!ready_.empty()) {
+      QVWorkItem task = takeFirst();
+      lock.unlock();
+      run(task);
+      lock.lock();
+    }
   } while (rest(lock));
   std::thread previous = retire();
   lock.unlock();
   if (previous.joinable()) previous.join();
 }
 
-// Runs the task that has waited longest, without the lock.
-void QVElasticWorkerPool::runFirst(QVMutexLock& lock) {
+// The task that has waited longest.
+QVWorkItem QVElasticWorkerPool::takeFirst() {
   QVWorkItem task = std::move(ready_.front());
   ready_.pop_front();
   if (!ready_.empty()) sendForWorker();
-  lock.unlock();
+  return task;
+}
+
+void QVElasticWorkerPool::run(QVWorkItem& task) {
   QVRunWorkItem(task, name_, log_);
   ledger_.leave();
-  lock.lock();
 }
 
 // Waits to be wanted; false where the worker is not needed any more.

@@ -69,7 +69,8 @@ class QVElasticWorkerPool final : public QVWorkExecutor {
   void addWorker() QV_REQUIRES(mutex_);
   bool sayWhyThereIsNoThread(std::string_view reason) const noexcept;
   void work();
-  void runFirst(QVMutexLock& lock) QV_REQUIRES(mutex_);
+  QVWorkItem takeFirst() QV_REQUIRES(mutex_);
+  void run(QVWorkItem& task);
   bool rest(QVMutexLock& lock) QV_REQUIRES(mutex_);
   std::thread retire() QV_REQUIRES(mutex_);
 

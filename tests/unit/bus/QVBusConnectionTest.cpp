@@ -346,6 +346,24 @@ TEST_F(QVBusCallsTest, AreCarriedOutBeforeTheInvalidationThatFollowsAnInterrupti
   EXPECT_EQ(journal_, (Journal{"1 interruption", "1 invalidation"}));
 }
 
+TEST_F(QVBusCallsTest, OfOthersComeBehindAnEndThatWasNoticedBefore) {
+  connect();
+  connect();
+  connect();
+  peer(1).hangUp();
+  run();
+  peer(2).send(create(2, 2));
+  peer(3).hangUp();
+  run();
+  EXPECT_EQ(journal_, Journal{});
+  carryOut();
+  EXPECT_EQ(journal_, (Journal{"1 invalidation", "2 create 2"}));
+  carryOut();
+  EXPECT_EQ(journal_, (Journal{"1 invalidation", "2 create 2", "3 invalidation"}));
+  EXPECT_TRUE(peer(2).receiveAnswers().at(0).boolean());
+  EXPECT_EQ(exchange(create(4, 4), 2).size(), 1U) << "it is read on";
+}
+
 TEST_F(QVBusCallsTest, AreWhereTheObjectIsLetGoOf) {
   connect();
   const std::weak_ptr<QVRecordingService> weak = services_[0];
@@ -364,7 +382,7 @@ TEST_F(QVBusCallsTest, AreAwaitedWhenTheServiceEnds) {
   connect();
   server_->invalidateAll();
   EXPECT_EQ(journal_, Journal{});
-  std::thread queue([this, waiting = std::exchange(waiting_, {})]() mutable {
+  std::thread queue([waiting = std::exchange(waiting_, {})]() mutable {
     for (QVFunction<void()>& work : waiting) work();
   });
   server_->awaitCalls();

@@ -108,6 +108,8 @@ TEST_F(QVEventStoreThreadTest, GivesUpTheOldestAndCountsThem) {
               kEvents - count(table))
         << "others than the oldest were given up";
   }
+  // Behind the end of the outage.
+  EXPECT_EQ(findBackends(), QVArray{"store"});
   const int64_t lost = 2 * kEvents - messages - events;
   EXPECT_THAT(losses(), ElementsAre(QVText("store_error|", lost)));
   EXPECT_THAT(lines(QVLogLevel::standard), ElementsAre(recovery(lost)));
