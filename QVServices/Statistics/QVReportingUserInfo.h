@@ -30,18 +30,18 @@ class QVReportingUserInfo {
 
   // Bytes: a configuration is names and numbers, far smaller than this. It goes into each start's
   // row, and a session's share of what all have must not be the whole.
-  static constexpr std::size_t kMaximumBytes = std::size_t{1} << 20;
+  static constexpr std::size_t kMaximumBytes = std::size_t{64} << 10;
 
   // Adds all entries; those of keys that are there already are replaced. Nothing is added where
   // the contents would become larger than kMaximumBytes, or those of all sessions than the
-  // account's maximum. The entries themselves are not kept.
-  [[nodiscard]] Addition addEntries(const QVDictionary& entries) {
+  // account's maximum, but for what `mayOverdraw`. The entries themselves are not kept.
+  [[nodiscard]] Addition addEntries(const QVDictionary& entries, bool mayOverdraw = false) {
     if (entries.empty()) return Addition::done;
     if (entries.footprint() > kMaximumBytes) return Addition::tooLargeForOne;
     const std::lock_guard lock(mutex_);
     QVDictionary merged = contents_.merging(entries, &account_);
     if (merged.footprint() > kMaximumBytes) return Addition::tooLargeForOne;
-    if (account_.isOverdrawn()) return Addition::tooLargeForAll;
+    if (!mayOverdraw && account_.isOverdrawn()) return Addition::tooLargeForAll;
     contents_ = std::move(merged);
     return Addition::done;
   }

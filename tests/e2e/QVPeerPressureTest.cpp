@@ -16,7 +16,7 @@ using ::testing::ElementsAre;
 
 class QVPeerPressureTest : public QVEndToEndTest {
  protected:
-  // From now on clients get no descriptors of the service's but those it has: a quarter of those
+  // From now on clients get no descriptors of the service's but those it has: an eighth of those
   // that it may have it keeps for itself.
   void useUpDescriptors() {
     const std::string folder = "/proc/" + std::to_string(service().pid()) + "/fd/";
@@ -24,7 +24,7 @@ class QVPeerPressureTest : public QVEndToEndTest {
     while (std::filesystem::is_symlink(folder + std::to_string(lowestFree))) ++lowestFree;
     rlimit limits{};
     ASSERT_EQ(::prlimit(service().pid(), RLIMIT_NOFILE, nullptr, &limits), 0);
-    limits.rlim_cur = lowestFree + lowestFree / 3;
+    limits.rlim_cur = lowestFree + lowestFree / 7;
     ASSERT_EQ(::prlimit(service().pid(), RLIMIT_NOFILE, &limits, nullptr), 0);
   }
 

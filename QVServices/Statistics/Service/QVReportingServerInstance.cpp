@@ -84,6 +84,15 @@ std::shared_ptr<QVReportingSession> QVReportingServerInstance::findReportingSess
   return delegate ? delegate->findReportingSessionForID(reporterID) : nullptr;
 }
 
+// None where the look-up fails.
+std::shared_ptr<QVReportingSession> QVReportingServerInstance::sessionOfAnyClient(
+    const QVLogSite& site, int64_t reporterID) const {
+  std::shared_ptr<QVReportingSession> found;
+  run(site, "find the session of reporter", reporterID,
+      [&] { found = findReportingSessionForID(reporterID, true); });
+  return found;
+}
+
 void QVReportingServerInstance::createReportingSession(int64_t reporterID, Reply<bool> reply) {
   log().verbose(scope(), "-[QVReportingServerInstance createReportingSession:reply:]",
                 "creating session for reporter ", reporterID);
@@ -144,13 +153,15 @@ void QVReportingServerInstance::getServiceNameForReporterID(int64_t reporterID,
 
 void QVReportingServerInstance::answerServiceType(int64_t reporterID,
                                                   Reply<uint16_t>& reply) const {
+  constexpr const char* kFunction =
+      "-[QVReportingServerInstance getServiceNameForReporterID:reply:]";
   // ID 0 is answered at once and, as clients have come to expect, once more below.
   if (reporterID == 0) reply(kQVReportingServiceTypeUnknown);
-  const auto session = findReportingSessionForID(reporterID, true);
+  const auto session = sessionOfAnyClient(kFunction, reporterID);
   const uint16_t answer = session ? session->serviceType() : kQVReportingServiceTypeUnknown;
   reply(answer);
-  log().standard(scope(), "-[QVReportingServerInstance getServiceNameForReporterID:reply:]",
-                 "returnning service type ", answer, " for reporter  ", reporterID);
+  log().standard(scope(), kFunction, "returnning service type ", answer, " for reporter  ",
+                 reporterID);
 }
 
 void QVReportingServerInstance::setConfiguration(QVDictionary configuration, int64_t forReporterID,
@@ -182,7 +193,7 @@ void QVReportingServerInstance::startReportingSessionForID(int64_t reporterID, R
 void QVReportingServerInstance::start(int64_t reporterID, Reply<bool> reply) {
   constexpr const char* kFunction =
       "-[QVReportingServerInstance startReportingSessionForID:reply:]";
-  const auto session = reporterID == 0 ? nullptr : findReportingSessionForID(reporterID, true);
+  const auto session = reporterID == 0 ? nullptr : sessionOfAnyClient(kFunction, reporterID);
   if (session == nullptr || session->started()) {
     reply(true);
     return;
@@ -280,7 +291,7 @@ void QVReportingServerInstance::reporterID(int64_t reporterID, Reply<QVDictionar
 void QVReportingServerInstance::answerValidity(int64_t reporterID,
                                                Reply<QVDictionary>& reply) const {
   constexpr const char* kFunction = "-[QVReportingServerInstance reporterID:valid:]";
-  const auto session = findReportingSessionForID(reporterID, true);
+  const auto session = sessionOfAnyClient(kFunction, reporterID);
   run(kFunction, "log the validation of reporter", reporterID,
       [reporterID] { log().standard(scope(), kFunction, "validating reporter ", reporterID); });
   reply({{"reporterID", session ? reporterID : int64_t{0}},
@@ -295,13 +306,16 @@ void QVReportingServerInstance::getAllReporters(Reply<std::vector<int64_t>> repl
 
 void QVReportingServerInstance::answerAllReporters(Reply<std::vector<int64_t>>& reply) const {
   std::vector<int64_t> reporterIDs;
-  if (const auto delegate = delegate_.lock()) {
-    for (const auto& client : delegate->getAllClients()) {
-      for (const auto& [reporterID, session] : client->clientReportingSessionMap()) {
-        reporterIDs.push_back(reporterID);
-      }
-    }
-  }
+  run("-[QVReportingServerInstance getAllReporters:]", "list the reporters for client",
+      processIdentifier_, [&] {
+        const auto delegate = delegate_.lock();
+        if (delegate == nullptr) return;
+        for (const auto& client : delegate->getAllClients()) {
+          for (const auto& [reporterID, session] : client->clientReportingSessionMap()) {
+            reporterIDs.push_back(reporterID);
+          }
+        }
+      });
   reply(std::move(reporterIDs));
 }
 

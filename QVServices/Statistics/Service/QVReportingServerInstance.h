@@ -78,6 +78,9 @@ class QVReportingServerInstance final
   QVReportingServerInstance(int32_t pid,
                             std::weak_ptr<QVReportingServiceDelegateProtocol> delegate);
 
+  std::shared_ptr<QVReportingSession> sessionOfAnyClient(const QVLogSite& site,
+                                                         int64_t reporterID) const;
+
   // The work of the operations, on the server queue.
   void create(int64_t reporterID, Reply<bool>& reply);
   void start(int64_t reporterID, Reply<bool> reply);

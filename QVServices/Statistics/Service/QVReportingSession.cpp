@@ -90,16 +90,18 @@ void QVReportingSession::setServiceType(uint16_t serviceType) {
 }
 
 void QVReportingSession::setConfiguration(const QVDictionary& configuration) {
-  addUserInformation(configuration, "-[QVReportingSession setConfiguration:]");
+  addUserInformation(configuration, "-[QVReportingSession setConfiguration:]", false);
 }
 
 void QVReportingSession::updateDefaults(const QVDictionary& defaults) {
-  addUserInformation(defaults, "-[QVReportingSession updateDefaults:]");
+  // The service's own are not what clients can keep away.
+  addUserInformation(defaults, "-[QVReportingSession updateDefaults:]", true);
 }
 
-void QVReportingSession::addUserInformation(const QVDictionary& entries, const QVLogSite& site) {
+void QVReportingSession::addUserInformation(const QVDictionary& entries, const QVLogSite& site,
+                                            bool mayOverdraw) {
   using enum QVReportingUserInfo::Addition;
-  switch (userInfo_->addEntries(entries)) {
+  switch (userInfo_->addEntries(entries, mayOverdraw)) {
     case done:
       break;
     case tooLargeForOne:

@@ -122,7 +122,7 @@ class QVReportingSession final : public QVReportingSessionInformation,
 
   QVReportingSession(int64_t reporterID, std::vector<int32_t> processes, std::size_t maximumBytes);
 
-  void addUserInformation(const QVDictionary& entries, const QVLogSite& site);
+  void addUserInformation(const QVDictionary& entries, const QVLogSite& site, bool mayOverdraw);
   void setUpBeaconSession(std::optional<std::string_view> name, uint16_t type, bool startFlag);
   void sendOnBeaconQueue(const Message& message);
   void flushBeaconSession();

@@ -63,6 +63,7 @@ void QVBusConnection::resume() {
   outbox_ = std::make_shared<QVBusOutbox>([&loop = server_.loop(), weak = weak_from_this()] {
     loop.post([weak] { take(weak, &QVBusConnection::onWake); });
   });
+  server_.settleAfterCalls(shared_from_this());
   continueReading();
 }
 
@@ -77,7 +78,7 @@ void QVBusConnection::attempt(const QVLogSite& site, Work&& work) const noexcept
   }
 }
 
-void QVBusConnection::take(const std::weak_ptr<QVBusConnection>& connection, Step step) noexcept {
+void QVBusConnection::take(const Handle& connection, Step step) noexcept {
   const auto self = connection.lock();
   if (self == nullptr) return;
   self->attempt("-[QVBusConnection take:]", [&self, step] {
@@ -90,6 +91,14 @@ void QVBusConnection::take(const std::weak_ptr<QVBusConnection>& connection, Ste
   });
 }
 
+void QVBusConnection::readRest(const Handle& connection) noexcept {
+  take(connection, &QVBusConnection::readToTheEnd);
+}
+
+void QVBusConnection::readOn(const Handle& connection) noexcept {
+  take(connection, &QVBusConnection::continueReading);
+}
+
 // ---- Reading
 
 void QVBusConnection::continueReading() {
@@ -98,7 +107,7 @@ void QVBusConnection::continueReading() {
   if (unwritten() > kMostUnwritten) return;
   if (!isAdmitted()) return;
   waitsToRead_ = true;
-  socket_.waitReadable([weak = weak_from_this()] { read(weak); });
+  socket_.waitReadable([weak = weak_from_this()] { take(weak, &QVBusConnection::onReadable); });
 }
 
 // If the intake budget does not admit the connection, sees to it that it goes on later.
@@ -121,16 +130,7 @@ void QVBusConnection::onError() {
   continueReading();
 }
 
-void QVBusConnection::read(const std::weak_ptr<QVBusConnection>& connection) noexcept {
-  take(connection, &QVBusConnection::onReadable);
-}
-
 void QVBusConnection::onReadable() {
-  // Calls of one client come behind the end of another that was noticed before.
-  if (server_.readsNobody()) {
-    server_.readLater(*this);
-    return;
-  }
   waitsToRead_ = false;
   // Replies may have piled up since the wait began.
   if (unwritten() <= kMostUnwritten) {
@@ -302,35 +302,43 @@ void QVBusConnection::violated(const char* reason) {
   end();
 }
 
-void QVBusConnection::invalidate() {
+void QVBusConnection::invalidate() noexcept {
   if (state_ == State::closed) return;
   const auto self = shared_from_this();
   close();
   end();
 }
 
-void QVBusConnection::close() {
+void QVBusConnection::close() noexcept {
+  constexpr const char* kFunction = "-[QVBusConnection close]";
   if (outbox_ != nullptr) {
-    flush();  // what was answered already, as far as the peer takes it
+    // What was answered already, as far as the peer takes it.
+    attempt(kFunction, [this] { flush(); });
     outbox_->close();
   }
   state_ = State::closed;
   socket_.close();
-  if (charged_ != 0) account_->remove(charged_);
+  if (charged_ != 0) account_->remove(std::exchange(charged_, 0));
   account_.reset();
-  server_.forget(*this);
+  // The rest of it may have to wait for its calls.
+  authentication_.reset();
+  decoder_ = {};
+  std::string().swap(sending_);
+  sent_ = 0;
+  attempt(kFunction, [this] { server_.forget(*this); });
 }
 
-// Behind what the peer asked for, its registration first of all.
-void QVBusConnection::end() {
-  server_.runAfterCalls([self = shared_from_this()] { self->tellTheEnd(); });
+// For the registration of one that was gone at once, and for its calls.
+void QVBusConnection::end() noexcept {
+  if (isSettled_ || !server_.endAfterCalls(shared_from_this())) tellTheEnd();
 }
 
-void QVBusConnection::tellTheEnd() {
-  attempt("-[QVBusConnection invalidate]", [this] {
+void QVBusConnection::tellTheEnd() noexcept {
+  attempt("-[QVBusConnection tellTheEnd]", [this] {
     if (invalidationHandler_) invalidationHandler_();
   });
   interruptionHandler_ = nullptr;
   invalidationHandler_ = nullptr;
-  server_.letGoAfterCalls(std::move(exportedObject_));
+  attempt("-[QVBusConnection tellTheEnd]",
+          [this] { server_.letGoAfterCalls(std::exchange(exportedObject_, nullptr)); });
 }

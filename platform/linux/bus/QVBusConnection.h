@@ -25,12 +25,13 @@ class QVBusServer;
 //
 // It closes when the stream ends, when the peer breaks a rule of the protocol (one line in the log
 // says which) and when the service ends. What came in whole before the stream's end is delivered
-// and carried out first; then the invalidation handler runs. Whatever a step throws, want of memory
-// above all, is one line in the log and the end of this connection alone.
+// first; then the invalidation handler runs, but not before what the listener's delegate enqueued
+// for the connection has: the end of one that is gone at once waits for that, and its calls.
+// Whatever a step throws, want of memory above all, is one line in the log and the end of this
+// connection alone.
 //
 // Threads: the loop's thread only; replies come from any thread, through the outbox.
-// Ownership: the server holds it until it is closed, then what is left to be carried out does;
-// waits and wakes hold it weakly.
+// Ownership: the server holds it until it has told its end; waits and wakes hold it weakly.
 // Limits: not read while more than 1 MiB waits to be written to its peer, nor while the intake
 // budget does not admit it, unless the peer has gone and only the rest is left. An idle connection
 // holds no buffer of more than 4 KiB.
@@ -51,15 +52,18 @@ class QVBusConnection final : public QVIPCConnection,
 
   // The rest is for the server.
 
+  using Handle = std::weak_ptr<QVBusConnection>;
   // Takes in what the peer has sent so far, before the service ends.
-  void readToTheEnd();
-  // Closes; behind the calls that came before, runs the invalidation handler and lets go of the
-  // exported object. May be called again.
-  void invalidate();
+  static void readRest(const Handle& connection) noexcept;
   // Reads on where nothing is in the way; called again whenever something no longer is.
-  void continueReading();
-  // Reads what is there, at any time.
-  static void read(const std::weak_ptr<QVBusConnection>& connection) noexcept;
+  static void readOn(const Handle& connection) noexcept;
+  // Closes, has the invalidation handler run and lets go of the exported object. May be called
+  // again.
+  void invalidate() noexcept;
+  // What was enqueued for it before it was resumed has run.
+  void settle() noexcept { isSettled_ = true; }
+  // Runs the invalidation handler; once.
+  void tellTheEnd() noexcept;
   uint64_t number() const noexcept { return number_; }
 
  private:
@@ -67,7 +71,7 @@ class QVBusConnection final : public QVIPCConnection,
 
   // What waits and wakes call: the step, as long as the connection is there.
   using Step = void (QVBusConnection::*)();
-  static void take(const std::weak_ptr<QVBusConnection>& connection, Step step) noexcept;
+  static void take(const Handle& connection, Step step) noexcept;
   template <class Work>
   void attempt(const QVLogSite& site, Work&& work) const noexcept;
 
@@ -82,9 +86,10 @@ class QVBusConnection final : public QVIPCConnection,
   std::size_t takeMessages(std::string_view bytes);
   const char* takeMessage(std::string_view bytes);
   void violated(const char* reason);
-  void close();
-  void end();
-  void tellTheEnd();
+  void close() noexcept;
+  void end() noexcept;
+  void continueReading();
+  void readToTheEnd();
   void writeAnswers();
   void flush();
   void chargeHeldBytes();
@@ -95,6 +100,7 @@ class QVBusConnection final : public QVIPCConnection,
   QVBusSocket socket_;
   const QVBusSocket::Peer peer_;
   State state_ = State::accepted;
+  bool isSettled_ = false;
 
   std::unique_ptr<QVBusAuthServer> authentication_;  // until it is done
   QVBusFrameDecoder decoder_;

@@ -11,6 +11,7 @@
 #include <cerrno>
 #include <chrono>
 #include <csignal>
+#include <exception>
 #include <system_error>
 #include <utility>
 
@@ -86,8 +87,20 @@ void QVBusListener::resume() {
   ::pthread_sigmask(SIG_UNBLOCK, &ends, nullptr);
   acceptWhenReadable();
   ::sd_notify(0, "READY=1");
-  inside_->loop.run();
+  runLoop();
   endService();
+}
+
+// What escapes is want of memory: the loop goes on.
+void QVBusListener::runLoop() {
+  for (;;) {
+    try {
+      inside_->loop.run();
+      return;
+    } catch (const std::exception&) {
+      QVLogException(*QVPlatform::shared().log, "-[QVBusListener resume]", "the IPC thread");
+    }
+  }
 }
 
 void QVBusListener::endService() {
@@ -97,17 +110,17 @@ void QVBusListener::endService() {
   ::sd_notify(0, "STOPPING=1");
   inside_->server.readToTheEnd();
   inside_->server.invalidateAll();
-  inside_->server.awaitCalls();
+  inside_->server.awaitEnds();
   if (inside_->options.drain) inside_->options.drain();
 }
 
 void QVBusListener::acceptWhenReadable() {
   if (inside_->waits || inside_->ending) return;
-  inside_->waits = true;
   inside_->listening.waitReadable([this] {
     inside_->waits = false;
     acceptAll();
   });
+  inside_->waits = true;
 }
 
 void QVBusListener::acceptAll() {

@@ -11,9 +11,9 @@
 struct QVBusListenerOptions {
   // Of the listening socket, where the service manager hands none over.
   std::string socketPath;
-  // Has something run behind all that exported objects have been asked to do so far, where they do
-  // it: on any thread. A connection's invalidation handler waits for that. Absent: they have done
-  // it when they return.
+  // Has something run behind all that exported objects, and the delegate for them, have been asked
+  // to do so far, where they do it: on any thread. The end of a connection that is gone at once
+  // waits for that, and objects are let go of there. Absent: they have done it when they return.
   QVFunction<void(QVFunction<void()>)> afterCalls{};
   // Runs in resume() after the last connection has been invalidated: waits until all work of the
   // service is done and stored.
@@ -47,6 +47,7 @@ class QVBusListener final : public QVIPCListener {
   struct Inside;
   explicit QVBusListener(std::unique_ptr<Inside> inside);
 
+  void runLoop();
   void acceptWhenReadable();
   void acceptAll();
   void serve(int descriptor) noexcept;

@@ -7,10 +7,14 @@
 
 #include <array>
 #include <chrono>
+#include <exception>
 #include <random>
 #include <utility>
 
 namespace {
+
+// When the service ends, for what clients asked for before: far longer than a queue is ever behind.
+constexpr std::chrono::seconds kLongestWaitForCalls{30};
 
 std::string makeIdentifier() {
   std::random_device random;
@@ -48,7 +52,7 @@ std::shared_ptr<QVBusConnection> QVBusServer::adopt(int descriptor) {
 void QVBusServer::readToTheEnd() {
   const QVWakeUpBatch wakeUps;
   const auto connections = connections_;
-  for (const auto& [number, connection] : connections) connection->readToTheEnd();
+  for (const auto& [number, connection] : connections) QVBusConnection::readRest(connection);
 }
 
 void QVBusServer::invalidateAll() {
@@ -64,40 +68,48 @@ void QVBusServer::forget(const QVBusConnection& connection) {
   if (closedHandler_) closedHandler_();
 }
 
-void QVBusServer::runAfterCalls(QVFunction<void()> work) {
+void QVBusServer::settleAfterCalls(const std::shared_ptr<QVBusConnection>& connection) {
   if (!afterCalls_) {
-    work();
+    connection->settle();
     return;
   }
-  ++waitingForCalls_;
-  afterCalls_([this, work = std::move(work)]() mutable {
-    loop_.post([this, work = std::move(work)]() mutable {
-      --waitingForCalls_;
-      work();
-      if (waitingForCalls_ == 0) readUnread();
+  afterCalls_([&loop = loop_, weak = std::weak_ptr(connection)] {
+    loop.post([weak] {
+      if (const auto self = weak.lock()) self->settle();
     });
   });
 }
 
-void QVBusServer::readLater(const QVBusConnection& connection) {
-  unread_.push_back(connection.number());
+bool QVBusServer::endAfterCalls(const std::shared_ptr<QVBusConnection>& connection) noexcept {
+  if (!afterCalls_) return false;
+  const uint64_t number = connection->number();
+  try {
+    ending_.emplace(number, connection);
+    afterCalls_([this, number] { loop_.post([this, number] { tellTheEnd(number); }); });
+    return true;
+  } catch (const std::exception&) {
+    // For want of memory.
+    ending_.erase(number);
+    return false;
+  }
 }
 
-// At once, each of them: whoever comes and goes all the time keeps nobody from being read.
-void QVBusServer::readUnread() {
-  for (const uint64_t number : std::exchange(unread_, {})) {
-    const auto found = connections_.find(number);
-    if (found == connections_.end()) continue;
-    QVBusConnection::read(found->second);
-  }
+void QVBusServer::tellTheEnd(uint64_t number) {
+  if (auto ended = ending_.extract(number)) ended.mapped()->tellTheEnd();
 }
 
 void QVBusServer::letGoAfterCalls(std::shared_ptr<QVReportingServiceProtocol> object) {
   if (afterCalls_ && object != nullptr) afterCalls_([object = std::move(object)] {});
 }
 
-void QVBusServer::awaitCalls() {
-  while (waitingForCalls_ > 0) loop_.runOne(std::chrono::hours(1));
+void QVBusServer::awaitEnds() {
+  const auto deadline = std::chrono::steady_clock::now() + kLongestWaitForCalls;
+  while (!ending_.empty()) {
+    const auto left = deadline - std::chrono::steady_clock::now();
+    if (left <= std::chrono::steady_clock::duration::zero()) break;
+    loop_.runOne(left);
+  }
+  while (!ending_.empty()) tellTheEnd(ending_.begin()->first);
 }
 
 void QVBusServer::resumeWhenAdmitted(const QVBusConnection& connection) {
@@ -109,7 +121,6 @@ void QVBusServer::resumeAdmitted() {
   for (const uint64_t number : std::exchange(notAdmitted_, {})) {
     const auto found = connections_.find(number);
     if (found == connections_.end()) continue;
-    const auto connection = found->second;
-    connection->continueReading();
+    QVBusConnection::readOn(found->second);
   }
 }

@@ -11,7 +11,6 @@
 #include <string>
 #include <unordered_map>
 #include <unordered_set>
-#include <vector>
 
 class QVBusConnection;
 class QVBusLoop;
@@ -42,8 +41,9 @@ class QVBusServer {
   // Without it, they have always done it when they return.
   using AfterCalls = QVFunction<void(QVFunction<void()>)>;
   void setAfterCalls(AfterCalls afterCalls) { afterCalls_ = std::move(afterCalls); }
-  // Runs the loop until no work waits for calls any more.
-  void awaitCalls();
+  // Runs the loop until every connection that has ended has told so, for half a minute at the most;
+  // then the rest tell it at once.
+  void awaitEnds();
 
   // The rest is for connections.
   QVBusLoop& loop() noexcept { return loop_; }
@@ -56,12 +56,10 @@ class QVBusServer {
   void forget(const QVBusConnection& connection);
   // Calls continueReading() again when the budget admits more.
   void resumeWhenAdmitted(const QVBusConnection& connection);
-  // Runs the work here, behind what exported objects have been asked to do so far and before what
-  // they are asked to do from now on: until then connections are not read.
-  void runAfterCalls(QVFunction<void()> work);
-  bool readsNobody() const noexcept { return waitingForCalls_ > 0; }
-  // Calls onReadable() again when they are.
-  void readLater(const QVBusConnection& connection);
+  // Settles the connection behind what exported objects have been asked to do so far.
+  void settleAfterCalls(const std::shared_ptr<QVBusConnection>& connection);
+  // Has the connection tell its end behind that; false where it has to tell it at once.
+  bool endAfterCalls(const std::shared_ptr<QVBusConnection>& connection) noexcept;
   // Lets go of an exported object where its calls are carried out, and behind them: with it goes
   // what belongs to that thread.
   void letGoAfterCalls(std::shared_ptr<QVReportingServiceProtocol> object);
@@ -72,7 +70,7 @@ class QVBusServer {
   static constexpr std::size_t kReadBuffer = std::size_t{64} << 10;
 
   void resumeAdmitted();
-  void readUnread();
+  void tellTheEnd(uint64_t number);
 
   QVBusLoop& loop_;
   const std::string identifier_;
@@ -84,6 +82,6 @@ class QVBusServer {
   uint64_t lastNumber_ = 0;
   QVFunction<void()> closedHandler_;
   AfterCalls afterCalls_;
-  std::size_t waitingForCalls_ = 0;  // pieces of work
-  std::vector<uint64_t> unread_;     // that are readable meanwhile
+  // Closed, and waiting to tell it.
+  std::unordered_map<uint64_t, std::shared_ptr<QVBusConnection>> ending_;
 };

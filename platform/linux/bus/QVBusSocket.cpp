@@ -36,7 +36,7 @@ bool hasDescriptorForClient(int descriptor) {
   const int lowest = ::fcntl(descriptor, F_DUPFD_CLOEXEC, 0);
   if (lowest < 0) return false;
   ::close(lowest);
-  const auto reserved = std::min<rlim_t>(QVBusSocket::kReservedDescriptors, limit.rlim_cur / 4);
+  const auto reserved = std::min<rlim_t>(QVBusSocket::kReservedDescriptors, limit.rlim_cur / 8);
   return static_cast<rlim_t>(lowest) < limit.rlim_cur - reserved;
 }
 

@@ -36,7 +36,7 @@ class QVBusSocket {
   // where a client waits and only the reserved descriptors are left.
   int accept();
   // Descriptors that clients cannot use up: without one, preferences could not be read, nor the
-  // store opened, nor a session's file written. A quarter of a limit that is small.
+  // store opened, nor a session's file written. An eighth of a limit that is small.
   static constexpr unsigned kReservedDescriptors = 32;
 
   // Calls the handler once, on the loop, when there is something to read (to write), an error

@@ -17,6 +17,8 @@ constexpr std::size_t kMostValues = std::size_t{512} << 10;
 }  // namespace
 
 QVDictionary QVBusValueDecoder::readDictionary(QVBusReader& reader, QVMemoryCharge* charge) {
+  // Of a message that found no memory something is left.
+  tidy();
   refusal_ = nullptr;
   values_ = 0;
   const std::size_t end = reader.enterArray(8);

@@ -186,6 +186,13 @@ bool QVEventStoreWriter::openStore() {
 }
 
 QVEventTables::Opening QVEventStoreWriter::openFile(std::string& reason) {
+  if (access(options_.path.c_str(), F_OK) != 0 && errno == ENOENT) {
+    // Of a file that was moved or removed while other programs had it open: a new one with these
+    // could not be opened.
+    for (const char* const suffix : {"-wal", "-shm"}) {
+      std::remove((options_.path + suffix).c_str());
+    }
+  }
   return tables_.open(options_.path, options_.vfs, now(), reason);
 }
 

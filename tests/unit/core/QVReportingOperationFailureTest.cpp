@@ -60,8 +60,8 @@ TEST_F(QVReportingOperationFailureTest, AnswersASetServiceTypeThatFails) {
 
 TEST_F(QVReportingOperationFailureTest, AnswersAConfigurationThatFails) {
   QVTestClient& client = clientWithSession(42, 7);
-  failLines({"user information of 7 would be larger than 1048576 bytes, nothing added"});
-  client.setConfiguration({{"text", std::string(1'100'000, 'x')}}, 7);
+  failLines({"user information of 7 would be larger than 65536 bytes, nothing added"});
+  client.setConfiguration({{"text", std::string(70'000, 'x')}}, 7);
   runServerQueue();
   EXPECT_THAT(errors(), ElementsAre(clientLine(error, "setConfiguration:forReporterID:reply:",
                                                "failed to configure the session of reporter 7: "
@@ -93,6 +93,26 @@ TEST_F(QVReportingOperationFailureTest, AnswersAValidationThatCannotBeLogged) {
                                                "failed to log the validation of reporter 7: "
                                                "std::bad_alloc")));
   EXPECT_THAT(replies(), ElementsAre(R"(reply 42 validate 7: {"reporterID":7,"serviceType":1})"));
+}
+
+TEST_F(QVReportingOperationFailureTest, AnswersWhereTheLookUpFails) {
+  QVTestClient& client = clientWithSession(42, 7);
+  failLines({"failed to find reporting session 99"});
+  client.getServiceType(99);
+  client.validate(99);
+  client.start(99);
+  runServerQueue();
+  const auto failure = [](std::string_view operation) {
+    return clientLine(error, operation,
+                      "failed to find the session of reporter 99: std::bad_alloc");
+  };
+  EXPECT_THAT(errors(), ElementsAre(failure("getServiceNameForReporterID:reply:"),
+                                    failure("reporterID:valid:"),
+                                    failure("startReportingSessionForID:reply:")));
+  EXPECT_THAT(replies(),
+              ElementsAre("reply 42 getServiceType 99: 65535",
+                          R"(reply 42 validate 99: {"reporterID":0,"serviceType":65535})",
+                          "reply 42 start 99: YES"));
 }
 
 TEST_F(QVReportingOperationFailureTest, ReachesEverySessionWhereASinkFails) {

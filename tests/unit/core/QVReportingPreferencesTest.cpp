@@ -31,13 +31,13 @@ class QVReportingPreferencesTest : public QVServiceFixture {
   // Leaves sessions too little room for the device name of the next notification: they say so, and
   // so tell when they were given the defaults.
   void fillUserInformation(QVTestClient& client, int64_t reporterID) {
-    client.setConfiguration({{"text", std::string(1'048'000, 'x')}}, reporterID);
+    client.setConfiguration({{"text", std::string(65'000, 'x')}}, reporterID);
     setPreference("device_name", std::string(1000, 'n'));
   }
   static std::string complaint(int64_t reporterID) {
     return sessionLine(error, "updateDefaults:",
                        QVText("user information of ", reporterID,
-                              " would be larger than 1048576 bytes, nothing added"));
+                              " would be larger than 65536 bytes, nothing added"));
   }
   // What is written before the sessions are given them.
   std::string readingLine() { return hostLine(standard, kListen, "re-reading quietvox defaults"); }

@@ -50,17 +50,17 @@ class QVReportingSessionTest : public QVServiceFixture {
 
 TEST_F(QVReportingSessionTest, TakesNoMoreUserInformationThanItsLimit) {
   const auto session = makeSession();
-  session->setConfiguration({{"a", 1}, {"text", std::string(600'000, 'x')}});
+  session->setConfiguration({{"a", 1}, {"text", std::string(40'000, 'x')}});
   EXPECT_THAT(takeJournal(), IsEmpty());
-  session->setConfiguration({{"a", 2}, {"more", std::string(600'000, 'x')}});
-  session->updateDefaults({{"all at once", std::string(1'100'000, 'x')}});
+  session->setConfiguration({{"a", 2}, {"more", std::string(40'000, 'x')}});
+  session->updateDefaults({{"all at once", std::string(70'000, 'x')}});
   EXPECT_THAT(
       takeJournal(),
       ElementsAre(sessionLine(error, "setConfiguration:",
-                              "user information of 7 would be larger than 1048576 bytes, nothing "
+                              "user information of 7 would be larger than 65536 bytes, nothing "
                               "added"),
                   sessionLine(error, "updateDefaults:",
-                              "user information of 7 would be larger than 1048576 bytes, nothing "
+                              "user information of 7 would be larger than 65536 bytes, nothing "
                               "added")));
   EXPECT_EQ(*session->userInfo().find("a"), QVValue(1));
   EXPECT_EQ(session->userInfo().size(), 2U);
@@ -71,14 +71,15 @@ TEST_F(QVReportingSessionTest, TakesNoUserInformationWhereAllSessionsHaveTooMuch
   QVReportingUserInfoAccount& account = QVReportingUserInfoAccount::shared();
   account.add(QVReportingUserInfoAccount::kMaximumBytes);
   session->setConfiguration({{"a", 1}});
+  session->updateDefaults({{"device_name", "kitchen"}});
   account.remove(QVReportingUserInfoAccount::kMaximumBytes);
   EXPECT_THAT(takeJournal(),
               ElementsAre(sessionLine(error, "setConfiguration:",
                                       "user information of all sessions would be larger than "
                                       "268435456 bytes, nothing added for 7")));
-  EXPECT_TRUE(session->userInfo().empty());
+  EXPECT_EQ(session->userInfo(), (QVDictionary{{"device_name", "kitchen"}}));
   session->setConfiguration({{"a", 1}});
-  EXPECT_EQ(session->userInfo(), (QVDictionary{{"a", 1}}));
+  EXPECT_EQ(session->userInfo(), (QVDictionary{{"a", 1}, {"device_name", "kitchen"}}));
 }
 
 // A client is not read while too much of what it sent is on its way; what stays is not.

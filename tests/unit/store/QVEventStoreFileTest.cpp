@@ -1,5 +1,6 @@
 #include "platform/linux/store/QVEventStoreError.h"
 #include "platform/linux/store/QVEventStoreSchema.h"
+#include "tests/support/QVSubprocess.h"
 #include "tests/unit/store/QVStoreFixture.h"
 
 #include <filesystem>
@@ -7,6 +8,7 @@
 
 #include <gmock/gmock.h>
 #include <sqlite3.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 namespace {
@@ -191,6 +193,26 @@ TEST_F(QVEventStoreFileTest, GoesOnInANewFileWhereNoSessionStarts) {
   EXPECT_EQ(count("countwise_event"), 1);
   const std::string line = "the event store " + path() + " was moved or removed; opening it anew";
   EXPECT_THAT(lines(QVLogLevel::error), ElementsAre(line, line));
+  EXPECT_THAT(losses(), IsEmpty());
+}
+
+TEST_F(QVEventStoreFileTest, GoesOnInANewFileWhileAReaderHasTheOldOneOpen) {
+  sendSingle({{"n", 1}});
+  flushAll();
+  // Another program, which says that it has read and then waits for commands that do not come.
+  const std::string hasRead = root_.path() / "has-read";
+  const std::string commands = root_.path() / "commands";
+  ASSERT_EQ(::mkfifo(hasRead.c_str(), 0600), 0);
+  ASSERT_EQ(::mkfifo(commands.c_str(), 0600), 0);
+  const QVSubprocess reader({.arguments = {"sqlite3", path(), "SELECT * FROM beacon_message;",
+                                           ".shell echo > " + hasRead, ".read " + commands},
+                             .standardOutputFile = root_.path() / "out"});
+  std::string line;
+  std::getline(std::ifstream(hasRead), line);
+  std::filesystem::rename(path(), path() + ".old");
+  sendSingle({{"n", 2}});
+  flushAll();
+  EXPECT_THAT(rows("SELECT payload FROM beacon_message"), ElementsAre(R"({"n":2})"));
   EXPECT_THAT(losses(), IsEmpty());
 }
 
