@@ -164,8 +164,7 @@ class Requests {
       : service_(service), reporterID_(reporterID) {}
 
   // Serves until the session's end.
-  void serve(int listener, int lost) {
-    const QVSignals signals{SIGINT, SIGTERM};
+  void serve(int listener, int lost, const QVSignals& signals) {
     while (true) {
       std::vector<pollfd> entries{
           {listener, POLLIN, 0}, {signals.descriptor(), POLLIN, 0}, {lost, POLLIN, 0}};
@@ -275,10 +274,12 @@ void QVSessionKeeper::keep(const QVSessionSetup& setup, bool startSession, int c
     if (startSession) {
       service.ask(&QVClient::startReportingSessionForIDAndWait, session, nullptr);
     }
+    // Once others know of the keeper, a signal ends the session with it.
+    const QVSignals signals{SIGINT, SIGTERM};
     send(creator, {QVToolStatus::done, std::to_string(session)});
     if (isHandedOver(creator)) {
       detach();
-      Requests(service, session).serve(listener.get(), lost.get());
+      Requests(service, session).serve(listener.get(), lost.get(), signals);
     } else {
       carryOut(service, session, Request::destroy);
     }
