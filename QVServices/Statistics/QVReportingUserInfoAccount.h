@@ -30,7 +30,6 @@ class QVReportingUserInfoAccount final : public QVMemoryCharge {
   void add(std::size_t bytes) noexcept override { bytes_ += bytes; }
   void remove(std::size_t bytes) noexcept override { bytes_ -= bytes; }
 
-  std::size_t maximumBytes() const noexcept { return maximumBytes_; }
   bool isOverdrawn() const noexcept { return bytes_ > maximumBytes_; }
 
  private:

@@ -421,6 +421,7 @@ void QVEventStoreWriter::giveUpAll(const char* cause) {
       }
     });
     if (events > 0) losses_[cause] += events;
+    lostInOutage_ += events;
     answerFlushes(batch, error);
     queue_.recycle(std::move(batch));
   }

@@ -203,6 +203,22 @@ TEST_F(QVToolSessionTest, IsEndedWithItsKeeper) {
   expectLogged("destroying 7");
 }
 
+// By whoever has read its number, which is before qvctl has let go of it.
+TEST_F(QVToolSessionTest, IsEndedWithAKeeperThatWasJustMade) {
+  service();
+  const std::string pipe = root_.path() / "pipe";
+  ASSERT_EQ(::mkfifo(pipe.c_str(), 0600), 0);
+  QVSubprocess create({.arguments = command({"session", "create", "7", "--json"}),
+                       .environment = environment(),
+                       .standardOutputFile = pipe});
+  std::string line;
+  std::getline(std::ifstream(pipe), line);
+  const QVValue created = parseLines(line + "\n").at(0);
+  ASSERT_EQ(::kill(static_cast<pid_t>(at(created, {"keeper"}).integerValue()), SIGTERM), 0);
+  EXPECT_EQ(create.wait(std::chrono::seconds(60)), 0);
+  expectLogged("destroying 7");
+}
+
 TEST_F(QVToolSessionTest, KeepsNoDescriptorOfTheCaller) {
   service();
   std::array<int, 2> ends{-1, -1};

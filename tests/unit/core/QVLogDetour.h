@@ -2,7 +2,10 @@
 
 #include "platform/QVPlatform.h"
 
+#include <functional>
 #include <memory>
+#include <new>
+#include <set>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -17,6 +20,13 @@ class QVLogDetour final : public QVLog {
   static void install(Detour detour) {
     auto& log = QVPlatform::shared().log;
     log = std::make_unique<QVLogDetour>(std::move(log), std::move(detour));
+  }
+
+  // From now on there is no memory for lines of these texts.
+  static void failLines(const std::set<std::string, std::less<>>& texts) {
+    install([texts](std::string_view text) {
+      if (texts.contains(text)) throw std::bad_alloc();
+    });
   }
 
   QVLogDetour(std::unique_ptr<QVLog> log, Detour detour)

@@ -4,7 +4,6 @@
 #include "tests/unit/core/QVLogDetour.h"
 
 #include <new>
-#include <set>
 #include <stdexcept>
 
 namespace {
@@ -24,12 +23,6 @@ std::string routingError(std::string_view text) {
 
 class QVReportingOperationFailureTest : public QVServiceFixture {
  protected:
-  // From now on there is no memory for lines of these texts.
-  static void failLines(const std::set<std::string, std::less<>>& texts) {
-    QVLogDetour::install([texts](std::string_view text) {
-      if (texts.contains(text)) throw std::bad_alloc();
-    });
-  }
   std::vector<std::string> errors() { return journal_.entries("3["); }
 
   const QVDictionary haptics_{{"EngineOnTime", 12.5}, {"qvreporting_timestamp", 1000}};
@@ -37,7 +30,7 @@ class QVReportingOperationFailureTest : public QVServiceFixture {
 
 TEST_F(QVReportingOperationFailureTest, AnswersACreationThatFails) {
   QVTestClient& client = clientWithSession(42, 7);
-  failLines({"created reporting session for ID: 8"});
+  QVLogDetour::failLines({"created reporting session for ID: 8"});
   client.create(8);
   runServerQueue();
   EXPECT_THAT(errors(), ElementsAre(clientLine(error, "createReportingSession:reply:",
@@ -49,7 +42,7 @@ TEST_F(QVReportingOperationFailureTest, AnswersACreationThatFails) {
 
 TEST_F(QVReportingOperationFailureTest, AnswersASetServiceTypeThatFails) {
   QVTestClient& client = clientWithSession(42, 7);
-  failLines({"service type 2 set for reporter  7"});
+  QVLogDetour::failLines({"service type 2 set for reporter  7"});
   client.setServiceType(2, 7);
   runServerQueue();
   EXPECT_THAT(errors(), ElementsAre(clientLine(error, "setServiceType:reportingSession:reply:",
@@ -60,7 +53,7 @@ TEST_F(QVReportingOperationFailureTest, AnswersASetServiceTypeThatFails) {
 
 TEST_F(QVReportingOperationFailureTest, AnswersAConfigurationThatFails) {
   QVTestClient& client = clientWithSession(42, 7);
-  failLines({"user information of 7 would be larger than 65536 bytes, nothing added"});
+  QVLogDetour::failLines({"user information of 7 would be larger than 65536 bytes, nothing added"});
   client.setConfiguration({{"text", std::string(70'000, 'x')}}, 7);
   runServerQueue();
   EXPECT_THAT(errors(), ElementsAre(clientLine(error, "setConfiguration:forReporterID:reply:",
@@ -72,7 +65,7 @@ TEST_F(QVReportingOperationFailureTest, AnswersAConfigurationThatFails) {
 TEST_F(QVReportingOperationFailureTest, KeepsTheReplyOfAStartThatFailsForTheStop) {
   makeSessionsVerbose();
   QVTestClient& client = clientWithSession(42, 7);
-  failLines({"starting session owned by 7"});
+  QVLogDetour::failLines({"starting session owned by 7"});
   client.start(7);
   runServerQueue();
   EXPECT_THAT(errors(),
@@ -86,7 +79,7 @@ TEST_F(QVReportingOperationFailureTest, KeepsTheReplyOfAStartThatFailsForTheStop
 
 TEST_F(QVReportingOperationFailureTest, AnswersAValidationThatCannotBeLogged) {
   QVTestClient& client = clientWithSession(42, 7);
-  failLines({"validating reporter 7"});
+  QVLogDetour::failLines({"validating reporter 7"});
   client.validate(7);
   runServerQueue();
   EXPECT_THAT(errors(), ElementsAre(clientLine(error, "reporterID:valid:",
@@ -97,7 +90,7 @@ TEST_F(QVReportingOperationFailureTest, AnswersAValidationThatCannotBeLogged) {
 
 TEST_F(QVReportingOperationFailureTest, AnswersWhereTheLookUpFails) {
   QVTestClient& client = clientWithSession(42, 7);
-  failLines({"failed to find reporting session 99"});
+  QVLogDetour::failLines({"failed to find reporting session 99"});
   client.getServiceType(99);
   client.validate(99);
   client.start(99);
@@ -144,7 +137,7 @@ TEST_F(QVReportingOperationFailureTest, ReachesTheOthersWhereOneSessionFails) {
   runUntilIdle();
   journal_.forget();
   takeBeaconStory();
-  failLines({"sending message for session owned by 7"});
+  QVLogDetour::failLines({"sending message for session owned by 7"});
   client.send({{"a", 1}}, {7, 8});
   client.sendToAll({{"a", 2}});
   runUntilIdle();
@@ -158,7 +151,7 @@ TEST_F(QVReportingOperationFailureTest, ReachesTheOthersWhereOneSessionFails) {
 TEST_F(QVReportingOperationFailureTest, ReachesTheOthersWhereOneIsNotFound) {
   QVTestClient& client = clientWithStartedSession(42, 7);
   takeBeaconStory();
-  failLines({"failed to find reporting session 99"});
+  QVLogDetour::failLines({"failed to find reporting session 99"});
   client.send({{"a", 1}}, {99, 7});
   runUntilIdle();
   EXPECT_THAT(errors(), ElementsAre(routingError("failed to find the session of reporter 99: "
@@ -171,7 +164,8 @@ TEST_F(QVReportingOperationFailureTest, ReachesAllWhereTheirListCannotBeLogged) 
   QVTestClient& client = clientWithStartedSession(42, 7);
   takeBeaconStory();
   const std::string sessions = QVText("[", client.session(7)->description(), "]");
-  failLines({"sessions for client 42 : " + sessions, "active reporting sessions 1 : " + sessions});
+  QVLogDetour::failLines(
+      {"sessions for client 42 : " + sessions, "active reporting sessions 1 : " + sessions});
   client.sendToAll({{"a", 1}});
   runUntilIdle();
   EXPECT_THAT(

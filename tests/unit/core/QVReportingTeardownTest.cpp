@@ -6,7 +6,6 @@
 
 #include <memory>
 #include <new>
-#include <set>
 #include <stdexcept>
 #include <utility>
 
@@ -70,12 +69,6 @@ class QVReportingTeardownTest : public QVServiceFixture {
  protected:
   QVReportingTeardownTest() { makeInternalBuild(); }
 
-  // From now on there is no memory for lines of these texts.
-  static void failLines(const std::set<std::string, std::less<>>& texts) {
-    QVLogDetour::install([texts](std::string_view text) {
-      if (texts.contains(text)) throw std::bad_alloc();
-    });
-  }
   static void failFiles() {
     QVPlatform::shared().fileSystem = std::make_unique<ThrowingFileSystem>();
   }
@@ -138,7 +131,7 @@ TEST_F(QVReportingTeardownTest, StopsASessionWhoseFileCannotBeMadeUp) {
 
 TEST_F(QVReportingTeardownTest, StopsASessionThatCannotBeSummedUp) {
   QVTestClient& client = clientThatSent();
-  failLines({"sending summary event for reporter 7"});
+  QVLogDetour::failLines({"sending summary event for reporter 7"});
   client.stop(7);
   runUntilIdle();
   EXPECT_THAT(errors(), ElementsAre(sessionLine(
@@ -153,7 +146,7 @@ TEST_F(QVReportingTeardownTest, StopsASessionThatCannotBeSummedUp) {
 TEST_F(QVReportingTeardownTest, StopsASessionWithoutMemoryForTheErrorLineEither) {
   QVTestClient& client = clientThatSent();
   failFiles();
-  failLines({"failed to write the summary file of reporter 7: std::bad_alloc"});
+  QVLogDetour::failLines({"failed to write the summary file of reporter 7: std::bad_alloc"});
   client.stop(7);
   runUntilIdle();
   EXPECT_THAT(errors(), IsEmpty());
@@ -192,7 +185,7 @@ TEST_F(QVReportingTeardownTest, StartsAgainAfterAStopThatFailed) {
 TEST_F(QVReportingTeardownTest, StopsASessionThatCannotSayThatItEnds) {
   makeSessionsVerbose();
   QVTestClient& client = clientThatSent();
-  failLines({"ending session 7"});
+  QVLogDetour::failLines({"ending session 7"});
   client.stop(7);
   runUntilIdle();
   const auto line =
@@ -205,7 +198,7 @@ TEST_F(QVReportingTeardownTest, StopsASessionThatCannotSayThatItEnds) {
 
 TEST_F(QVReportingTeardownTest, LetsASessionGoThatCannotSayThatItGoes) {
   QVTestClient& client = clientThatSent();
-  failLines({"deallocing this session 7"});
+  QVLogDetour::failLines({"deallocing this session 7"});
   client.destroy(7);
   runUntilIdle();
   EXPECT_THAT(errors(),
@@ -217,7 +210,7 @@ TEST_F(QVReportingTeardownTest, LetsASessionGoThatCannotSayThatItGoes) {
 
 TEST_F(QVReportingTeardownTest, AnswersAStopThatCannotBeLogged) {
   QVTestClient& client = clientThatSent();
-  failLines({"stopping 7"});
+  QVLogDetour::failLines({"stopping 7"});
   client.stop(7);
   runUntilIdle();
   EXPECT_THAT(errors(), ElementsAre(clientLine(
@@ -227,7 +220,7 @@ TEST_F(QVReportingTeardownTest, AnswersAStopThatCannotBeLogged) {
 
 TEST_F(QVReportingTeardownTest, StopsASessionWhoseDriverStatisticsFail) {
   QVTestClient& client = clientThatSent();
-  failLines({"nothing interesting to fetch from the drivers"});
+  QVLogDetour::failLines({"nothing interesting to fetch from the drivers"});
   client.stop(7);
   runUntilIdle();
   EXPECT_THAT(errors(),
@@ -241,7 +234,7 @@ TEST_F(QVReportingTeardownTest, StopsASessionWhoseDriverStatisticsFail) {
 TEST_F(QVReportingTeardownTest, ForgetsADestroyedSessionWhoseStopFails) {
   QVTestClient& client = clientThatSent();
   failFiles();
-  failLines({"destroying 7"});
+  QVLogDetour::failLines({"destroying 7"});
   client.destroy(7);
   runUntilIdle();
   EXPECT_THAT(errors(),

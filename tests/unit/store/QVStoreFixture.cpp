@@ -126,6 +126,22 @@ int64_t QVStoreFixture::number(const std::string& query) const {
   return QVStoreReader(path()).number(query);
 }
 
+int64_t QVStoreFixture::expectNewest(int64_t ofEach) const {
+  const int64_t messages = count("beacon_message");
+  const int64_t events = count("countwise_event");
+  EXPECT_GT(messages, 25);
+  EXPECT_LT(messages, ofEach / 2);
+  EXPECT_LE(events - messages, 1);
+  EXPECT_LE(messages - events, 1);
+  for (const std::string table : {"beacon_message", "countwise_event"}) {
+    EXPECT_EQ(number("SELECT max(json_extract(payload, '$.n')) FROM " + table), ofEach - 1);
+    EXPECT_EQ(number("SELECT min(json_extract(payload, '$.n')) FROM " + table),
+              ofEach - count(table))
+        << "others than the oldest were given up";
+  }
+  return 2 * ofEach - messages - events;
+}
+
 std::vector<std::string> QVStoreFixture::losses() const {
   return rows("SELECT cause, sum(count) FROM loss GROUP BY cause ORDER BY cause");
 }

@@ -62,6 +62,9 @@ class QVStoreFixture : public ::testing::Test {
   std::vector<std::string> rows(const std::string& query) const;
   int64_t count(const std::string& table) const;
   int64_t number(const std::string& query) const;
+  // Of as many messages as analytics events, numbered from 0 as "n" in this order, the newest are
+  // stored, about as many of each; answers how many of both are not.
+  int64_t expectNewest(int64_t ofEach) const;
   // The losses by cause, "cause|count".
   std::vector<std::string> losses() const;
   // Log lines of the level.
