@@ -35,9 +35,8 @@ TEST_F(QVReportingServerInstanceTest, StartsWithItsProcessAndNothingElse) {
 TEST_F(QVReportingServerInstanceTest, TellsOfAProcessBelowZeroAsAnUnsignedNumber) {
   service();
   const auto instance = QVReportingServerInstance::initWithPID(-1, service_);
-  EXPECT_THAT(takeJournal(),
-              ElementsAre(clientLine(standard, "initWithPID:delegate:",
-                                     "new client with pid 18446744073709551615")));
+  EXPECT_THAT(takeJournal(), ElementsAre(clientLine(standard, "initWithPID:delegate:",
+                                                    "new client with pid 18446744073709551615")));
 }
 
 TEST_F(QVReportingServerInstanceTest, HoldsTheDelegateWeakly) {
