@@ -14,6 +14,7 @@ enum Tag : uint8_t {
   kSingle,
   kDouble,
   kString,
+  kKnownText,
   kArray,
   kDictionary,
   // Tags from here on are integers from 0 up.
@@ -54,6 +55,16 @@ void encodeInteger(std::string& out, int64_t value) {
   }
 }
 
+void encodeString(std::string& out, std::string_view text, QVReportingKnownTexts& known) {
+  if (const std::string* const copy = known.keep(text)) {
+    appendTag(out, kKnownText);
+    appendFixed(out, copy);
+  } else {
+    appendTag(out, kString);
+    QVReportingEncodeText(out, text);
+  }
+}
+
 }  // namespace
 
 void QVReportingEncodeNumber(std::string& out, uint64_t number) {
@@ -69,7 +80,7 @@ void QVReportingEncodeText(std::string& out, std::string_view text) {
   out.append(text);
 }
 
-void QVReportingEncodeValue(std::string& out, const QVValue& value) {
+void QVReportingEncodeValue(std::string& out, const QVValue& value, QVReportingKnownTexts& known) {
   switch (value.kind()) {
     case QVValue::Kind::absent:
       appendTag(out, kAbsent);
@@ -88,14 +99,13 @@ void QVReportingEncodeValue(std::string& out, const QVValue& value) {
       encodeReal(out, value.real());
       break;
     case QVValue::Kind::string:
-      appendTag(out, kString);
-      QVReportingEncodeText(out, value.string());
+      encodeString(out, value.string(), known);
       break;
     case QVValue::Kind::array: {
       const QVArray array = value.array();
       appendTag(out, kArray);
       QVReportingEncodeNumber(out, array.size());
-      for (const QVValue& item : array) QVReportingEncodeValue(out, item);
+      for (const QVValue& item : array) QVReportingEncodeValue(out, item, known);
       break;
     }
     case QVValue::Kind::dictionary: {
@@ -104,7 +114,7 @@ void QVReportingEncodeValue(std::string& out, const QVValue& value) {
       QVReportingEncodeNumber(out, dictionary.size());
       for (const auto& entry : dictionary) {
         QVReportingEncodeText(out, entry.key);
-        QVReportingEncodeValue(out, entry.value);
+        QVReportingEncodeValue(out, entry.value, known);
       }
       break;
     }
@@ -155,6 +165,8 @@ QVValue QVReportingPayloadDecoder::value() {
       return QVValue(fixed<double>());
     case kString:
       return QVValue::borrowing(text());
+    case kKnownText:
+      return QVValue::borrowing(*fixed<const std::string*>());
     case kArray: {
       std::vector<QVValue> items(number());
       for (QVValue& item : items) item = value();

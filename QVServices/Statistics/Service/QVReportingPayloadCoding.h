@@ -1,5 +1,6 @@
 #pragma once
 
+#include "QVServices/Statistics/Service/QVReportingKnownTexts.h"
 #include "platform/QVValue.h"
 
 #include <cstdint>
@@ -12,11 +13,13 @@
 //
 // A value is a tag and what the tag asks for: small integers are their own tag, others are
 // variable-length numbers with the sign in the lowest bit; a double that is exact in single
-// precision takes four bytes. Pure functions; any thread.
+// precision takes four bytes; a text that is known already is the address of its one copy.
+// Functions of their arguments alone; any thread.
 
 void QVReportingEncodeNumber(std::string& out, uint64_t number);
 void QVReportingEncodeText(std::string& out, std::string_view text);
-void QVReportingEncodeValue(std::string& out, const QVValue& value);
+// What was encoded with `known` can be decoded as long as that exists.
+void QVReportingEncodeValue(std::string& out, const QVValue& value, QVReportingKnownTexts& known);
 
 // Reads what the functions above wrote, in the same order. The bytes must stay until the values
 // that it answered are gone: strings borrow them.

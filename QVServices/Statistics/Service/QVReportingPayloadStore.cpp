@@ -80,7 +80,8 @@ std::optional<QVReportingPayloadStore::Position> QVReportingPayloadStore::append
     const QVDictionary& payload) {
   {
     const std::lock_guard lock(mutex_);
-    if (chunkBytes_ + payloads_ * kEntryBytes < maximumBytes_) return encode(payload);
+    if (chunkBytes_ + knownTexts_.footprint() + payloads_ * kEntryBytes < maximumBytes_)
+      return encode(payload);
     if (std::exchange(hasRefused_, true)) return std::nullopt;
   }
   if (whenFull_) whenFull_();
@@ -99,7 +100,7 @@ QVReportingPayloadStore::Position QVReportingPayloadStore::encode(const QVDictio
   if (keySet == 0) QVReportingEncodeNumber(scratch_, payload.size());
   for (const auto& entry : payload) {
     if (keySet == 0) QVReportingEncodeText(scratch_, entry.key);
-    QVReportingEncodeValue(scratch_, entry.value);
+    QVReportingEncodeValue(scratch_, entry.value, knownTexts_);
   }
   const Position position = place(scratch_);
   ++payloads_;
@@ -153,5 +154,5 @@ std::string_view QVReportingPayloadStore::interned(uint32_t number) const {
 
 std::size_t QVReportingPayloadStore::footprint() const {
   const std::lock_guard lock(mutex_);
-  return scratch_.capacity() + chunkBytes_;
+  return scratch_.capacity() + chunkBytes_ + knownTexts_.footprint();
 }

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "QVServices/Statistics/Service/QVReportingKnownTexts.h"
 #include "platform/QVFunction.h"
 #include "platform/QVValue.h"
 
@@ -15,8 +16,9 @@
 #include <vector>
 
 // Keeps the payloads of one running session encoded in a fraction of their decoded size: the keys
-// of a payload are kept once per set of keys, values in as few bytes as they need. Shared by the
-// session's two payload arrays, so that a payload is kept once for both.
+// of a payload are kept once per set of keys, texts that come again and again once, other values in
+// as few bytes as they need. Shared by the session's two payload arrays, so that a payload is kept
+// once for both.
 //
 // Append-only; everything goes with the last owner.
 // Threads: any; locked inside, calls out without the lock.
@@ -96,6 +98,7 @@ class QVReportingPayloadStore {
   std::size_t keySetBytes_ = 0;
   std::multimap<std::size_t, std::size_t> keySetsByHash_;
   std::size_t latestKeySet_ = 0;  // index into keySets_; messages come in runs of one kind
+  QVReportingKnownTexts knownTexts_;
   std::vector<Chunk> chunks_;
   std::map<std::string, uint32_t, std::less<>> textNumbers_;
   std::vector<const std::string*> texts_;  // by number: the keys of textNumbers_

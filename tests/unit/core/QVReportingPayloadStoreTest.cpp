@@ -1,3 +1,4 @@
+#include "QVServices/Statistics/Service/QVReportingKnownTexts.h"
 #include "QVServices/Statistics/Service/QVReportingPayloadCoding.h"
 #include "QVServices/Statistics/Service/QVReportingPayloadStore.h"
 #include "platform/QVText.h"
@@ -18,7 +19,8 @@ constexpr double kInfinity = std::numeric_limits<double>::infinity();
 
 QVValue roundTrip(const QVValue& value) {
   std::string bytes;
-  QVReportingEncodeValue(bytes, value);
+  QVReportingKnownTexts known;
+  QVReportingEncodeValue(bytes, value, known);
   QVReportingPayloadDecoder decoder(reinterpret_cast<const uint8_t*>(bytes.data()));
   QVValue decoded = decoder.value();
   return QVValue(decoded);  // a copy: what was decoded borrows the bytes
@@ -26,7 +28,8 @@ QVValue roundTrip(const QVValue& value) {
 
 std::size_t encodedBytes(const QVValue& value) {
   std::string bytes;
-  QVReportingEncodeValue(bytes, value);
+  QVReportingKnownTexts known;
+  QVReportingEncodeValue(bytes, value, known);
   return bytes.size();
 }
 
@@ -84,6 +87,7 @@ TEST(QVReportingPayloadCoding, TakesFewBytesForUsualValues) {
   EXPECT_EQ(encodedBytes(0.5), 5u);
   EXPECT_EQ(encodedBytes(0.1), 9u);
   EXPECT_EQ(encodedBytes("text"), 6u);
+  EXPECT_EQ(encodedBytes(std::string(200, 'x')), 9u) << "once it is known";
 }
 
 TEST(QVReportingPayloadCoding, KeepsNumbersAndTexts) {
@@ -230,6 +234,38 @@ TEST(QVReportingPayloadStore, RemembersNoMoreThanAMebibyteOfKeys) {
   for (int number = 0; number < kSets; ++number) positions.push_back(store.append(message(number)));
   EXPECT_GT(store.footprint(), (kSets - 11) * kKeyBytes) << "ten of them are remembered";
   for (int number = 0; number < kSets; ++number) {
+    ASSERT_EQ(payloadAt(store, positions[static_cast<std::size_t>(number)]), message(number));
+  }
+}
+
+TEST(QVReportingPayloadStore, KeepsTextsThatComeAgainOnce) {
+  constexpr int kMessages = 1000;
+  constexpr std::size_t kTextBytes = 200;
+  QVReportingPayloadStore store;
+  const auto message = [](int number) {
+    return QVDictionary{{"devices", QVArray{QVText(number % 7, std::string(kTextBytes, 'd'))}},
+                        {"number", number},
+                        {"route", QVText(number % 10, std::string(kTextBytes, 'r'))}};
+  };
+  std::vector<QVReportingPayloadStore::Position> positions;
+  for (int number = 0; number < kMessages; ++number)
+    positions.push_back(store.append(message(number)));
+  EXPECT_LT(store.footprint(), kMessages * kTextBytes / 4);
+  for (int number = 0; number < kMessages; ++number) {
+    ASSERT_EQ(payloadAt(store, positions[static_cast<std::size_t>(number)]), message(number));
+  }
+}
+
+TEST(QVReportingPayloadStore, WritesTextsOutBeyondThoseThatItKnows) {
+  constexpr int kMessages = 3000;
+  QVReportingPayloadStore store;
+  const auto message = [](int number) {
+    return QVDictionary{{"title", QVText("A title that comes but once: ", number)}};
+  };
+  std::vector<QVReportingPayloadStore::Position> positions;
+  for (int number = 0; number < kMessages; ++number)
+    positions.push_back(store.append(message(number)));
+  for (int number = 0; number < kMessages; ++number) {
     ASSERT_EQ(payloadAt(store, positions[static_cast<std::size_t>(number)]), message(number));
   }
 }
