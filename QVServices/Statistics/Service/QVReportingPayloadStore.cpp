@@ -60,20 +60,32 @@ uint64_t QVReportingPayloadStore::keySetOf(const QVDictionary& payload) {
   return latestKeySet_ + 1;
 }
 
+QVReportingPayloadStore::Position QVReportingPayloadStore::positionInLatestChunk(
+    std::size_t offset) const {
+  return (Position{chunks_.size() - 1} << kOffsetBits) | offset;
+}
+
 QVReportingPayloadStore::Position QVReportingPayloadStore::place(std::string_view encoded) {
-  if (chunks_.empty() || chunks_.back().capacity - chunks_.back().used < encoded.size()) {
+  if (chunks_.empty() || chunks_.back().capacity() - chunks_.back().size() < encoded.size()) {
     const std::size_t next = chunks_.empty()
                                  ? kFirstChunkBytes
-                                 : std::min(chunks_.back().capacity * 2, kLargestChunkBytes);
-    const std::size_t capacity = std::max(next, encoded.size());
-    chunks_.push_back({std::make_unique_for_overwrite<uint8_t[]>(capacity), 0, capacity});
-    chunkBytes_ += capacity;
+                                 : std::min(chunks_.back().capacity() * 2, kLargestChunkBytes);
+    chunks_.emplace_back().reserve(std::max(next, encoded.size()));
+    chunkBytes_ += chunks_.back().capacity();
   }
-  Chunk& chunk = chunks_.back();
-  std::copy(encoded.begin(), encoded.end(), chunk.bytes.get() + chunk.used);
-  const Position position = (Position{chunks_.size() - 1} << kOffsetBits) | chunk.used;
-  chunk.used += encoded.size();
+  const Position position = positionInLatestChunk(chunks_.back().size());
+  chunks_.back() += encoded;
+  ++payloads_;
   return position;
+}
+
+QVReportingPayloadStore::Position QVReportingPayloadStore::placeInItsOwnChunk(std::string encoded) {
+  // What is large for its structure, not for its texts, is far smaller encoded.
+  if (encoded.capacity() - encoded.size() > encoded.size() / 8) encoded.shrink_to_fit();
+  chunkBytes_ += encoded.capacity();
+  chunks_.push_back(std::move(encoded));
+  ++payloads_;
+  return positionInLatestChunk(0);
 }
 
 std::optional<QVReportingPayloadStore::Position> QVReportingPayloadStore::appendIfNotFull(
@@ -81,7 +93,7 @@ std::optional<QVReportingPayloadStore::Position> QVReportingPayloadStore::append
   {
     const std::lock_guard lock(mutex_);
     if (chunkBytes_ + knownTexts_.footprint() + payloads_ * kEntryBytes < maximumBytes_)
-      return encode(payload);
+      return add(payload);
     if (std::exchange(hasRefused_, true)) return std::nullopt;
   }
   if (whenFull_) whenFull_();
@@ -90,23 +102,32 @@ std::optional<QVReportingPayloadStore::Position> QVReportingPayloadStore::append
 
 QVReportingPayloadStore::Position QVReportingPayloadStore::append(const QVDictionary& payload) {
   const std::lock_guard lock(mutex_);
-  return encode(payload);
+  return add(payload);
 }
 
-QVReportingPayloadStore::Position QVReportingPayloadStore::encode(const QVDictionary& payload) {
-  scratch_.clear();
-  const uint64_t keySet = keySetOf(payload);
-  QVReportingEncodeNumber(scratch_, keySet);
-  if (keySet == 0) QVReportingEncodeNumber(scratch_, payload.size());
-  for (const auto& entry : payload) {
-    if (keySet == 0) QVReportingEncodeText(scratch_, entry.key);
-    QVReportingEncodeValue(scratch_, entry.value, knownTexts_);
+QVReportingPayloadStore::Position QVReportingPayloadStore::add(const QVDictionary& payload) {
+  // A summary is as long as all that was sent before it: it is written once, to where it stays. The
+  // decoded size is at least the encoded one.
+  if (payload.footprint() > kLargestChunkBytes) {
+    std::string encoded;
+    encoded.reserve(payload.footprint());
+    encode(payload, encoded);
+    return encoded.size() < kLargestChunkBytes ? place(encoded)
+                                               : placeInItsOwnChunk(std::move(encoded));
   }
-  const Position position = place(scratch_);
-  ++payloads_;
-  // A summary is as long as all that was sent before it.
-  if (scratch_.capacity() > kLargestChunkBytes) std::string().swap(scratch_);
-  return position;
+  scratch_.clear();
+  encode(payload, scratch_);
+  return place(scratch_);
+}
+
+void QVReportingPayloadStore::encode(const QVDictionary& payload, std::string& out) {
+  const uint64_t keySet = keySetOf(payload);
+  QVReportingEncodeNumber(out, keySet);
+  if (keySet == 0) QVReportingEncodeNumber(out, payload.size());
+  for (const auto& entry : payload) {
+    if (keySet == 0) QVReportingEncodeText(out, entry.key);
+    QVReportingEncodeValue(out, entry.value, knownTexts_);
+  }
 }
 
 QVReportingPayloadStore::Payload QVReportingPayloadStore::read(
@@ -116,8 +137,9 @@ QVReportingPayloadStore::Payload QVReportingPayloadStore::read(
   const std::string* keys = nullptr;
   {
     const std::lock_guard lock(mutex_);
-    QVReportingPayloadDecoder decoder(chunks_[position >> kOffsetBits].bytes.get() +
-                                      (position & ((Position{1} << kOffsetBits) - 1)));
+    QVReportingPayloadDecoder decoder(
+        reinterpret_cast<const uint8_t*>(chunks_[position >> kOffsetBits].data()) +
+        (position & ((Position{1} << kOffsetBits) - 1)));
     keySet = decoder.number();
     if (keySet != 0) {
       const Keys& set = keySets_[keySet - 1];

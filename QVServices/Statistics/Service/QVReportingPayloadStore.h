@@ -7,7 +7,6 @@
 #include <cstddef>
 #include <cstdint>
 #include <map>
-#include <memory>
 #include <mutex>
 #include <optional>
 #include <span>
@@ -72,18 +71,15 @@ class QVReportingPayloadStore {
   static constexpr std::size_t kFirstChunkBytes = 512;
   static constexpr std::size_t kLargestChunkBytes = 65536;
 
-  struct Chunk {
-    std::unique_ptr<uint8_t[]> bytes;
-    std::size_t used = 0;
-    std::size_t capacity = 0;
-  };
-
   // What follows: with the lock held.
-  Position encode(const QVDictionary& payload);
+  Position add(const QVDictionary& payload);
+  void encode(const QVDictionary& payload, std::string& out);
   static bool hasKeys(const QVDictionary& payload, const Keys& keys);
   // The number of the payload's set of keys, from 1; 0 where it has to be written out.
   uint64_t keySetOf(const QVDictionary& payload);
   Position place(std::string_view encoded);
+  Position placeInItsOwnChunk(std::string encoded);
+  Position positionInLatestChunk(std::size_t offset) const;
 
   // Constant after creation.
   const std::size_t maximumBytes_;
@@ -99,7 +95,7 @@ class QVReportingPayloadStore {
   std::multimap<std::size_t, std::size_t> keySetsByHash_;
   std::size_t latestKeySet_ = 0;  // index into keySets_; messages come in runs of one kind
   QVReportingKnownTexts knownTexts_;
-  std::vector<Chunk> chunks_;
+  std::vector<std::string> chunks_;  // none ever grows beyond its first capacity, and so moves
   std::map<std::string, uint32_t, std::less<>> textNumbers_;
   std::vector<const std::string*> texts_;  // by number: the keys of textNumbers_
   std::string scratch_;                    // the payload being encoded, kept for its capacity

@@ -277,6 +277,30 @@ TEST(QVReportingPayloadStore, TakesOfALargePayloadNoMoreThanItsSize) {
   EXPECT_LT(store.footprint(), kBytes + 1000);
 }
 
+TEST(QVReportingPayloadStore, TakesOfManySmallValuesWhatTheyTakeEncoded) {
+  constexpr std::size_t kValues = 100'000;
+  const std::vector<QVValue> values(kValues, QVValue(7));
+  QVReportingPayloadStore store;
+  const auto position = store.append({{"values", QVArray::assemble(values)}});
+  EXPECT_LT(store.footprint(), kValues + kValues / 4);
+  EXPECT_EQ(payloadAt(store, position), (QVDictionary{{"values", QVArray::assemble(values)}}));
+}
+
+TEST(QVReportingPayloadStore, KeepsWhatWasReadWhereItIs) {
+  QVReportingPayloadStore store;
+  const std::string longKey(100'000, 'k');
+  const std::string longText(100'000, 't');
+  const auto small = store.append({{longKey, "small"}});
+  const auto large = store.append({{"text", longText}});
+  std::vector<QVDictionaryEntry> smallRoom;
+  std::vector<QVDictionaryEntry> largeRoom;
+  const auto smallRead = store.read(small, smallRoom);
+  const auto largeRead = store.read(large, largeRoom);
+  for (int number = 0; number < 100; ++number) store.append({{longKey, "x"}, {"text", longText}});
+  EXPECT_EQ(dictionaryOf(smallRead), (QVDictionary{{longKey, "small"}}));
+  EXPECT_EQ(dictionaryOf(largeRead), (QVDictionary{{"text", longText}}));
+}
+
 TEST(QVReportingPayloadStore, StaysSmallForASingleMessage) {
   QVReportingPayloadStore store;
   EXPECT_LT(store.footprint(), 32u);
