@@ -6,10 +6,8 @@
 
 namespace {
 
-// Batches kept for their memory: one fills while another is written.
-constexpr std::size_t kSpareBatches = 2;
-// One whose lanes have room for no more rows than this; a larger one is freed.
-constexpr std::size_t kSpareLaneRows = 1024;
+// Batches kept for their memory: some fill while those of a transaction are written.
+constexpr std::size_t kSpareBatches = 8;
 
 }  // namespace
 
@@ -73,11 +71,9 @@ bool QVEventStoreQueue::isEmpty() {
 }
 
 void QVEventStoreQueue::recycle(QVEventRows&& batch) {
-  bool fits = true;
   batch.clear();
-  batch.forEachLane([&fits](auto& lane) { fits = fits && lane.rows.capacity() <= kSpareLaneRows; });
   const QVMutexLock lock(mutex_);
-  if (fits && spare_.size() < kSpareBatches) spare_.push_back(std::move(batch));
+  if (spare_.size() < kSpareBatches) spare_.push_back(std::move(batch));
 }
 
 void QVEventStoreQueue::beginBatch() {

@@ -24,9 +24,9 @@ class QVEventStoreQueue {
 
   // So many waiting rows are written without waiting for the interval's end.
   static constexpr std::size_t kCommitRows = 500;
-  // Rows of one batch, and so at least of one transaction when many wait: what one transaction
-  // changes should stay near what SQLite's page cache and one checkpoint hold.
-  static constexpr std::size_t kBatchRows = 4096;
+  // Rows of one batch: few enough for the memory of a lane to come from the heap, which has it from
+  // an earlier batch, and not page by page from the system.
+  static constexpr std::size_t kBatchRows = 512;
 
   // A search for backends: is the store there?
   struct Search {

@@ -32,6 +32,10 @@ constexpr std::chrono::seconds kSetAsideInterval{60};
 
 constexpr const char* kBackend = "store";
 
+// Rows of one transaction when many wait, and up to a batch more: what one transaction changes
+// should stay near what SQLite's page cache and one checkpoint hold.
+constexpr std::size_t kTransactionRows = 4096;
+
 // Payloads in flight, and what a session collected until it stopped, leave holes in the heap that
 // the allocator keeps. After so many bytes of payload text, the next moment without work is used to
 // give the free pages back; after fewer once a session has ended, as nothing may follow.
@@ -283,7 +287,7 @@ int QVEventStoreWriter::writeTransaction(std::size_t& batches) {
   int result = tables_.begin();
   bool isOutOfMemory = false;
   try {
-    while (result == SQLITE_OK && rows < QVEventStoreQueue::kBatchRows) {
+    while (result == SQLITE_OK && rows < kTransactionRows) {
       // Rows that came meanwhile go along: larger transactions write fewer half-filled pages.
       if (batches == pending_.size() && (urgent || !queue_.takeWaiting(pending_))) break;
       QVEventRows& batch = pending_[batches];
