@@ -51,7 +51,13 @@ class QVDictionary {
 
   // A dictionary with these entries and, over them, those of `other`, charged as assemble() says
   // and not as either of the two is.
-  QVDictionary merging(const QVDictionary& other, QVMemoryCharge* charge = nullptr) const;
+  QVDictionary merging(const QVDictionary& other, QVMemoryCharge* charge = nullptr) const {
+    return merging(std::span(other.begin(), other.size()), charge);
+  }
+  QVDictionary merging(std::initializer_list<QVDictionaryEntry> other,
+                       QVMemoryCharge* charge = nullptr) const {
+    return merging(std::span(other), charge);
+  }
 
   // What the memory of this dictionary is charged to; null where to nothing.
   QVMemoryCharge* charge() const noexcept;
@@ -67,5 +73,6 @@ class QVDictionary {
  private:
   friend class QVValue;
   explicit QVDictionary(const QVDictionaryStorage* storage) noexcept : storage_(storage) {}
+  QVDictionary merging(std::span<const QVDictionaryEntry> other, QVMemoryCharge* charge) const;
   const QVDictionaryStorage* storage_ = nullptr;
 };

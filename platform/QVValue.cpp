@@ -382,7 +382,8 @@ const QVValue* QVDictionary::find(std::string_view key) const noexcept {
   return entry != end() && entry->key == key ? &entry->value : nullptr;
 }
 
-QVDictionary QVDictionary::merging(const QVDictionary& other, QVMemoryCharge* charge) const {
+QVDictionary QVDictionary::merging(std::span<const QVDictionaryEntry> other,
+                                   QVMemoryCharge* charge) const {
   std::vector<QVDictionaryEntry> entries;
   entries.reserve(size() + other.size());
   const auto borrow = [&entries](const QVDictionaryEntry& entry) {

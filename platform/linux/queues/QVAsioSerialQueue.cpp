@@ -15,13 +15,14 @@ constexpr std::size_t kItemsPerWakeUp = 64;
 }  // namespace
 
 QVAsioSerialQueue::QVAsioSerialQueue(std::string_view label, QVWorkExecutor& executor,
-                                     QVAsioTimers& timers, QVLog& log, std::size_t keptItems)
-    : label_(label), executor_(executor), timers_(timers), log_(log), keptItems_(keptItems) {}
+                                     QVAsioTimers& timers, QVLog& log)
+    : label_(label), executor_(executor), timers_(timers), log_(log) {}
 
 void QVAsioSerialQueue::async(QVWorkItem item) {
   {
     const QVMutexLock lock(mutex_);
-    enqueued_.push_back(std::move(item));
+    if (enqueued_ == nullptr) enqueued_ = std::make_unique<Items>();
+    enqueued_->push_back(std::move(item));
     if (std::exchange(isScheduled_, true)) return;
   }
   try {
@@ -59,7 +60,7 @@ void QVAsioSerialQueue::submit() {
   QVWorkItem task = [self = shared_from_this()] { self->run(); };
   if (executor_.submit(task)) return;
   // Destroyed after the lock, because an item may hold whatever enqueues again on its way out.
-  std::vector<QVWorkItem> refused;
+  std::unique_ptr<Items> refused;
   const QVMutexLock lock(mutex_);
   refused.swap(enqueued_);
   isScheduled_ = false;
@@ -80,30 +81,22 @@ void QVAsioSerialQueue::run() {
 
 // Are there more items?
 bool QVAsioSerialQueue::runBatch() {
+  std::unique_ptr<Items> batch;
   {
     const QVMutexLock lock(mutex_);
-    batch_.swap(enqueued_);
+    batch.swap(enqueued_);
   }
-  {
+  if (batch != nullptr) {
     const QVWakeUpBatch wakeUps;
     std::size_t untilWakeUp = kItemsPerWakeUp;
-    for (QVWorkItem& item : batch_) {
-      QVRunWorkItem(item, label_, log_);
+    for (; !batch->empty(); batch->pop_front()) {
+      QVRunWorkItem(batch->front(), label_, log_);
       if (--untilWakeUp != 0) continue;
       untilWakeUp = kItemsPerWakeUp;
       QVWakeUpBatch::wakeNow();
     }
-    batch_.clear();
   }
   const QVMutexLock lock(mutex_);
-  if (!enqueued_.empty()) return true;
-  isScheduled_ = false;
-  // Still under the lock: the next task may begin right after it.
-  keepOrFree(batch_);
-  keepOrFree(enqueued_);
-  return false;
-}
-
-void QVAsioSerialQueue::keepOrFree(std::vector<QVWorkItem>& items) const {
-  if (items.capacity() > keptItems_) std::vector<QVWorkItem>().swap(items);
+  isScheduled_ = enqueued_ != nullptr;
+  return isScheduled_;
 }

@@ -6,15 +6,14 @@
 #include "platform/linux/queues/QVAsioTimers.h"
 #include "platform/linux/queues/QVWorkExecutor.h"
 
-#include <cstddef>
+#include <deque>
 #include <memory>
 #include <string>
-#include <vector>
 
 // A serial queue on an executor: items collect in a buffer, and the queue submits itself when the
 // buffer stops being empty; it then runs what is there as one batch. So an item costs a move into
 // the buffer, and only a batch costs a task and a wake-up. (Asio's strand does the same with an
-// allocation for each item.)
+// allocation for each item.) There may be many queues, most of them idle: those have no buffer.
 //
 // Made by QVAsioWorkQueues. Threads: as QVWorkQueue.
 // Ownership: a submitted task holds the queue, so a handle may go at any time. Executor, timers and
@@ -27,30 +26,29 @@
 class QVAsioSerialQueue final : public QVWorkQueue,
                                 public std::enable_shared_from_this<QVAsioSerialQueue> {
  public:
-  // Buffers with room for up to `keptItems` are kept while the queue is idle.
   QVAsioSerialQueue(std::string_view label, QVWorkExecutor& executor, QVAsioTimers& timers,
-                    QVLog& log, std::size_t keptItems);
+                    QVLog& log);
 
   void async(QVWorkItem item) override;
   void asyncAfter(QVDuration delay, QVWorkItem item) override;
   std::string_view label() const override { return label_; }
 
  private:
+  // Keeps items where they are while it grows, and gives its memory back while it is emptied.
+  using Items = std::deque<QVWorkItem>;
+
   void submit();
   void submitLater() noexcept;
   void unschedule() noexcept;
   void run();
   bool runBatch();
-  void keepOrFree(std::vector<QVWorkItem>& items) const;
 
   const std::string label_;
   QVWorkExecutor& executor_;
   QVAsioTimers& timers_;
   QVLog& log_;
-  const std::size_t keptItems_;
 
   QVMutex mutex_;
-  std::vector<QVWorkItem> enqueued_ QV_GUARDED_BY(mutex_);
+  std::unique_ptr<Items> enqueued_ QV_GUARDED_BY(mutex_);  // null: none
   bool isScheduled_ QV_GUARDED_BY(mutex_) = false;
-  std::vector<QVWorkItem> batch_;  // of the task that runs
 };

@@ -12,11 +12,6 @@
 
 namespace {
 
-// Room that the buffers of a queue with a thread of its own keep while it is idle: a burst of
-// calls of several clients, 32 KiB per buffer. Shared queues are many (one per session) and mostly
-// idle, and keep none.
-constexpr std::size_t kKeptItems = 256;
-
 constexpr std::string_view kBackgroundLabel = "background";
 
 // At the end, between looks for work that has no worker.
@@ -64,11 +59,11 @@ std::shared_ptr<QVWorkQueue> QVAsioWorkQueues::makeSerialQueue(std::string_view 
                                                                QVQualityOfService quality,
                                                                int32_t relativePriority) {
   if (quality < QVQualityOfService::userInitiated) {
-    return std::make_shared<QVAsioSerialQueue>(label, poolOf(quality), timers_, log_, 0);
+    return std::make_shared<QVAsioSerialQueue>(label, poolOf(quality), timers_, log_);
   }
   auto thread = std::make_unique<QVAsioThread>(
       threadName(label), QVNicenessForQuality(quality, relativePriority), log_, ledger_);
-  auto queue = std::make_shared<QVAsioSerialQueue>(label, *thread, timers_, log_, kKeptItems);
+  auto queue = std::make_shared<QVAsioSerialQueue>(label, *thread, timers_, log_);
   const QVMutexLock lock(mutex_);
   ownThreads_.push_back(std::move(thread));
   return queue;

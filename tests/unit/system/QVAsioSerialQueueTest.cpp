@@ -49,7 +49,7 @@ class ManualExecutor final : public QVWorkExecutor {
 class QVAsioSerialQueueTest : public testing::Test {
  protected:
   std::shared_ptr<QVAsioSerialQueue> makeQueue() {
-    return std::make_shared<QVAsioSerialQueue>("queue", executor_, timers_, log_, 0);
+    return std::make_shared<QVAsioSerialQueue>("queue", executor_, timers_, log_);
   }
   QVWorkItem note(const std::string& name) {
     return [this, name] { ran_.push_back(name); };
