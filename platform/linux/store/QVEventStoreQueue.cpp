@@ -76,6 +76,12 @@ void QVEventStoreQueue::recycle(QVEventRows&& batch) {
   if (spare_.size() < kSpareBatches) spare_.push_back(std::move(batch));
 }
 
+void QVEventStoreQueue::giveMemoryBack() {
+  std::vector<QVEventRows> spare;
+  const QVMutexLock lock(mutex_);
+  spare.swap(spare_);
+}
+
 void QVEventStoreQueue::beginBatch() {
   if (spare_.empty()) {
     waiting_.emplace_back();

@@ -72,6 +72,8 @@ class QVEventStoreQueue {
   bool isEmpty();
   // Gives a batch's memory back for later ones.
   void recycle(QVEventRows&& batch);
+  // Frees what is kept for later batches.
+  void giveMemoryBack();
 
  private:
   void beginBatch() QV_REQUIRES(mutex_);

@@ -137,6 +137,7 @@ void QVEventStoreWriter::giveMemoryBack() {
   if (tables_.textBytes() < enough || !pending_.empty() || !queue_.isEmpty()) return;
   sessionEnded_ = false;
   tables_.giveMemoryBack();
+  queue_.giveMemoryBack();
   ::malloc_trim(0);
 }
 
