@@ -1,6 +1,7 @@
 #include "QVServices/Statistics/Service/QVReportingPayloadCoding.h"
 
 #include <bit>
+#include <cstdint>
 #include <cstring>
 
 namespace {
@@ -58,7 +59,7 @@ void encodeInteger(std::string& out, int64_t value) {
 void encodeString(std::string& out, std::string_view text, QVReportingKnownTexts& known) {
   if (const std::string* const copy = known.keep(text)) {
     appendTag(out, kKnownText);
-    appendFixed(out, copy);
+    appendFixed(out, reinterpret_cast<std::uintptr_t>(copy));
   } else {
     appendTag(out, kString);
     QVReportingEncodeText(out, text);
@@ -166,7 +167,7 @@ QVValue QVReportingPayloadDecoder::value() {
     case kString:
       return QVValue::borrowing(text());
     case kKnownText:
-      return QVValue::borrowing(*fixed<const std::string*>());
+      return QVValue::borrowing(*reinterpret_cast<const std::string*>(fixed<std::uintptr_t>()));
     case kArray: {
       std::vector<QVValue> items(number());
       for (QVValue& item : items) item = value();
