@@ -9,8 +9,12 @@ constexpr std::size_t kNodeBytes = sizeof(std::string) + 3 * sizeof(void*);
 
 const std::string* QVReportingKnownTexts::keep(std::string_view text) {
   if (text.size() < kShortest || text.size() > kLongest) return nullptr;
-  if (const auto known = texts_.find(text); known != texts_.end()) return &*known;
-  if (texts_.size() == kMaximumTexts) return nullptr;
-  bytes_ += kNodeBytes + text.size();
-  return &*texts_.emplace(text).first;
+  auto known = texts_.find(text);
+  if (known == texts_.end()) {
+    if (texts_.size() == kMaximumTexts) return nullptr;
+    known = texts_.emplace(text).first;
+    footprint_ += kNodeBytes + text.size();
+  }
+  writtenOut_ += text.size();
+  return &*known;
 }

@@ -23,7 +23,10 @@ class QVReportingKnownTexts {
   const std::string* keep(std::string_view text);
 
   // Bytes of memory that the texts take.
-  std::size_t footprint() const { return bytes_; }
+  std::size_t footprint() const { return footprint_; }
+  // Bytes that they would take if each were written out as often as it was kept: what whoever
+  // spells out a whole record has to reckon with.
+  std::size_t writtenOut() const { return writtenOut_; }
 
  private:
   struct Hash {
@@ -34,5 +37,6 @@ class QVReportingKnownTexts {
   };
 
   std::unordered_set<std::string, Hash, std::equal_to<>> texts_;
-  std::size_t bytes_ = 0;
+  std::size_t footprint_ = 0;
+  std::size_t writtenOut_ = 0;
 };

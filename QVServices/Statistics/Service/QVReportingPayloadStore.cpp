@@ -70,7 +70,10 @@ QVReportingPayloadStore::Position QVReportingPayloadStore::place(std::string_vie
     const std::size_t next = chunks_.empty()
                                  ? kFirstChunkBytes
                                  : std::min(chunks_.back().capacity() * 2, kLargestChunkBytes);
-    chunks_.emplace_back().reserve(std::max(next, encoded.size()));
+    // A chunk without its memory would keep what it gets within itself, and move with the vector.
+    std::string chunk;
+    chunk.reserve(std::max(next, encoded.size()));
+    chunks_.push_back(std::move(chunk));
     chunkBytes_ += chunks_.back().capacity();
   }
   const Position position = positionInLatestChunk(chunks_.back().size());
@@ -82,8 +85,8 @@ QVReportingPayloadStore::Position QVReportingPayloadStore::place(std::string_vie
 QVReportingPayloadStore::Position QVReportingPayloadStore::placeInItsOwnChunk(std::string encoded) {
   // What is large for its structure, not for its texts, is far smaller encoded.
   if (encoded.capacity() - encoded.size() > encoded.size() / 8) encoded.shrink_to_fit();
-  chunkBytes_ += encoded.capacity();
   chunks_.push_back(std::move(encoded));
+  chunkBytes_ += chunks_.back().capacity();
   ++payloads_;
   return positionInLatestChunk(0);
 }
@@ -92,8 +95,9 @@ std::optional<QVReportingPayloadStore::Position> QVReportingPayloadStore::append
     const QVDictionary& payload) {
   {
     const std::lock_guard lock(mutex_);
-    if (chunkBytes_ + knownTexts_.footprint() + payloads_ * kEntryBytes < maximumBytes_)
+    if (chunkBytes_ + knownTexts_.writtenOut() + payloads_ * kEntryBytes < maximumBytes_) {
       return add(payload);
+    }
     if (std::exchange(hasRefused_, true)) return std::nullopt;
   }
   if (whenFull_) whenFull_();
@@ -165,6 +169,8 @@ uint32_t QVReportingPayloadStore::intern(std::string_view text) {
     return known->second;
   }
   const auto number = static_cast<uint32_t>(texts_.size());
+  // Room first: a text that was given a number must have its place, too.
+  if (texts_.size() == texts_.capacity()) texts_.reserve(2 * texts_.size() + 8);
   texts_.push_back(&textNumbers_.emplace(text, number).first->first);
   return number;
 }

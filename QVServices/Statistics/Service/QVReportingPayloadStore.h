@@ -34,8 +34,9 @@ class QVReportingPayloadStore {
     uint64_t keySet;
   };
 
-  // Bytes that one session's payloads may take, with their entries in the two arrays: some ten
-  // million ordinary messages. A client that never stops its session must not take all memory.
+  // Bytes that one session's payloads may take, with their entries in the two arrays, and with each
+  // text as often as it comes, as the summary spells it out: some six million ordinary messages. A
+  // client that never stops its session must not take all memory, nor must its summary.
   static constexpr std::size_t kMaximumBytes = std::size_t{1} << 30;
 
   // Calls `whenFull`, where there is one, when a payload is refused for the first time, on the
@@ -95,7 +96,8 @@ class QVReportingPayloadStore {
   std::multimap<std::size_t, std::size_t> keySetsByHash_;
   std::size_t latestKeySet_ = 0;  // index into keySets_; messages come in runs of one kind
   QVReportingKnownTexts knownTexts_;
-  std::vector<std::string> chunks_;  // none ever grows beyond its first capacity, and so moves
+  // None grows beyond its first capacity, which is on the heap, so bytes never move.
+  std::vector<std::string> chunks_;
   std::map<std::string, uint32_t, std::less<>> textNumbers_;
   std::vector<const std::string*> texts_;  // by number: the keys of textNumbers_
   std::string scratch_;                    // the payload being encoded, kept for its capacity

@@ -59,11 +59,14 @@ void QVAsioSerialQueue::unschedule() noexcept {
 void QVAsioSerialQueue::submit() {
   QVWorkItem task = [self = shared_from_this()] { self->run(); };
   if (executor_.submit(task)) return;
-  // Destroyed after the lock, because an item may hold whatever enqueues again on its way out.
   std::unique_ptr<Items> refused;
-  const QVMutexLock lock(mutex_);
-  refused.swap(enqueued_);
-  isScheduled_ = false;
+  {
+    const QVMutexLock lock(mutex_);
+    refused.swap(enqueued_);
+    isScheduled_ = false;
+  }
+  // In their order, and without the lock: an item may hold whatever enqueues again on its way out.
+  while (refused != nullptr && !refused->empty()) refused->pop_front();
 }
 
 void QVAsioSerialQueue::run() {

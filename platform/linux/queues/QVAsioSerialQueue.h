@@ -12,8 +12,8 @@
 
 // A serial queue on an executor: items collect in a buffer, and the queue submits itself when the
 // buffer stops being empty; it then runs what is there as one batch. So an item costs a move into
-// the buffer, and only a batch costs a task and a wake-up. (Asio's strand does the same with an
-// allocation for each item.) There may be many queues, most of them idle: those have no buffer.
+// the buffer, and only a batch costs a task and a wake-up; Asio's strand would allocate for each
+// item. There may be many queues, most of them idle: those have no buffer.
 //
 // Made by QVAsioWorkQueues. Threads: as QVWorkQueue.
 // Ownership: a submitted task holds the queue, so a handle may go at any time. Executor, timers and

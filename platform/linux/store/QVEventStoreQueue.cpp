@@ -4,13 +4,6 @@
 #include <iterator>
 #include <utility>
 
-namespace {
-
-// Batches kept for their memory: some fill while those of a transaction are written.
-constexpr std::size_t kSpareBatches = 8;
-
-}  // namespace
-
 bool QVEventStoreQueue::search(Search& search) {
   {
     const QVMutexLock lock(mutex_);
@@ -70,25 +63,22 @@ bool QVEventStoreQueue::isEmpty() {
   return waitingRows_ == 0;
 }
 
-void QVEventStoreQueue::recycle(QVEventRows&& batch) {
+void QVEventStoreQueue::recycle(QVEventRows&& batch) noexcept {
   batch.clear();
   const QVMutexLock lock(mutex_);
-  if (spare_.size() < kSpareBatches) spare_.push_back(std::move(batch));
+  if (spareCount_ < kSpareBatches) spare_[spareCount_++] = std::move(batch);
 }
 
-void QVEventStoreQueue::giveMemoryBack() {
-  std::vector<QVEventRows> spare;
+void QVEventStoreQueue::giveMemoryBack() noexcept {
+  std::array<QVEventRows, kSpareBatches> spare;
   const QVMutexLock lock(mutex_);
   spare.swap(spare_);
+  spareCount_ = 0;
 }
 
 void QVEventStoreQueue::beginBatch() {
-  if (spare_.empty()) {
-    waiting_.emplace_back();
-  } else {
-    waiting_.push_back(std::move(spare_.back()));
-    spare_.pop_back();
-  }
+  waiting_.emplace_back();
+  if (spareCount_ > 0) waiting_.back() = std::move(spare_[--spareCount_]);
 }
 
 void QVEventStoreQueue::moveWaiting(std::deque<QVEventRows>& batches) {

@@ -3,6 +3,7 @@
 #include "platform/linux/QVThreadAnnotations.h"
 #include "platform/linux/store/QVEventRows.h"
 
+#include <array>
 #include <chrono>
 #include <condition_variable>
 #include <cstddef>
@@ -27,6 +28,8 @@ class QVEventStoreQueue {
   // Rows of one batch: few enough for the memory of a lane to come from the heap, which has it from
   // an earlier batch, and not page by page from the system.
   static constexpr std::size_t kBatchRows = 512;
+  // Batches kept for their memory: some fill while those of a transaction are written.
+  static constexpr std::size_t kSpareBatches = 8;
 
   // A search for backends: is the store there?
   struct Search {
@@ -71,9 +74,9 @@ class QVEventStoreQueue {
   bool takeWaiting(std::deque<QVEventRows>& batches);
   bool isEmpty();
   // Gives a batch's memory back for later ones.
-  void recycle(QVEventRows&& batch);
+  void recycle(QVEventRows&& batch) noexcept;
   // Frees what is kept for later batches.
-  void giveMemoryBack();
+  void giveMemoryBack() noexcept;
 
  private:
   void beginBatch() QV_REQUIRES(mutex_);
@@ -85,7 +88,8 @@ class QVEventStoreQueue {
   std::condition_variable wake_;
   std::vector<Search> searches_ QV_GUARDED_BY(mutex_);
   std::deque<QVEventRows> waiting_ QV_GUARDED_BY(mutex_);
-  std::vector<QVEventRows> spare_ QV_GUARDED_BY(mutex_);
+  std::array<QVEventRows, kSpareBatches> spare_ QV_GUARDED_BY(mutex_);
+  std::size_t spareCount_ QV_GUARDED_BY(mutex_) = 0;
   std::size_t waitingRows_ QV_GUARDED_BY(mutex_) = 0;
   SteadyTime firstRowAt_ QV_GUARDED_BY(mutex_){};
   bool urgent_ QV_GUARDED_BY(mutex_) = false;

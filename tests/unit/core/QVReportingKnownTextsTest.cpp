@@ -14,9 +14,23 @@ TEST(QVReportingKnownTexts, KeepsATextOnce) {
   ASSERT_NE(route, nullptr);
   EXPECT_EQ(*route, "BuiltInSpeaker");
   const std::size_t footprint = known.footprint();
+  EXPECT_GE(footprint, route->size());
   EXPECT_EQ(known.keep(std::string("BuiltInSpeaker")), route);
   EXPECT_EQ(known.footprint(), footprint);
-  EXPECT_NE(known.keep("BuiltInReceiver"), route);
+  const std::string* const other = known.keep("BuiltInReceiver");
+  ASSERT_NE(other, nullptr);
+  EXPECT_NE(other, route);
+  EXPECT_GE(known.footprint(), footprint + other->size());
+}
+
+TEST(QVReportingKnownTexts, CountsATextAsOftenAsItWasKept) {
+  QVReportingKnownTexts known;
+  EXPECT_EQ(known.writtenOut(), 0u);
+  known.keep(std::string(100, 'x'));
+  known.keep(std::string(100, 'x'));
+  known.keep(std::string(20, 'y'));
+  known.keep("short");
+  EXPECT_EQ(known.writtenOut(), 220u);
 }
 
 TEST(QVReportingKnownTexts, LeavesOutWhatIsHardlyWorthAReference) {

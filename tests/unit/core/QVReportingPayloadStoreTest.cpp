@@ -349,6 +349,16 @@ TEST(QVReportingPayloadStore, RefusesWhatComesAfterItsMaximumAndSaysSoOnce) {
             (QVDictionary{{"n", int64_t(positions.size()) - 1}}));
 }
 
+TEST(QVReportingPayloadStore, CountsATextAsOftenAsItComesAgainstItsMaximum) {
+  constexpr std::size_t kMaximum = 100'000;
+  constexpr std::size_t kTextBytes = 250;
+  QVReportingPayloadStore store(kMaximum);
+  std::size_t taken = 0;
+  while (store.appendIfNotFull({{"text", std::string(kTextBytes, 'x')}})) ++taken;
+  EXPECT_LE(taken, kMaximum / kTextBytes);
+  EXPECT_GE(taken, kMaximum / (kTextBytes + 100));
+}
+
 TEST(QVReportingPayloadStore, KeepsThePayloadWholeThatReachesItsMaximum) {
   QVReportingPayloadStore store(2000);
   const QVDictionary large{{"text", std::string(5000, 'x')}};

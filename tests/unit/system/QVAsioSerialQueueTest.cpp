@@ -7,6 +7,7 @@
 #include <deque>
 #include <memory>
 #include <new>
+#include <numeric>
 #include <string>
 #include <utility>
 #include <vector>
@@ -16,6 +17,7 @@
 namespace {
 
 using testing::ElementsAre;
+using testing::IsEmpty;
 
 // Runs tasks when told.
 class ManualExecutor final : public QVWorkExecutor {
@@ -125,6 +127,25 @@ TEST_F(QVAsioSerialQueueTest, DestroysItemsOfAClosedExecutor) {
   EXPECT_EQ(queue.use_count(), 1);
   queue->async([capture] {});
   EXPECT_EQ(capture.use_count(), 1);
+}
+
+TEST_F(QVAsioSerialQueueTest, DestroysItemsOfAClosedExecutorInTheirOrder) {
+  constexpr int kItems = 14;
+  const auto queue = makeQueue();
+  executor_.close();
+  std::vector<int> destroyed;
+  {
+    const QVWakeUpBatch batch;
+    for (int i = 0; i < kItems; ++i) {
+      const std::shared_ptr<void> capture(nullptr,
+                                          [&destroyed, i](void*) { destroyed.push_back(i); });
+      queue->async([capture] {});
+    }
+    EXPECT_THAT(destroyed, IsEmpty());
+  }
+  std::vector<int> all(kItems);
+  std::iota(all.begin(), all.end(), 0);
+  EXPECT_EQ(destroyed, all);
 }
 
 TEST_F(QVAsioSerialQueueTest, GoesOnWhereItCouldNotBeSubmitted) {
