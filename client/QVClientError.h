@@ -15,11 +15,12 @@ class QV_CLIENT_API QVClientError {
     none,
     cannotConnect,    // no service at that path, or it may not be reached
     connectionLost,   // the service ended or broke off; this connection is of no use any more
-    closed,           // the client itself was destroyed before the answer came
+    closed,           // the client, or the reporter, was destroyed or closed before
     queueFull,        // the service does not read, or too many calls are unanswered; try later
     timedOut,         // a waiting call's time limit passed; the call may still be carried out
     wouldDeadlock,    // a waiting call on the thread that would have to deliver its answer
-    messageTooLarge,  // over 8 MiB
+    messageTooLarge,  // a call over 8 MiB, a payload larger than the memory given for it, a message
+                      // larger than a reporter's queue, a configuration over 64 KiB
     invalidPayload,   // a text that is no UTF-8, containers nested too deeply or not closed
     outOfMemory,
     refused,          // the service did not take the call: domain() is the standard error's name

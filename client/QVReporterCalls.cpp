@@ -16,10 +16,6 @@ constexpr std::size_t kMaximumBytesUnderWay = std::size_t{256} << 10;
 // Sessions that are looked up in one go to be restored; more than there are calls to make.
 constexpr std::size_t kRestoredAtOnce = 256;
 
-// Bytes of one session's configuration that are kept for its restoration. Beyond it only the last
-// addition is.
-constexpr std::size_t kMaximumConfigurationBytes = std::size_t{64} << 10;
-
 // What the queue and each real-time queue get done in a turn: none of them, however full, keeps the
 // others from what room there is.
 constexpr std::size_t kTurn = 32;
@@ -244,7 +240,8 @@ bool QVReporterCalls::handleStep(const QVReporterRecord& record, QVReporterSessi
              issue(client_->setServiceType(session.serviceType, session.reporterID, acknowledge()));
     case Kind::setConfiguration: {
       std::string merged = QVReporterMergedConfiguration(session.configuration, record.payload);
-      if (merged.size() > kMaximumConfigurationBytes) merged = record.payload;
+      // More than the service keeps; for the session's restoration the last addition has to do.
+      if (merged.size() > kQVReporterMaximumConfigurationBytes) merged = record.payload;
       session.configuration = std::move(merged);
       return !session.isPresent || configure(session);
     }

@@ -1,7 +1,11 @@
 #pragma once
 
+#include <cstddef>
 #include <string>
 #include <string_view>
+
+// Bytes of encoded entries that a session's configuration may have, as many as the service keeps.
+inline constexpr std::size_t kQVReporterMaximumConfigurationBytes = std::size_t{64} << 10;
 
 // Adds entries of a payload to those that there are, of equal keys the later one alone, as the
 // service adds a configuration to the one that it has. Both as QVClientPayload::entries() gives

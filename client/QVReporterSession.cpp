@@ -1,6 +1,7 @@
 #include "client/QVReporterSession.h"
 
 #include "client/QVRealtimeRing.h"
+#include "client/QVReporterConfiguration.h"
 #include "client/QVReporterCore.h"
 
 #include <bit>
@@ -11,8 +12,6 @@ namespace {
 
 using Code = QVClientError::Code;
 using Kind = QVReporterRecord::Kind;
-
-constexpr std::size_t kMaximumConfigurationBytes = std::size_t{64} << 10;
 
 // Of a real-time queue: messages, bytes of one, bytes in all.
 constexpr std::size_t kMaximumSlots = 65'536;
@@ -46,7 +45,9 @@ QVClientError::Code QVReporterSession::setServiceType(QVClientServiceType servic
 
 QVClientError::Code QVReporterSession::setConfiguration(const QVClientPayload& configuration) {
   if (!configuration.ok()) return configuration.errorCode();
-  if (configuration.entries().size() > kMaximumConfigurationBytes) return Code::messageTooLarge;
+  if (configuration.entries().size() > kQVReporterMaximumConfigurationBytes) {
+    return Code::messageTooLarge;
+  }
   return core_->take(
       {.kind = Kind::setConfiguration, .session = &state_, .payload = configuration.entries()});
 }

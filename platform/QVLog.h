@@ -35,8 +35,9 @@ struct QVLogSite {
 // directories); implementations add that prefix or hand its parts on as fields of their own.
 //
 // Threads: any, at once. write() never blocks: it hands the line to a bounded queue; a line that
-// finds no room is counted and the count logged later. flush() waits until what was written has
-// reached its destination.
+// finds no room is counted and the count logged later. registerScope() may read a file. flush()
+// waits until what was written has reached its destination, but only so long: a destination that
+// takes nothing costs the lines, not the service.
 class QVLog {
  public:
   // The verbosity at which debug lines are written.
@@ -67,7 +68,8 @@ class QVLog {
   }
 
   // Makes the default log (null) verbose, or not, as at first. It has no scope, and so no switch in
-  // the preferences: the keys there are those of scopes. For programs with a throttle of their own.
+  // the preferences: the keys there are those of scopes. Nothing in the service calls it; a program
+  // that makes a throttle of its own has that one's verbose lines written so.
   static void setDefaultVerbose(bool verbose) noexcept {
     isDefaultVerbose_.store(verbose, std::memory_order_relaxed);
   }

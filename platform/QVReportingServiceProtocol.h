@@ -14,6 +14,10 @@
 template <class Result>
 using Reply = QVFunction<void(Result), 48>;
 
+// The error of a message that comes while reporting is switched off.
+inline constexpr const char* kQVReportingErrorDomain = "net.quillon.audio.reporting";
+inline constexpr int64_t kQVReportingErrorSwitchedOff = 1;
+
 // The IPC interface of the service: what a client may ask of its connection's exported object.
 // Every operation returns at once; results come through the reply.
 //

@@ -88,8 +88,6 @@ class QVValue {
   bool operator==(const QVValue& other) const noexcept;
 
  private:
-  friend class QVArray;
-  friend class QVDictionary;
   friend struct QVValueStorage;
 
   void retainOrCopy(const QVValue& other);

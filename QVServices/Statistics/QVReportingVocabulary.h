@@ -27,6 +27,8 @@ inline constexpr uint32_t kQVReportingCategoryTallying = 9;
 // Category and type of the message that a session sends to itself when it stops.
 inline constexpr uint32_t kQVReportingCategorySummary = 0xFFFFFFFF;
 inline constexpr uint16_t kQVReportingMessageTypeSummary = 0xFFFF;
+// A key of that message: its column begins with the session's service type.
+inline constexpr std::string_view kQVReportingSummaryEventKey = "QV_Session_Summary_Event";
 
 inline constexpr uint16_t kQVReportingMessageTypeGeneric = 0;
 

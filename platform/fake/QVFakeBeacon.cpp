@@ -226,12 +226,6 @@ void QVFakeBeacon::refuseMessages(std::optional<QVError> error) {
   state_->refusal = std::move(error);
 }
 
-void QVFakeBeacon::acceptMessages() {
-  const std::lock_guard lock(state_->mutex);
-  state_->refusing = false;
-  state_->refusal.reset();
-}
-
 void QVFakeBeacon::setFlushError(std::optional<QVError> error) {
   const std::lock_guard lock(state_->mutex);
   state_->flushError = std::move(error);
@@ -267,11 +261,6 @@ int QVFakeBeacon::liveSessions() const {
 int QVFakeBeacon::liveTokens() const {
   const std::lock_guard lock(state_->mutex);
   return state_->liveTokens;
-}
-
-int QVFakeBeacon::openSearches() const {
-  const std::lock_guard lock(state_->mutex);
-  return static_cast<int>(state_->waitingSearches.size() + state_->unansweredSearches.size());
 }
 
 std::vector<std::string> QVFakeBeacon::takeMisuses() {

@@ -62,7 +62,6 @@ class QVFakeBeacon : public QVBeacon {
 
   // From now on messages (single ones too) are refused, with this error or without one.
   void refuseMessages(std::optional<QVError> error);
-  void acceptMessages();
   // What later flushes complete with.
   void setFlushError(std::optional<QVError> error);
 
@@ -73,7 +72,6 @@ class QVFakeBeacon : public QVBeacon {
 
   int liveSessions() const;
   int liveTokens() const;
-  int openSearches() const;
   std::vector<std::string> takeMisuses();
 
  private:

@@ -44,6 +44,5 @@ bool QVFakeCondition::waitForTimeout(QVDuration timeout) {
 
 void QVFakeCondition::signal() {
   require(locked_, "signal() without the lock");
-  ++signalCount_;
   if (pendingSignalCount_ < waiterCount_) ++pendingSignalCount_;
 }

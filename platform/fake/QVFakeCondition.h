@@ -23,7 +23,6 @@ class QVFakeCondition final : public QVCondition {
   void signal() override;
 
   std::size_t waitCount() const { return waitCount_; }
-  std::size_t signalCount() const { return signalCount_; }
 
  private:
   QVFakeWorkQueues& queues_;
@@ -33,5 +32,4 @@ class QVFakeCondition final : public QVCondition {
   std::size_t waiterCount_ = 0;
   std::size_t pendingSignalCount_ = 0;  // never above waiterCount_: nobody waits, nobody hears
   std::size_t waitCount_ = 0;
-  std::size_t signalCount_ = 0;
 };

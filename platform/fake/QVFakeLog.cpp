@@ -31,11 +31,6 @@ void QVFakeLog::write(const QVLogScope* scope, QVLogLevel level, const QVLogSite
                     site.line});
 }
 
-void QVFakeLog::flush() {
-  const std::lock_guard lock(mutex_);
-  ++flushCount_;
-}
-
 void QVFakeLog::setVerbose(std::string_view verboseKey, bool verbose) {
   const std::lock_guard lock(mutex_);
   verboseSwitches_[std::string(verboseKey)] = verbose;
@@ -67,11 +62,6 @@ std::vector<std::string> QVFakeLog::renderingsOfScope(std::string_view scope) co
 std::vector<QVFakeLog::Registration> QVFakeLog::registrations() const {
   const std::lock_guard lock(mutex_);
   return registrations_;
-}
-
-std::size_t QVFakeLog::flushCount() const {
-  const std::lock_guard lock(mutex_);
-  return flushCount_;
 }
 
 void QVFakeLog::clear() {

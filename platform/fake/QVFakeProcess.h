@@ -43,10 +43,6 @@ class QVFakeProcess final : public QVProcess {
     const std::lock_guard lock(mutex_);
     names_[processIdentifier] = std::move(name);
   }
-  void removeProcess(int32_t processIdentifier) {
-    const std::lock_guard lock(mutex_);
-    names_.erase(processIdentifier);
-  }
   // How often nameOfProcess() was asked.
   int lookUpCount() const {
     const std::lock_guard lock(mutex_);

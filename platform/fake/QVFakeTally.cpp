@@ -177,7 +177,6 @@ std::shared_ptr<const TallySampleSet> QVFakeTally::TallyCreateSamples(
   if (made == nullptr || set == nullptr) return nullptr;
   if (made->channels != set->channels) misuse_.note("a channel set of another subscription");
   const std::lock_guard lock(mutex_);
-  samplings_.push_back(made->driver);
   std::vector<Sample> samples;
   for (const Identity& identity : set->channels) {
     if (const auto value = currentValue(identity)) samples.emplace_back(identity, *value);
@@ -278,9 +277,4 @@ std::vector<QVFakeTally::Driver> QVFakeTally::lookUps() const {
 std::vector<QVFakeTally::Driver> QVFakeTally::subscriptions() const {
   const std::lock_guard lock(mutex_);
   return subscriptions_;
-}
-
-std::vector<QVFakeTally::Driver> QVFakeTally::samplings() const {
-  const std::lock_guard lock(mutex_);
-  return samplings_;
 }

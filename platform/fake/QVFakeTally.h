@@ -77,9 +77,8 @@ class QVFakeTally final : public QVTally {
 
   // The drivers that channels were asked for, in order.
   std::vector<Driver> lookUps() const;
-  // Subscriptions that were asked for, samplings of a driver, in order.
+  // Those of the subscriptions that were asked for, in order.
   std::vector<Driver> subscriptions() const;
-  std::vector<Driver> samplings() const;
   std::vector<std::string> takeMisuses() { return misuse_.take(); }
 
  private:
@@ -117,5 +116,4 @@ class QVFakeTally final : public QVTally {
   Failures failures_;
   std::vector<Driver> lookUps_;
   std::vector<Driver> subscriptions_;
-  std::vector<Driver> samplings_;
 };

@@ -170,8 +170,3 @@ std::vector<QVFakeWorkQueues::QueueRecord> QVFakeWorkQueues::queues() const {
   }
   return records;
 }
-
-std::string QVFakeWorkQueues::currentLabel() const {
-  const std::lock_guard lock(state_->mutex);
-  return state_->stack.empty() ? std::string() : state_->stack.back()->label;
-}

@@ -74,8 +74,6 @@ class QVFakeWorkQueues final : public QVWorkQueues {
   std::size_t delayedCount() const;
   // Every queue made so far, in order. The background queue is listed from its first use.
   std::vector<QueueRecord> queues() const;
-  // Label of the queue whose item is running (the innermost); empty outside of items.
-  std::string currentLabel() const;
 
  private:
   bool runOne(const std::optional<std::string_view>& label);

@@ -1,14 +1,13 @@
 #include "tools/qvctl/QVSummaryNumbers.h"
 
+#include "QVServices/Statistics/QVReportingVocabulary.h"
+
 #include <charconv>
 #include <cmath>
 #include <cstdlib>
 #include <system_error>
 
 namespace {
-
-// A key that the summary event has, and no other message.
-constexpr std::string_view kSummaryKey = "QV_Session_Summary_Event";
 
 double numberOf(std::string_view digits) {
   double number = 0;
@@ -39,7 +38,7 @@ void QVSummaryNumbers::end(Container /*container*/) {
 void QVSummaryNumbers::key(std::string_view text) {
   if (depth_ != kMessageDepth || !isMessage_) return;
   key_ = text;
-  if (text == kSummaryKey) isSummaryEvent_ = true;
+  if (text == kQVReportingSummaryEventKey) isSummaryEvent_ = true;
 }
 
 void QVSummaryNumbers::number(std::string_view digits) {

@@ -28,7 +28,6 @@ class QVToolOutput {
   QVToolOutput& operator=(const QVToolOutput&) = delete;
 
   bool isJSON() const { return isJSON_; }
-  bool isTerminal() const { return isTerminal_; }
   int descriptor() const { return descriptor_; }
   // Of the terminal; 0 where there is none, and a line may be as long as it is.
   std::size_t columns() const;

@@ -15,9 +15,6 @@ namespace {
 
 constexpr uint32_t kTraceRouted = 0x21042824;
 
-constexpr const char* kErrorDomain = "net.quillon.audio.reporting";
-constexpr int64_t kErrorSwitchedOff = 1;
-
 constexpr const char* kFunction =
     "-[QVReportingServerInstance sendMessage:withCategory:andType:forReportingIDs:reply:]";
 
@@ -94,7 +91,7 @@ void QVReportingServerInstance::route(const QVDictionary& message, uint32_t cate
   QVPlatform::shared().tracePoints->mark(kTraceRouted);
   const auto delegate = delegate_.lock();
   if (delegate == nullptr || !delegate->isReportingEnabled()) {
-    reply(QVError{kErrorDomain, kErrorSwitchedOff, {}});
+    reply(QVError{kQVReportingErrorDomain, kQVReportingErrorSwitchedOff, {}});
     return;
   }
   run("route a message of client", processIdentifier_, [&] {

@@ -18,7 +18,7 @@
 // Threads: created before the listener is resumed. New connections come on the listener's thread,
 // the handlers of connections on their IPC threads, everything else on the server queue, which this
 // object makes. The recursive lock covers setting up a connection and looking through all clients;
-// no other lock is taken inside it.
+// inside it no other lock is taken but the log's, which nobody holds for long.
 // Ownership: held by the entry point for the life of the process.
 class QVReportingServiceDelegate final
     : public QVIPCListenerDelegate,

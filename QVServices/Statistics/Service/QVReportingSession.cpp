@@ -7,7 +7,6 @@
 #include "QVServices/Statistics/Service/QVReportingSessionLog.h"
 #include "platform/QVPlatform.h"
 
-#include <cstdlib>
 #include <utility>
 
 namespace {
@@ -17,7 +16,7 @@ constexpr uint32_t kTraceStarted = 0x2104282C;
 constexpr uint32_t kTraceStopped = 0x21042830;
 constexpr uint32_t kTraceDestroyed = 0x21042834;
 
-constexpr const char* kBackendWaitSeconds = "9.0";
+constexpr double kBackendWaitSeconds = 9.0;
 
 QVPlatform& platform() {
   return QVPlatform::shared();
@@ -143,7 +142,7 @@ void QVReportingSession::setUpBeaconSession(std::optional<std::string_view> name
   const bool realtime = type == kQVReportingServiceTypeAPIUsage;
   const QVDictionary sessionInfo{
       {kBeaconSessionInfoClientType, QVReportingBeaconClient::kType},
-      {kBeaconSessionInfoClientVersion, QVReportingBeaconClient::version()},
+      {kBeaconSessionInfoClientVersion, QVReportingBeaconClient::kVersion},
       {kBeaconSessionInfoSessionID, reporterID_},
       {kBeaconSessionInfoBatchEvent, !realtime},
       {kBeaconSessionInfoHierarchyToken, beaconAgentToken_->description()},
@@ -161,7 +160,7 @@ void QVReportingSession::setUpBeaconSession(std::optional<std::string_view> name
       [search](const std::optional<QVArray>& backends) { handleBackends(*search, backends); });
   if (!QVReportingUtilityWait(*search->condition, search->found,
                               "waiting for beacond to find backends", "failed to find backend",
-                              scope(), std::strtod(kBackendWaitSeconds, nullptr))) {
+                              scope(), kBackendWaitSeconds)) {
     beaconSession_ = nullptr;
     beaconSessionStarted_ = false;
   }

@@ -29,9 +29,10 @@
 //   any of the three --stop--> Stopped --start--> Starting
 //
 // Created and Stopped: messages are counted and go out as single messages. From `start` on they are
-// collected for the summary and sent into the framework session (dropped without backends).
-// Dropping a started session neither stops nor summarises it. One that reports its orientation is
-// kept alive by the orientation service until it is stopped.
+// collected for the summary and sent into the framework session (dropped without backends). Those
+// of the time before the first start are collected, too, and thrown away by it. Dropping a started
+// session neither stops nor summarises it. One that reports its orientation is kept alive by the
+// orientation service until it is stopped.
 //
 // Threads: the operations run on the server queue; properties that other threads read are atomic or
 // locked as noted. Everything of the framework session happens on `beaconQueue`, in the order in
@@ -44,8 +45,8 @@ class QVReportingSession final : public QVReportingSessionInformation,
   using DriverSnapShot = std::shared_ptr<const QVReportingDriverSnapShot>;
   using MessageTypeCounts = std::map<std::string, uint32_t, std::less<>>;
 
-  // Collects up to `maximumBytes` between a start and a stop; what comes after that is sent all the
-  // same, and one error line says so.
+  // Collects up to `maximumBytes` at a time; what comes after that is sent all the same, and one
+  // error line says so.
   static std::shared_ptr<QVReportingSession> initWithID(
       int64_t reporterID, std::vector<int32_t> processIdentifiers,
       std::size_t maximumBytes = QVReportingPayloadStore::kMaximumBytes);
@@ -65,7 +66,7 @@ class QVReportingSession final : public QVReportingSessionInformation,
   void stop() noexcept;
 
   // Numbers, records and sends one message. The reply (may be empty) is answered with no error,
-  // before the framework sees the message; what becomes of the send is never told.
+  // without waiting for the framework; what becomes of the send is never told.
   void sendMessage(const QVDictionary& message, uint32_t category, uint16_t type, SendReply reply);
   // `sync` is accepted and ignored: every send is asynchronous.
   void sendMessage(const QVDictionary& message, uint32_t category, uint16_t type, bool sync,

@@ -47,7 +47,7 @@ void sendSingleMessageNow(const QVDictionary& message, uint32_t category, uint16
   log().verbose(scope(), kSendSingleFunction, "sending single message");
   const QVDictionary sessionInfo{
       {kBeaconSessionInfoClientType, QVReportingBeaconClient::kType},
-      {kBeaconSessionInfoClientVersion, QVReportingBeaconClient::version()},
+      {kBeaconSessionInfoClientVersion, QVReportingBeaconClient::kVersion},
       {kBeaconSessionInfoSessionID, QVReportingBeaconClient::kNoSessionID}};
   const QVDictionary userInfo{
       {kBeaconUserInfoClientName, QVReportingBeaconClient::kName},

@@ -15,8 +15,6 @@
 
 namespace {
 
-constexpr std::string_view kSummaryEventKey = "QV_Session_Summary_Event";
-
 constexpr std::string_view kSummaryDirectory = "/DiagnosticLogs/Audio/Reporting";
 // On an internal build everybody may list the files and clear them away.
 constexpr uint32_t kSummaryDirectoryPermissions = 0777;
@@ -137,7 +135,7 @@ QVDictionary QVReportingSession::createSummaryEventForSession() const {
   if (recorded == nullptr || recorded->empty()) return {};
 
   Columns columns;
-  columns.add(kSummaryEventKey, serviceType());
+  columns.add(kQVReportingSummaryEventKey, serviceType());
   recorded->forEach([&columns](std::string_view, const QVReportingPayloadArray::Payload& payload) {
     columns.add(payload);
   });

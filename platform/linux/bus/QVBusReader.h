@@ -80,8 +80,8 @@ class QVBusReader {
     align(8);
   }
   void leaveStruct() noexcept { --depth_; }
-  // A variant: its signature's text. It holds exactly one complete type, which enterVariant()
-  // checks and takes into `signature` unless it is a single character.
+  // A variant: its signature's text, which nobody has checked. Exactly one complete type is
+  // allowed: a single character of a basic type, or what parseVariantSignature() accepts.
   std::string_view enterVariantText() noexcept {
     deepen();
     return readSignatureText();

@@ -54,7 +54,7 @@ class QVBusServer {
   // What is read lies here until the next read, whichever connection's.
   std::span<char> readBuffer() noexcept { return {readBuffer_.get(), kReadBuffer}; }
   void forget(const QVBusConnection& connection);
-  // Calls continueReading() again when the budget admits more.
+  // Has the connection read on when the budget admits more.
   void resumeWhenAdmitted(const QVBusConnection& connection);
   // Settles the connection behind what exported objects have been asked to do so far.
   void settleAfterCalls(const std::shared_ptr<QVBusConnection>& connection);

@@ -12,8 +12,6 @@
 
 namespace {
 
-constexpr int64_t kReportingSwitchedOffCode = 1;
-
 // Reporter IDs that one message may list: as many as one connection may have sessions. Each is a
 // send of its own, all of them in one turn of the server queue.
 constexpr std::size_t kMostReporterIDs = 65'536;
@@ -44,7 +42,7 @@ void giveErrorObject(const QVBusReply& reply, const QVError& error) {
   // A negative code: an error's name may hold no "-".
   std::replace(name.begin(), name.end(), '-', '_');
   const bool switchedOff =
-      error.domain == kReportingErrorDomain && error.code == kReportingSwitchedOffCode;
+      error.domain == kQVReportingErrorDomain && error.code == kQVReportingErrorSwitchedOff;
   reply.giveError(name, switchedOff ? std::string(kReportingSwitchedOffText) : error.description());
 }
 

@@ -12,8 +12,7 @@ inline constexpr std::string_view kReportingServicePath = "/net/quillon/quietvox
 inline constexpr std::string_view kReportingServiceInterface =
     "net.quillon.quietvox.ReportingService";
 
-// The error object of a message that is refused because reporting is switched off.
-inline constexpr std::string_view kReportingErrorDomain = "net.quillon.audio.reporting";
+// The text of the error of a message that is refused because reporting is switched off.
 inline constexpr std::string_view kReportingSwitchedOffText = "reporting is switched off";
 
 enum class QVReportingServiceOperation : std::size_t {
@@ -47,8 +46,3 @@ inline constexpr std::array<QVBusMemberDescription, 11> kReportingServiceMembers
     {kReportingServiceInterface, "GetAllReporters", "", "", "ax", "reporterIDs"},
     {kReportingServiceInterface, "KillService", "", "", "b", "handled"},
 }};
-
-constexpr const QVBusMemberDescription& QVReportingServiceMember(
-    QVReportingServiceOperation operation) {
-  return kReportingServiceMembers[static_cast<std::size_t>(operation)];
-}

@@ -13,7 +13,6 @@
 namespace {
 
 // Longer texts are a client's doing; the journal itself would take no more than three times this.
-constexpr std::size_t kMaximumTextBytes = std::size_t{16} * 1024;
 
 const char* withoutDirectories(const char* path) {
   const char* const slash = std::strrchr(path, '/');
@@ -25,8 +24,8 @@ bool continuesCharacter(char byte) {
 }
 
 void limitText(std::string& text) {
-  if (text.size() <= kMaximumTextBytes) return;
-  std::size_t end = kMaximumTextBytes;
+  if (text.size() <= QVLog::kMaximumTextBytes) return;
+  std::size_t end = QVLog::kMaximumTextBytes;
   while (end > 0 && continuesCharacter(text[end])) --end;
   const std::size_t rest = text.size() - end;
   text.resize(end);

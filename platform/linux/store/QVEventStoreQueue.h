@@ -32,10 +32,7 @@ class QVEventStoreQueue {
   static constexpr std::size_t kSpareBatches = 8;
 
   // A search for backends: is the store there?
-  struct Search {
-    std::shared_ptr<QVEventSession> session;
-    QVBeaconSession::BackendsCompletion completion;
-  };
+  using Search = QVBeaconSession::BackendsCompletion;
   struct Work {
     std::vector<Search> searches;
     std::deque<QVEventRows> batches;
@@ -62,6 +59,7 @@ class QVEventStoreQueue {
     if (wake) wake_.notify_one();
     return true;
   }
+  // As add().
   [[nodiscard]] bool search(Search& search);
   // Everything waiting is handed out once more; nothing is taken in any longer.
   void stop();

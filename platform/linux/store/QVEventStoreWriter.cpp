@@ -151,7 +151,7 @@ void QVEventStoreWriter::answer(std::vector<QVEventStoreQueue::Search> searches)
   for (QVEventStoreQueue::Search& search : searches) {
     std::optional<QVArray> backends;
     if (tables_.isOpen()) backends = QVArray{QVValue(kBackend)};
-    guarded([&] { search.completion(std::move(backends)); });
+    guarded([&] { search(std::move(backends)); });
   }
 }
 

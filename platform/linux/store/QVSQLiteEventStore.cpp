@@ -45,10 +45,8 @@ bool QVSQLiteEventStore::addJoulewellEvent(int32_t agent, std::string name,
   return add(row, false);
 }
 
-void QVSQLiteEventStore::findBackends(std::shared_ptr<QVEventSession> session,
-                                      QVBeaconSession::BackendsCompletion completion) {
-  QVEventStoreQueue::Search search{std::move(session), std::move(completion)};
-  if (!startWriter() || !queue_.search(search)) search.completion(std::nullopt);
+void QVSQLiteEventStore::findBackends(QVBeaconSession::BackendsCompletion completion) {
+  if (!startWriter() || !queue_.search(completion)) completion(std::nullopt);
 }
 
 void QVSQLiteEventStore::flush(std::shared_ptr<QVEventSession> session,

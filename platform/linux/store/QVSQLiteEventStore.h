@@ -23,7 +23,7 @@ class QVEventStoreWriter;
 // by one thread. The adapters of the three hold it together.
 //
 // Rows go through a queue (QVEventStoreQueue) to the writer (QVEventStoreWriter), which begins with
-// the first of them; until then there is no thread and no file. Rows are committed 500 at a time or
+// the first of them; until then there is no thread and no file. Rows are committed once 500 wait or
 // 250 ms after they came, at once where they are urgent or a flush asks for it.
 //
 // Where the thread cannot be had, that is tried again with each row and each search. Until then a
@@ -54,8 +54,7 @@ class QVSQLiteEventStore {
 
   // Answers whether the store can be used, opening it where it is not open. A closed store answers
   // at once.
-  void findBackends(std::shared_ptr<QVEventSession> session,
-                    QVBeaconSession::BackendsCompletion completion);
+  void findBackends(QVBeaconSession::BackendsCompletion completion);
   // Answers when everything that was handed over before is stored, or that it cannot be.
   void flush(std::shared_ptr<QVEventSession> session, QVBeaconSession::FlushCompletion completion);
 

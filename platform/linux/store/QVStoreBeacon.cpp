@@ -85,7 +85,7 @@ class Session : public QVBeaconSession {
     return QVText("beacon session ", session_->sessionID, " ", session_->token);
   }
   void startConfigurationWithCompletionHandler(BackendsCompletion completion) override {
-    store_->findBackends(session_, std::move(completion));
+    store_->findBackends(std::move(completion));
   }
   [[nodiscard]] bool sendMessageWithCategory(uint16_t category, uint16_t type,
                                              const QVDictionary& payload,

@@ -49,12 +49,6 @@ TEST(QVFakeLogTest, RecordsRegistrationsAndReadsTheSwitchAtEach) {
   EXPECT_EQ(scope->subsystem, "net.quillon.quietvox");
 }
 
-TEST(QVFakeLogTest, CountsFlushes) {
-  QVFakeLog log;
-  log.flush();
-  EXPECT_EQ(log.flushCount(), 1U);
-}
-
 TEST(QVFakeLogTest, TakesLinesFromSeveralThreads) {
   QVFakeLog log;
   std::thread other([&log] {

@@ -153,13 +153,6 @@ TEST_F(QVFakeWorkQueuesTest, RecordsEveryQueue) {
   EXPECT_EQ(records[1].enqueuedCount, 1U);
 }
 
-TEST_F(QVFakeWorkQueuesTest, TellsWhoseItemIsRunning) {
-  makeQueue("a")->async([this] { ran_.push_back(queues_.currentLabel()); });
-  queues_.runUntilIdle();
-  EXPECT_THAT(ran_, ElementsAre("a"));
-  EXPECT_EQ(queues_.currentLabel(), "");
-}
-
 TEST_F(QVFakeWorkQueuesTest, LetsOtherQueuesGoOnWhileAnItemWaits) {
   const auto a = makeQueue("a");
   const auto b = makeQueue("b");

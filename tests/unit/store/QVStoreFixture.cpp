@@ -89,8 +89,7 @@ void QVStoreFixture::logJoulewell(const QVDictionary& event) {
 
 std::optional<QVArray> QVStoreFixture::findBackends() {
   std::promise<std::optional<QVArray>> answer;
-  store().findBackends(std::make_shared<QVEventSession>(),
-                       [&answer](std::optional<QVArray> list) { answer.set_value(list); });
+  store().findBackends([&answer](std::optional<QVArray> list) { answer.set_value(list); });
   return await(answer.get_future());
 }
 
