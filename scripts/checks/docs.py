@@ -1,4 +1,4 @@
-"""What the documents name exists: files, links, commands and their options, presets, programs, classes.
+"""What the documents name exists: files, links, commands and their options, presets, programs, classes, tests.
 
 Looks at code spans, code blocks and links of every Markdown file, and at the manual pages. A block
 marked `sh` holds shell: each command in it is one of the project's or one that is named below. A
@@ -34,6 +34,8 @@ SPAN = re.compile(r"(?P<ticks>`+)(?P<code>.+?)(?P=ticks)")
 FENCE = re.compile(r"^\s*(```|~~~)(?P<language>\w*)")
 SHOWN = re.compile(r"<!-- (?P<path>\S+) -->")
 CLASS = re.compile(r"\bQV[A-Z]\w*[a-z]\w*")
+TEST = re.compile(r"\b(?P<name>QV\w+\.[A-Z]\w*)")
+TEST_MADE = re.compile(r"^(?:TYPED_)?TEST(?:_F|_P)?\(\s*(?P<suite>\w+),\s*(?P<name>\w+)\)", re.MULTILINE)
 PRESET = re.compile(r"--preset[ =](?P<name>[\w-]+)")
 PROGRAM = re.compile(r"\bbuild/(?P<preset>[\w<>*-]+)/bin/(?P<name>[\w-]+)")
 
@@ -124,6 +126,8 @@ class Documents:
             self.presets = {preset["name"] for preset in presets["configurePresets"]}
         sources = project.sources(".cpp", ".h", ".c")
         self.words = {word for name in sources for word in re.findall(r"\w+", project.read(name))}
+        self.tests = {f"{test['suite']}.{test['name']}" for name in sources
+                      for test in TEST_MADE.finditer(project.read(name))}
         # Names of files count: a class may have several sources.
         self.words |= {os.path.splitext(os.path.basename(name))[0] for name in project.files}
 
@@ -137,7 +141,7 @@ class Documents:
                     for name in itertools.chain(self.project.files, self.folders)))
 
     def check_names(self, name, line, code):
-        """Presets, programs by their paths, classes and files, wherever in a text they stand."""
+        """Presets, programs by their paths, classes, tests and files, wherever in a text they stand."""
         for match in PROGRAM.finditer(code):
             if match["name"] not in self.usages.programs:
                 self.report(name, line, f"{match[0]}: no target of the build is called so")
@@ -149,6 +153,9 @@ class Documents:
         for match in CLASS.finditer(code):
             if match[0] not in self.words:
                 self.report(name, line, f"{match[0]}: the sources know no such name")
+        for match in TEST.finditer(code):
+            if match["name"] not in self.tests:
+                self.report(name, line, f"{match['name']}: no test is called so")
         for match in self.path.finditer(code):
             for pattern in expand(match["path"]):
                 if not self.exists(pattern):

@@ -72,14 +72,15 @@ GOOD = {
     "daemon/main.cpp":
         '#include "platform/linux/bus/QVBusThing.h"\n\nint main(int argc, char** argv) {\n'
         '  return argc > 1 && argv[1][0] == \'-\' ? 1 : 0;\n}\n',
-    "tests/unit/QVThingTest.cpp": '#include "platform/QVThing.h"\n\n#include <gtest/gtest.h>\n',
+    "tests/unit/QVThingTest.cpp":
+        '#include "platform/QVThing.h"\n\n#include <gtest/gtest.h>\n\nTEST(QVThingTest, HasASize) {}\n',
     "tools/CMakeLists.txt": "add_executable(thingctl main.cpp)\n",
     "tools/main.cpp": TOOL_SOURCE,
     "tools/thingctl.1": PAGE,
     "build/dev/bin/thingctl": TOOL,
     "scripts/tool": SCRIPT,
     "README.md":
-        "# Thing\n\nSee [the header](platform/QVThing.h), `platform/*.h`, `QVThing` and\n"
+        "# Thing\n\nSee [the header](platform/QVThing.h), `platform/*.h`, `QVThing`, `QVThingTest.HasASize` and\n"
         "`platform/linux/bus/QVBusThing.{h,cpp}`. `thingctl COMMAND --json`.\n\n```sh\n"
         "cmake --preset dev\nscripts/tool --loud\nKEY=value build/dev/bin/thingd 2>/dev/null\n"
         "echo 'one\ntwo' | thingctl --json look \\\n  --all -- --gone\n```\n\n<!-- tools/CMakeLists.txt -->\n"
@@ -192,7 +193,7 @@ FAULTS = [
     # Documents.
     *[fault("docs", "docs", "README.md:3", "README.md", f"# Thing\n\n{text}\n") for text in (
         "See `platform/QVGone.h`.", "See `platform/gone/*.h`.", "See [it](platform/QVGone.h).",
-        "Made of `QVGone`.", "Run `scripts/tool --quiet`.", "Run `cmake --preset fast`.",
+        "Made of `QVGone`.", "As in `QVThingTest.IsGone`.", "Run `scripts/tool --quiet`.", "Run `cmake --preset fast`.",
         "Run `build/dev/bin/goned`.", "Run `build/slow/bin/thingd`.", "Run `build/dev/bin/thingd --gone`.",
         "See `platform/linux/bus/QVBusThing.{h,c}`.")],
     fault("docs", "docs", "README.md:2", "README.md", "```\nscripts/gone\n```\n"),
