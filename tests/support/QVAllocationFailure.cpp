@@ -31,8 +31,12 @@ bool QVAllocationFailure::hasHappened() {
   return state == State::happened;
 }
 
+void* operator new(std::size_t bytes, const std::nothrow_t&) noexcept {
+  return failsNow() ? nullptr : std::malloc(bytes);
+}
+
 void* operator new(std::size_t bytes) {
-  void* const memory = failsNow() ? nullptr : std::malloc(bytes);
+  void* const memory = operator new(bytes, std::nothrow);
   if (memory == nullptr) throw std::bad_alloc();
   return memory;
 }
