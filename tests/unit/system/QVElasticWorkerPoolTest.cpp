@@ -2,12 +2,14 @@
 #include "platform/linux/queues/QVElasticWorkerPool.h"
 #include "platform/linux/queues/QVStdConditions.h"
 #include "tests/unit/system/QVEvent.h"
+#include "tests/unit/system/QVThreadEnds.h"
 
 #include <algorithm>
 #include <atomic>
 #include <chrono>
 #include <memory>
 #include <mutex>
+#include <semaphore>
 #include <set>
 #include <thread>
 #include <vector>
@@ -65,40 +67,14 @@ TEST_F(QVElasticWorkerPoolTest, RunsOtherWorkWhileTwoHundredTasksWait) {
   ledger_.waitUntilEmpty();
 }
 
-// Notes the thread that it is made on, and when that thread ends.
-class ThreadWatch {
- public:
-  struct Ends {
-    std::mutex mutex;
-    std::condition_variable changed;
-    int madeCount = 0;
-    int endedCount = 0;
-  };
-
-  static void watchThisThread(Ends& ends) { thread_local const ThreadWatch kWatch(ends); }
-
- private:
-  explicit ThreadWatch(Ends& ends) : ends_(ends) {
-    const std::lock_guard lock(ends_.mutex);
-    ++ends_.madeCount;
-  }
-  ~ThreadWatch() {
-    const std::lock_guard lock(ends_.mutex);
-    ++ends_.endedCount;
-    ends_.changed.notify_all();
-  }
-
-  Ends& ends_;
-};
-
 TEST_F(QVElasticWorkerPoolTest, RetiresAllRestingWorkersButOne) {
   constexpr int kCount = 20;
   makePool({.concurrency = 2, .workers = 64, .rest = 1ms});
-  ThreadWatch::Ends ends;
+  QVThreadEnds ends;
   QVEvent allWait;
   for (int i = 0; i < kCount; ++i) {
     submit([this, &ends, &allWait] {
-      ThreadWatch::watchThisThread(ends);
+      ends.watchThisThread();
       condition_->lock();
       if (++waitCount_ == kCount) allWait.happen();
       while (!mayEnd_) condition_->waitForTimeout(1min);
@@ -108,18 +84,14 @@ TEST_F(QVElasticWorkerPoolTest, RetiresAllRestingWorkersButOne) {
   ASSERT_TRUE(allWait.wait());
   endWaits();
   ledger_.waitUntilEmpty();
-  std::unique_lock lock(ends.mutex);
-  EXPECT_TRUE(
-      ends.changed.wait_for(lock, 1min, [&ends] { return ends.endedCount >= ends.madeCount - 1; }));
-  EXPECT_EQ(ends.madeCount, kCount);
-  lock.unlock();
+  EXPECT_TRUE(ends.waitUntilLeft(1));
+  EXPECT_EQ(ends.watchedCount(), kCount);
   // One is left, or is made again.
   QVEvent ran;
   submit([&ran] { ran.happen(); });
   EXPECT_TRUE(ran.wait());
   pool_->close();
-  lock.lock();
-  EXPECT_EQ(ends.endedCount, ends.madeCount) << "closing ends the last one, too";
+  EXPECT_EQ(ends.leftCount(), 0) << "closing ends the last one, too";
 }
 
 TEST_F(QVElasticWorkerPoolTest, RunsWhatHasNoWorkerWhereItIsAskedTo) {
@@ -164,20 +136,37 @@ TEST_F(QVElasticWorkerPoolTest, HasNoMoreWorkersThanItsLimit) {
 }
 
 TEST_F(QVElasticWorkerPoolTest, RunsNoMoreAtOnceThanItsConcurrency) {
-  makePool({.concurrency = 2, .workers = 64, .rest = 5s});
+  constexpr int kConcurrency = 2;
+  constexpr int kTasks = 100;
+  makePool({.concurrency = kConcurrency, .workers = 64, .rest = 5s});
+  // Each task keeps its worker, without the pool's knowing that it waits, until it is let go.
+  std::counting_semaphore<kTasks> begun{0};
+  std::counting_semaphore<kTasks> mayEnd{0};
   std::atomic<int> running{0};
   std::atomic<int> most{0};
-  for (int i = 0; i < 500; ++i) {
+  for (int i = 0; i < kTasks; ++i) {
     submit([&] {
       const int now = ++running;
       int known = most;
       while (known < now && !most.compare_exchange_weak(known, now)) {
       }
+      begun.release();
+      mayEnd.acquire();
       --running;
     });
   }
+  bool goesOn = true;
+  for (int i = 0; i < kConcurrency; ++i) goesOn = goesOn && begun.try_acquire_for(1min);
+  EXPECT_TRUE(goesOn) << "as many as may run do";
+  // One at a time: a worker too many has until the last one to begin a task.
+  for (int i = kConcurrency; i < kTasks && goesOn; ++i) {
+    mayEnd.release();
+    goesOn = begun.try_acquire_for(1min);
+  }
+  EXPECT_TRUE(goesOn) << "one that ends makes room for the next";
+  mayEnd.release(kTasks);
   ledger_.waitUntilEmpty();
-  EXPECT_LE(most, 2);
+  EXPECT_EQ(most, kConcurrency);
 }
 
 TEST_F(QVElasticWorkerPoolTest, KnowsItsOwnThreads) {

@@ -110,13 +110,15 @@ TEST_F(QVStdConditionTest, CutsEveryPresentWaitShort) {
 TEST_F(QVStdConditionTest, MayLoseItsLastHandleRightAfterAWait) {
   for (int i = 0; i < 100; ++i) {
     auto condition = conditions_.makeCondition();
+    const std::weak_ptr<QVCondition> watched = condition;
     std::thread waiter([condition] {
       condition->lock();
-      condition->waitForTimeout(0ms);
+      EXPECT_FALSE(condition->waitForTimeout(0ms));
       condition->unlock();
     });
     condition.reset();
     waiter.join();
+    EXPECT_TRUE(watched.expired()) << "what knew of its wait keeps it";
   }
 }
 
