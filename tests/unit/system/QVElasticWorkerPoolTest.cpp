@@ -8,10 +8,9 @@
 #include <atomic>
 #include <chrono>
 #include <memory>
-#include <mutex>
 #include <semaphore>
-#include <set>
 #include <thread>
+#include <utility>
 #include <vector>
 
 #include <gmock/gmock.h>
@@ -107,66 +106,84 @@ TEST_F(QVElasticWorkerPoolTest, RunsWhatHasNoWorkerWhereItIsAskedTo) {
   EXPECT_TRUE(ledger_.waitUntilEmpty(0s));
 }
 
-TEST_F(QVElasticWorkerPoolTest, HasNoMoreWorkersThanItsLimit) {
-  constexpr int kTasks = 12;
-  makePool({.concurrency = 2, .workers = 3, .rest = 5s});
-  std::mutex mutex;
-  std::set<std::thread::id> threads;
-  std::atomic<int> early{0};
-  QVEvent threeWait;
-  for (int i = 0; i < kTasks; ++i) {
-    submit([&] {
-      {
-        const std::lock_guard lock(mutex);
-        threads.insert(std::this_thread::get_id());
-      }
-      condition_->lock();
-      if (++waitCount_ == 3) threeWait.happen();
-      if (waitCount_ > 3 && !mayEnd_) ++early;
-      while (!mayEnd_) condition_->waitForTimeout(1min);
-      condition_->unlock();
-    });
+// Where a task waits without the pool's knowing.
+class PlainGate {
+ public:
+  void pass() { passes_.acquire(); }
+  void letPass(int count) { passes_.release(count); }
+
+ private:
+  std::counting_semaphore<> passes_{0};
+};
+
+// Where a task waits so that the pool may use another worker.
+class KnownGate {
+ public:
+  explicit KnownGate(std::shared_ptr<QVCondition> condition) : condition_(std::move(condition)) {}
+
+  void pass() {
+    condition_->lock();
+    while (passCount_ == 0) condition_->waitForTimeout(1min);
+    --passCount_;
+    condition_->unlock();
   }
-  ASSERT_TRUE(threeWait.wait());
-  endWaits();
-  ledger_.waitUntilEmpty();
-  EXPECT_EQ(threads.size(), 3U);
-  EXPECT_EQ(early, 0);
-  EXPECT_EQ(waitCount_, kTasks);
+  void letPass(int count) {
+    condition_->lock();
+    passCount_ += count;
+    for (int i = 0; i < count; ++i) condition_->signal();
+    condition_->unlock();
+  }
+
+ private:
+  const std::shared_ptr<QVCondition> condition_;
+  int passCount_ = 0;  // with the condition's lock
+};
+
+class QVElasticWorkerPoolBoundTest : public QVElasticWorkerPoolTest {
+ protected:
+  // Expects that of many tasks, each of which keeps its worker at the gate, so many run at once.
+  template <class Gate>
+  void expectAtOnce(int count, Gate& gate) {
+    constexpr int kTasks = 1'000;
+    std::counting_semaphore<> begun{0};
+    std::atomic<int> running{0};
+    std::atomic<int> most{0};
+    for (int i = 0; i < kTasks; ++i) {
+      submit([&] {
+        const int now = ++running;
+        int known = most;
+        while (known < now && !most.compare_exchange_weak(known, now)) {
+        }
+        begun.release();
+        gate.pass();
+        --running;
+      });
+    }
+    bool goesOn = true;
+    for (int i = 0; i < count && goesOn; ++i) goesOn = begun.try_acquire_for(1min);
+    EXPECT_TRUE(goesOn) << "as many as may run do";
+    // One at a time: a worker too many has until the last one to begin a task.
+    for (int i = count; i < kTasks && goesOn; ++i) {
+      gate.letPass(1);
+      goesOn = begun.try_acquire_for(1min);
+    }
+    EXPECT_TRUE(goesOn) << "one that ends makes room for the next";
+    gate.letPass(kTasks);
+    ledger_.waitUntilEmpty();
+    EXPECT_EQ(most, count);
+  }
+};
+
+TEST_F(QVElasticWorkerPoolBoundTest, HasNoMoreWorkersThanItsLimit) {
+  makePool({.concurrency = 2, .workers = 3, .rest = 5s});
+  KnownGate gate(condition_);
+  expectAtOnce(3, gate);
 }
 
-TEST_F(QVElasticWorkerPoolTest, RunsNoMoreAtOnceThanItsConcurrency) {
-  constexpr int kConcurrency = 2;
-  constexpr int kTasks = 100;
-  makePool({.concurrency = kConcurrency, .workers = 64, .rest = 5s});
-  // Each task keeps its worker, without the pool's knowing that it waits, until it is let go.
-  std::counting_semaphore<kTasks> begun{0};
-  std::counting_semaphore<kTasks> mayEnd{0};
-  std::atomic<int> running{0};
-  std::atomic<int> most{0};
-  for (int i = 0; i < kTasks; ++i) {
-    submit([&] {
-      const int now = ++running;
-      int known = most;
-      while (known < now && !most.compare_exchange_weak(known, now)) {
-      }
-      begun.release();
-      mayEnd.acquire();
-      --running;
-    });
-  }
-  bool goesOn = true;
-  for (int i = 0; i < kConcurrency; ++i) goesOn = goesOn && begun.try_acquire_for(1min);
-  EXPECT_TRUE(goesOn) << "as many as may run do";
-  // One at a time: a worker too many has until the last one to begin a task.
-  for (int i = kConcurrency; i < kTasks && goesOn; ++i) {
-    mayEnd.release();
-    goesOn = begun.try_acquire_for(1min);
-  }
-  EXPECT_TRUE(goesOn) << "one that ends makes room for the next";
-  mayEnd.release(kTasks);
-  ledger_.waitUntilEmpty();
-  EXPECT_EQ(most, kConcurrency);
+TEST_F(QVElasticWorkerPoolBoundTest, RunsNoMoreAtOnceThanItsConcurrency) {
+  makePool({.concurrency = 2, .workers = 64, .rest = 5s});
+  PlainGate gate;
+  expectAtOnce(2, gate);
 }
 
 TEST_F(QVElasticWorkerPoolTest, KnowsItsOwnThreads) {
