@@ -69,7 +69,11 @@ TEST_F(QVStdConditionTest, EndsTheOldestWaitFirst) {
 TEST_F(QVStdConditionTest, DoesNotTakeAWakeUpForASignal) {
   startWait(1, 1min);
   for (int i = 0; i < 1'000; ++i) condition_->wakeAll();
+  condition_->lock();
+  // Lets the other one have the lock, which it has to have to end.
+  EXPECT_FALSE(condition_->waitForTimeout(20ms));
   EXPECT_THAT(ends_, ElementsAre());
+  condition_->unlock();
   signal();
   joinAll();
   EXPECT_THAT(ends_, ElementsAre(1));
