@@ -173,7 +173,10 @@ TEST_F(QVPeerPressureTest, ReportingStaysSwitchedOffHoweverManyClientsConnect) {
 
 // More than the service holds of what it took in: it stops reading until the store has caught up.
 TEST_F(QVPeerPressureTest, AFloodOfMessagesIsStoredWithoutGrowingTheService) {
-  constexpr int kMessages = 60'000;
+  // Three times the bound, so that a good part would pile up even beside a store that is several
+  // times as fast against the rest as any that was measured: without the bound there were between
+  // 140 and 190 MiB, on one processor the least. More than this the store's file has no room for.
+  constexpr int kMessages = 90'000;
   constexpr int kMessagesOfABatch = 500;
   const QVDictionary message{{"text", std::string(2000, 'x')}};
   auto call = sendToAllCall(message, kSessionPlayback, kStart);
@@ -183,8 +186,8 @@ TEST_F(QVPeerPressureTest, AFloodOfMessagesIsStoredWithoutGrowingTheService) {
   for (int i = 0; i < kMessages / kMessagesOfABatch; ++i) ASSERT_TRUE(witness_.send(batch));
   expectServes(witness_);
   if (kMemoryTells) {
-    // Kilobytes: the bound of 64 MiB, and room for the rest.
-    EXPECT_LT(service().statusNumber("status", "VmHWM"), 128 * 1024);
+    // Kilobytes: the bound of 64 MiB and up to 25 MiB of everything else, as measured, and room.
+    EXPECT_LT(service().statusNumber("status", "VmHWM"), 104 * 1024);
   }
   endService();
   EXPECT_EQ(store().count("beacon_message"), kMessages);

@@ -13,6 +13,9 @@
 #include <condition_variable>
 #include <mutex>
 
+#include <gtest/gtest.h>
+#include <sys/resource.h>
+
 // Counts down to an event that a test waits for. Threads: any.
 class QVCountdown {
  public:
@@ -55,6 +58,13 @@ class QVFakeQueueHarness {
     return queues_.runOthersUntil(clock_.steadyTime() + std::chrono::minutes{1},
                                   [&countdown] { return countdown.isOver(); });
   }
+  // Does the calling thread wait in `act`? Then virtual time moves on.
+  template <class Act>
+  bool waitsDuring(Act act) {
+    const QVDuration before = clock_.steadyTime();
+    act();
+    return clock_.steadyTime() != before;
+  }
 
  private:
   QVFakeClock clock_;
@@ -75,8 +85,22 @@ class QVRealQueueHarness {
   static bool runUntil(QVCountdown& countdown) {
     return countdown.waitUntilOver(std::chrono::minutes{1});
   }
+  // Then it gives up its processor of its own accord.
+  template <class Act>
+  static bool waitsDuring(Act act) {
+    const long before = waitCount();
+    act();
+    return waitCount() != before;
+  }
 
  private:
+  // Of the calling thread, as the kernel counts.
+  static long waitCount() {
+    rusage usage{};
+    EXPECT_EQ(getrusage(RUSAGE_THREAD, &usage), 0);
+    return usage.ru_nvcsw;
+  }
+
   QVFakeLog log_;
   QVStdConditions conditions_;
   QVAsioWorkQueues queues_{log_};

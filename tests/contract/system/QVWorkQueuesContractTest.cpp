@@ -75,23 +75,37 @@ TYPED_TEST(QVWorkQueuesContract, RunsItemsThatItemsEnqueue) {
 TYPED_TEST(QVWorkQueuesContract, NeverRunsTwoItemsOfASerialQueueAtOnce) {
   constexpr int kThreads = 4;
   constexpr int kItems = 500;
-  for (const auto& queue : this->makeSerialQueues()) {
-    QVCountdown done(kThreads * kItems);
+  const auto queues = this->makeSerialQueues();
+  const auto others = this->makeSerialQueues();
+  for (std::size_t i = 0; i < queues.size(); ++i) {
+    QVCountdown done(1 + kThreads * kItems);
+    QVCountdown otherRan(1);
     std::atomic<int> running{0};
     std::atomic<int> overlaps{0};
-    std::vector<std::thread> threads;
-    for (int i = 0; i < kThreads; ++i) {
-      threads.emplace_back([&] {
-        for (int j = 0; j < kItems; ++j) {
-          queue->async([&] {
-            if (running.fetch_add(1) != 0) ++overlaps;
-            running.fetch_sub(1);
-            done.hit();
-          });
-        }
-      });
-    }
-    for (std::thread& thread : threads) thread.join();
+    const auto enqueueAll = [&] {
+      std::vector<std::thread> threads;
+      for (int thread = 0; thread < kThreads; ++thread) {
+        threads.emplace_back([&] {
+          for (int item = 0; item < kItems; ++item) {
+            queues[i]->async([&] {
+              if (running.fetch_add(1) != 0) ++overlaps;
+              running.fetch_sub(1);
+              done.hit();
+            });
+          }
+        });
+      }
+      for (std::thread& thread : threads) thread.join();
+      // Behind them all: whoever ran any of them beside the first would have come to it before.
+      std::thread([&] { others[i]->async([&otherRan] { otherRan.hit(); }); }).join();
+    };
+    queues[i]->async([&] {
+      ++running;
+      enqueueAll();
+      EXPECT_TRUE(this->harness_.runUntil(otherRan));
+      --running;
+      done.hit();
+    });
     ASSERT_TRUE(this->harness_.runUntil(done));
     EXPECT_EQ(overlaps, 0);
   }

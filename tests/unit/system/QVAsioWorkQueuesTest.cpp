@@ -191,8 +191,8 @@ TEST_F(QVAsioWorkQueuesTest, LetsTwoHundredWaitingQueuesDelayNoOther) {
   queues_.drain();
 }
 
-TEST_F(QVAsioWorkQueuesTest, HasNoTimerThreadWithoutDelayedItems) {
-  // Each round the thread has ended or is about to, and has to be there again.
+TEST_F(QVAsioWorkQueuesTest, DelaysAgainWhileTheTimerThreadEnds) {
+  // Each round the timer thread has ended or is about to, and has to be there again.
   const auto queue = queues_.makeSerialQueue("a", QVQualityOfService::utility, 0);
   for (int i = 0; i < 50; ++i) {
     QVEvent ran;

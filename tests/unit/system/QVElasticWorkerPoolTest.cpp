@@ -2,14 +2,15 @@
 #include "platform/linux/queues/QVElasticWorkerPool.h"
 #include "platform/linux/queues/QVStdConditions.h"
 #include "tests/unit/system/QVEvent.h"
+#include "tests/unit/system/QVThreadEnds.h"
 
 #include <algorithm>
 #include <atomic>
 #include <chrono>
 #include <memory>
-#include <mutex>
-#include <set>
+#include <semaphore>
 #include <thread>
+#include <utility>
 #include <vector>
 
 #include <gmock/gmock.h>
@@ -65,40 +66,14 @@ TEST_F(QVElasticWorkerPoolTest, RunsOtherWorkWhileTwoHundredTasksWait) {
   ledger_.waitUntilEmpty();
 }
 
-// Notes the thread that it is made on, and when that thread ends.
-class ThreadWatch {
- public:
-  struct Ends {
-    std::mutex mutex;
-    std::condition_variable changed;
-    int madeCount = 0;
-    int endedCount = 0;
-  };
-
-  static void watchThisThread(Ends& ends) { thread_local const ThreadWatch kWatch(ends); }
-
- private:
-  explicit ThreadWatch(Ends& ends) : ends_(ends) {
-    const std::lock_guard lock(ends_.mutex);
-    ++ends_.madeCount;
-  }
-  ~ThreadWatch() {
-    const std::lock_guard lock(ends_.mutex);
-    ++ends_.endedCount;
-    ends_.changed.notify_all();
-  }
-
-  Ends& ends_;
-};
-
 TEST_F(QVElasticWorkerPoolTest, RetiresAllRestingWorkersButOne) {
   constexpr int kCount = 20;
   makePool({.concurrency = 2, .workers = 64, .rest = 1ms});
-  ThreadWatch::Ends ends;
+  QVThreadEnds ends;
   QVEvent allWait;
   for (int i = 0; i < kCount; ++i) {
     submit([this, &ends, &allWait] {
-      ThreadWatch::watchThisThread(ends);
+      ends.watchThisThread();
       condition_->lock();
       if (++waitCount_ == kCount) allWait.happen();
       while (!mayEnd_) condition_->waitForTimeout(1min);
@@ -108,18 +83,14 @@ TEST_F(QVElasticWorkerPoolTest, RetiresAllRestingWorkersButOne) {
   ASSERT_TRUE(allWait.wait());
   endWaits();
   ledger_.waitUntilEmpty();
-  std::unique_lock lock(ends.mutex);
-  EXPECT_TRUE(
-      ends.changed.wait_for(lock, 1min, [&ends] { return ends.endedCount >= ends.madeCount - 1; }));
-  EXPECT_EQ(ends.madeCount, kCount);
-  lock.unlock();
+  EXPECT_TRUE(ends.waitUntilLeft(1));
+  EXPECT_EQ(ends.watchedCount(), kCount);
   // One is left, or is made again.
   QVEvent ran;
   submit([&ran] { ran.happen(); });
   EXPECT_TRUE(ran.wait());
   pool_->close();
-  lock.lock();
-  EXPECT_EQ(ends.endedCount, ends.madeCount) << "closing ends the last one, too";
+  EXPECT_EQ(ends.leftCount(), 0) << "closing ends the last one, too";
 }
 
 TEST_F(QVElasticWorkerPoolTest, RunsWhatHasNoWorkerWhereItIsAskedTo) {
@@ -135,49 +106,84 @@ TEST_F(QVElasticWorkerPoolTest, RunsWhatHasNoWorkerWhereItIsAskedTo) {
   EXPECT_TRUE(ledger_.waitUntilEmpty(0s));
 }
 
-TEST_F(QVElasticWorkerPoolTest, HasNoMoreWorkersThanItsLimit) {
-  constexpr int kTasks = 12;
-  makePool({.concurrency = 2, .workers = 3, .rest = 5s});
-  std::mutex mutex;
-  std::set<std::thread::id> threads;
-  std::atomic<int> early{0};
-  QVEvent threeWait;
-  for (int i = 0; i < kTasks; ++i) {
-    submit([&] {
-      {
-        const std::lock_guard lock(mutex);
-        threads.insert(std::this_thread::get_id());
-      }
-      condition_->lock();
-      if (++waitCount_ == 3) threeWait.happen();
-      if (waitCount_ > 3 && !mayEnd_) ++early;
-      while (!mayEnd_) condition_->waitForTimeout(1min);
-      condition_->unlock();
-    });
+// Where a task waits without the pool's knowing.
+class PlainGate {
+ public:
+  void pass() { passes_.acquire(); }
+  void letPass(int count) { passes_.release(count); }
+
+ private:
+  std::counting_semaphore<> passes_{0};
+};
+
+// Where a task waits so that the pool may use another worker.
+class KnownGate {
+ public:
+  explicit KnownGate(std::shared_ptr<QVCondition> condition) : condition_(std::move(condition)) {}
+
+  void pass() {
+    condition_->lock();
+    while (passCount_ == 0) condition_->waitForTimeout(1min);
+    --passCount_;
+    condition_->unlock();
   }
-  ASSERT_TRUE(threeWait.wait());
-  endWaits();
-  ledger_.waitUntilEmpty();
-  EXPECT_EQ(threads.size(), 3U);
-  EXPECT_EQ(early, 0);
-  EXPECT_EQ(waitCount_, kTasks);
+  void letPass(int count) {
+    condition_->lock();
+    passCount_ += count;
+    for (int i = 0; i < count; ++i) condition_->signal();
+    condition_->unlock();
+  }
+
+ private:
+  const std::shared_ptr<QVCondition> condition_;
+  int passCount_ = 0;  // with the condition's lock
+};
+
+class QVElasticWorkerPoolBoundTest : public QVElasticWorkerPoolTest {
+ protected:
+  // Expects that of many tasks, each of which keeps its worker at the gate, so many run at once.
+  template <class Gate>
+  void expectAtOnce(int count, Gate& gate) {
+    constexpr int kTasks = 1'000;
+    std::counting_semaphore<> begun{0};
+    std::atomic<int> running{0};
+    std::atomic<int> most{0};
+    for (int i = 0; i < kTasks; ++i) {
+      submit([&] {
+        const int now = ++running;
+        int known = most;
+        while (known < now && !most.compare_exchange_weak(known, now)) {
+        }
+        begun.release();
+        gate.pass();
+        --running;
+      });
+    }
+    bool goesOn = true;
+    for (int i = 0; i < count && goesOn; ++i) goesOn = begun.try_acquire_for(1min);
+    EXPECT_TRUE(goesOn) << "as many as may run do";
+    // One at a time: a worker too many has until the last one to begin a task.
+    for (int i = count; i < kTasks && goesOn; ++i) {
+      gate.letPass(1);
+      goesOn = begun.try_acquire_for(1min);
+    }
+    EXPECT_TRUE(goesOn) << "one that ends makes room for the next";
+    gate.letPass(kTasks);
+    ledger_.waitUntilEmpty();
+    EXPECT_EQ(most, count);
+  }
+};
+
+TEST_F(QVElasticWorkerPoolBoundTest, HasNoMoreWorkersThanItsLimit) {
+  makePool({.concurrency = 2, .workers = 3, .rest = 5s});
+  KnownGate gate(condition_);
+  expectAtOnce(3, gate);
 }
 
-TEST_F(QVElasticWorkerPoolTest, RunsNoMoreAtOnceThanItsConcurrency) {
+TEST_F(QVElasticWorkerPoolBoundTest, RunsNoMoreAtOnceThanItsConcurrency) {
   makePool({.concurrency = 2, .workers = 64, .rest = 5s});
-  std::atomic<int> running{0};
-  std::atomic<int> most{0};
-  for (int i = 0; i < 500; ++i) {
-    submit([&] {
-      const int now = ++running;
-      int known = most;
-      while (known < now && !most.compare_exchange_weak(known, now)) {
-      }
-      --running;
-    });
-  }
-  ledger_.waitUntilEmpty();
-  EXPECT_LE(most, 2);
+  PlainGate gate;
+  expectAtOnce(2, gate);
 }
 
 TEST_F(QVElasticWorkerPoolTest, KnowsItsOwnThreads) {

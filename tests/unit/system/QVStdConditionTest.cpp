@@ -69,7 +69,11 @@ TEST_F(QVStdConditionTest, EndsTheOldestWaitFirst) {
 TEST_F(QVStdConditionTest, DoesNotTakeAWakeUpForASignal) {
   startWait(1, 1min);
   for (int i = 0; i < 1'000; ++i) condition_->wakeAll();
+  condition_->lock();
+  // Lets the other one have the lock, which it has to have to end.
+  EXPECT_FALSE(condition_->waitForTimeout(20ms));
   EXPECT_THAT(ends_, ElementsAre());
+  condition_->unlock();
   signal();
   joinAll();
   EXPECT_THAT(ends_, ElementsAre(1));
@@ -110,13 +114,15 @@ TEST_F(QVStdConditionTest, CutsEveryPresentWaitShort) {
 TEST_F(QVStdConditionTest, MayLoseItsLastHandleRightAfterAWait) {
   for (int i = 0; i < 100; ++i) {
     auto condition = conditions_.makeCondition();
+    const std::weak_ptr<QVCondition> watched = condition;
     std::thread waiter([condition] {
       condition->lock();
-      condition->waitForTimeout(0ms);
+      EXPECT_FALSE(condition->waitForTimeout(0ms));
       condition->unlock();
     });
     condition.reset();
     waiter.join();
+    EXPECT_TRUE(watched.expired()) << "what knew of its wait keeps it";
   }
 }
 
