@@ -21,8 +21,7 @@ QVAsioSerialQueue::QVAsioSerialQueue(std::string_view label, QVWorkExecutor& exe
 void QVAsioSerialQueue::async(QVWorkItem item) {
   {
     const QVMutexLock lock(mutex_);
-    if (enqueued_ == nullptr) enqueued_ = std::make_unique<Items>();
-    enqueued_->push_back(std::move(item));
+    enqueued_.add(std::move(item));
     if (std::exchange(isScheduled_, true)) return;
   }
   try {
@@ -59,14 +58,14 @@ void QVAsioSerialQueue::unschedule() noexcept {
 void QVAsioSerialQueue::submit() {
   QVWorkItem task = [self = shared_from_this()] { self->run(); };
   if (executor_.submit(task)) return;
-  std::unique_ptr<Items> refused;
+  QVWorkItems refused;
   {
     const QVMutexLock lock(mutex_);
-    refused.swap(enqueued_);
+    std::swap(refused, enqueued_);
     isScheduled_ = false;
   }
   // In their order, and without the lock: an item may hold whatever enqueues again on its way out.
-  while (refused != nullptr && !refused->empty()) refused->pop_front();
+  refused.consume([](QVWorkItem& item) { item = nullptr; });
 }
 
 void QVAsioSerialQueue::run() {
@@ -84,22 +83,22 @@ void QVAsioSerialQueue::run() {
 
 // Are there more items?
 bool QVAsioSerialQueue::runBatch() {
-  std::unique_ptr<Items> batch;
+  QVWorkItems batch;
   {
     const QVMutexLock lock(mutex_);
-    batch.swap(enqueued_);
+    std::swap(batch, enqueued_);
   }
-  if (batch != nullptr) {
+  {
     const QVWakeUpBatch wakeUps;
     std::size_t untilWakeUp = kItemsPerWakeUp;
-    for (; !batch->empty(); batch->pop_front()) {
-      QVRunWorkItem(batch->front(), label_, log_);
-      if (--untilWakeUp != 0) continue;
+    batch.consume([&](QVWorkItem& item) {
+      QVRunWorkItem(item, label_, log_);
+      if (--untilWakeUp != 0) return;
       untilWakeUp = kItemsPerWakeUp;
       QVWakeUpBatch::wakeNow();
-    }
+    });
   }
   const QVMutexLock lock(mutex_);
-  isScheduled_ = enqueued_ != nullptr;
+  isScheduled_ = !enqueued_.isEmpty();
   return isScheduled_;
 }

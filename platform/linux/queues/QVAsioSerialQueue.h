@@ -5,8 +5,8 @@
 #include "platform/linux/QVThreadAnnotations.h"
 #include "platform/linux/queues/QVAsioTimers.h"
 #include "platform/linux/queues/QVWorkExecutor.h"
+#include "platform/linux/queues/QVWorkItems.h"
 
-#include <deque>
 #include <memory>
 #include <string>
 
@@ -34,9 +34,6 @@ class QVAsioSerialQueue final : public QVWorkQueue,
   std::string_view label() const override { return label_; }
 
  private:
-  // Keeps items where they are while it grows, and gives its memory back while it is emptied.
-  using Items = std::deque<QVWorkItem>;
-
   void submit();
   void submitLater() noexcept;
   void unschedule() noexcept;
@@ -49,6 +46,6 @@ class QVAsioSerialQueue final : public QVWorkQueue,
   QVLog& log_;
 
   QVMutex mutex_;
-  std::unique_ptr<Items> enqueued_ QV_GUARDED_BY(mutex_);  // null: none
+  QVWorkItems enqueued_ QV_GUARDED_BY(mutex_);
   bool isScheduled_ QV_GUARDED_BY(mutex_) = false;
 };

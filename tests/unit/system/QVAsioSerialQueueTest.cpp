@@ -2,9 +2,13 @@
 #include "platform/linux/QVWakeUpBatch.h"
 #include "platform/linux/queues/QVAsioSerialQueue.h"
 #include "platform/linux/queues/QVStdConditions.h"
+#include "tests/support/QVAllocationFailure.h"
 
+#include <algorithm>
 #include <chrono>
+#include <cstddef>
 #include <deque>
+#include <functional>
 #include <memory>
 #include <new>
 #include <numeric>
@@ -146,6 +150,33 @@ TEST_F(QVAsioSerialQueueTest, DestroysItemsOfAClosedExecutorInTheirOrder) {
   std::vector<int> all(kItems);
   std::iota(all.begin(), all.end(), 0);
   EXPECT_EQ(destroyed, all);
+}
+
+// An item whose submission failed stays and may run, too, although its sender was told.
+TEST_F(QVAsioSerialQueueTest, RunsWhatItTookOnceAndInOrderWhicheverAllocationFailed) {
+  constexpr int kItems = 100;
+  bool happened = true;
+  for (std::size_t before = 0; happened; ++before) {
+    const auto queue = makeQueue();
+    std::vector<int> ran;
+    std::vector<int> taken;
+    ran.reserve(kItems);
+    taken.reserve(kItems);
+    {
+      const QVAllocationFailure failure(before);
+      for (int i = 0; i < kItems; ++i) {
+        try {
+          queue->async([&ran, i] { ran.push_back(i); });
+          taken.push_back(i);
+        } catch (const std::bad_alloc&) {
+        }
+      }
+      happened = QVAllocationFailure::hasHappened();
+    }
+    while (executor_.taskCount() > 0) executor_.runOne();
+    EXPECT_TRUE(std::ranges::includes(ran, taken)) << before;
+    EXPECT_EQ(std::ranges::adjacent_find(ran, std::ranges::greater_equal()), ran.end()) << before;
+  }
 }
 
 TEST_F(QVAsioSerialQueueTest, GoesOnWhereItCouldNotBeSubmitted) {
