@@ -15,7 +15,7 @@ class QV_CLIENT_API QVClientError {
     none,
     cannotConnect,    // no service at that path, or it may not be reached
     connectionLost,   // the service ended or broke off; this connection is of no use any more
-    closed,           // the client, or the reporter, was destroyed or closed before
+    closed,           // the client, or the reporter, was closed or destroyed first
     queueFull,        // the service does not read, or too many calls are unanswered; try later
     timedOut,         // a waiting call's time limit passed; the call may still be carried out
     wouldDeadlock,    // a waiting call on the thread that would have to deliver its answer

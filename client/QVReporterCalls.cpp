@@ -240,7 +240,7 @@ bool QVReporterCalls::handleStep(const QVReporterRecord& record, QVReporterSessi
              issue(client_->setServiceType(session.serviceType, session.reporterID, acknowledge()));
     case Kind::setConfiguration: {
       std::string merged = QVReporterMergedConfiguration(session.configuration, record.payload);
-      // More than the service keeps; for the session's restoration the last addition has to do.
+      // Then the last addition has to do for the session's restoration.
       if (merged.size() > kQVReporterMaximumConfigurationBytes) merged = record.payload;
       session.configuration = std::move(merged);
       return !session.isPresent || configure(session);

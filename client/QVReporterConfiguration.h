@@ -4,7 +4,8 @@
 #include <string>
 #include <string_view>
 
-// Bytes of encoded entries that a session's configuration may have, as many as the service keeps.
+// Bytes of encoded entries that one configuration of a session, and what is kept for the session's
+// restoration, may have. The service keeps as many bytes, counted as it keeps them.
 inline constexpr std::size_t kQVReporterMaximumConfigurationBytes = std::size_t{64} << 10;
 
 // Adds entries of a payload to those that there are, of equal keys the later one alone, as the

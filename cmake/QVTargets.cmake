@@ -33,8 +33,8 @@ function(qv_library name)
 endfunction()
 
 # Defines a test program of all *Test.cpp (and helper) sources directly in the calling folder, and
-# its tests, with that label: "unit" for tests that start no processes of the service, "e2e" for those
-# that do, "soak" for all of it at once, "cli" for what is installed.
+# its tests, with that label: "unit" for tests that start no processes of the service, "e2e" for
+# those that do, "soak" for all of it at once, "cli" for what is installed.
 function(qv_test_program name label)
   file(GLOB sources CONFIGURE_DEPENDS *.cpp *.h)
   add_executable(${name} ${sources})

@@ -7,6 +7,7 @@
 #include "QVServices/Statistics/Service/QVReportingSessionLog.h"
 #include "platform/QVPlatform.h"
 
+#include <cstdlib>
 #include <utility>
 
 namespace {
@@ -16,7 +17,8 @@ constexpr uint32_t kTraceStarted = 0x2104282C;
 constexpr uint32_t kTraceStopped = 0x21042830;
 constexpr uint32_t kTraceDestroyed = 0x21042834;
 
-constexpr double kBackendWaitSeconds = 9.0;
+// Kept as the text that it is set as, and read as a number.
+constexpr const char* kBackendWaitSeconds = "9.0";
 
 QVPlatform& platform() {
   return QVPlatform::shared();
@@ -142,7 +144,7 @@ void QVReportingSession::setUpBeaconSession(std::optional<std::string_view> name
   const bool realtime = type == kQVReportingServiceTypeAPIUsage;
   const QVDictionary sessionInfo{
       {kBeaconSessionInfoClientType, QVReportingBeaconClient::kType},
-      {kBeaconSessionInfoClientVersion, QVReportingBeaconClient::kVersion},
+      {kBeaconSessionInfoClientVersion, QVReportingBeaconClient::version()},
       {kBeaconSessionInfoSessionID, reporterID_},
       {kBeaconSessionInfoBatchEvent, !realtime},
       {kBeaconSessionInfoHierarchyToken, beaconAgentToken_->description()},
@@ -160,7 +162,7 @@ void QVReportingSession::setUpBeaconSession(std::optional<std::string_view> name
       [search](const std::optional<QVArray>& backends) { handleBackends(*search, backends); });
   if (!QVReportingUtilityWait(*search->condition, search->found,
                               "waiting for beacond to find backends", "failed to find backend",
-                              scope(), kBackendWaitSeconds)) {
+                              scope(), std::strtod(kBackendWaitSeconds, nullptr))) {
     beaconSession_ = nullptr;
     beaconSessionStarted_ = false;
   }

@@ -47,7 +47,7 @@ void sendSingleMessageNow(const QVDictionary& message, uint32_t category, uint16
   log().verbose(scope(), kSendSingleFunction, "sending single message");
   const QVDictionary sessionInfo{
       {kBeaconSessionInfoClientType, QVReportingBeaconClient::kType},
-      {kBeaconSessionInfoClientVersion, QVReportingBeaconClient::kVersion},
+      {kBeaconSessionInfoClientVersion, QVReportingBeaconClient::version()},
       {kBeaconSessionInfoSessionID, QVReportingBeaconClient::kNoSessionID}};
   const QVDictionary userInfo{
       {kBeaconUserInfoClientName, QVReportingBeaconClient::kName},

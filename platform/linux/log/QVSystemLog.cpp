@@ -12,8 +12,6 @@
 
 namespace {
 
-// Longer texts are a client's doing; the journal itself would take no more than three times this.
-
 const char* withoutDirectories(const char* path) {
   const char* const slash = std::strrchr(path, '/');
   return slash == nullptr ? path : slash + 1;
@@ -23,6 +21,7 @@ bool continuesCharacter(char byte) {
   return (static_cast<unsigned char>(byte) & 0xC0U) == 0x80U;
 }
 
+// Longer texts are a client's doing; the journal itself would take no more than three times that.
 void limitText(std::string& text) {
   if (text.size() <= QVLog::kMaximumTextBytes) return;
   std::size_t end = QVLog::kMaximumTextBytes;

@@ -1,4 +1,5 @@
 #include "platform/fake/QVFakePlatform.h"
+#include "platform/linux/QVDescriptor.h"
 #include "platform/linux/bus/QVBusAuthClient.h"
 #include "platform/linux/bus/QVBusListener.h"
 #include "platform/linux/bus/QVBusListeningSocket.h"
@@ -19,6 +20,7 @@
 #include <thread>
 #include <vector>
 
+#include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/socket.h>
@@ -273,8 +275,10 @@ TEST_F(QVBusListenerTest, ClosesWhatTheDelegateThrowsAt) {
 }
 
 TEST_F(QVBusListenerTest, LetsClientsWaitWhileDescriptorsAreUsedUp) {
-  if (kObjectsNeedDescriptors) GTEST_SKIP() << "the sanitizer needs the descriptors";
   serve();
+  // So that the eighth is enough for those who need descriptors beside the listener.
+  std::vector<QVDescriptor> others;
+  for (int i = 0; i < 120; ++i) others.emplace_back(::open("/dev/null", O_RDONLY | O_CLOEXEC));
   Client first, second;
   ASSERT_TRUE(first.connect(path_));
   ASSERT_TRUE(first.isLetIn());

@@ -102,15 +102,17 @@ TEST(QVFakeBeacon, FailsAsItIsTold) {
   QVFakeBeacon beacon;
   const auto session = beacon.initWithSessionInfo({}, {}, {});
   const QVError refusal{.domain = "test", .code = 1, .userInfo = {}};
-  beacon.refuseMessages(refusal);
   std::optional<QVError> error;
+  EXPECT_TRUE(session->sendMessageWithCategory(1, 1, {}, error));
+  EXPECT_TRUE(beacon.events(Kind::message).at(0).accepted);
+  beacon.refuseMessages(refusal);
   EXPECT_FALSE(session->sendMessageWithCategory(1, 1, {}, error));
   EXPECT_EQ(error, refusal);
   error.reset();
   beacon.refuseMessages(std::nullopt);
   EXPECT_FALSE(beacon.sendOneMessageWithSessionInfo({}, {}, 1, 1, {}, error));
   EXPECT_EQ(error, std::nullopt);
-  EXPECT_FALSE(beacon.events()[1].accepted);
+  EXPECT_FALSE(beacon.events(Kind::message).at(1).accepted);
 
   beacon.setFlushError(refusal);
   std::optional<QVError> flushError;
